@@ -1,0 +1,7 @@
+if(TREEHFS_SANITIZE)
+  add_compile_options(-fsanitize=address,undefined -fno-sanitize-recover=all -fno-omit-frame-pointer)
+  add_link_options(-fsanitize=address,undefined)
+endif()
+if(TREEHFS_PARANOID)
+  add_compile_definitions(TREEHFS_PARANOID)
+endif()

@@ -1,0 +1,116 @@
+// The bytes of one cached node as one range [0, nodeSize): the only code that knows that a node lies
+// in blocks (besides the accessors, which describe pieces, and the marking of blocks). Everything
+// else speaks in node offsets.
+//
+// Offsets come from disk, so every access stays inside the node's blocks: a read that would leave
+// them yields 0 (or copies nothing), a write that would leave them changes nothing. Callers check
+// first; this is the net below them. 16- and 32-bit access works at odd offsets and over block ends.
+#pragma once
+
+#include <cstring>
+
+#include "hfs/treehfs.h"
+
+namespace VELK {
+
+inline u16 GetBe16(const u8* bytes) { return static_cast<u16>((bytes[0] << 8) | bytes[1]); }
+inline u32 GetBe32(const u8* bytes) {
+    return (static_cast<u32>(bytes[0]) << 24) | (static_cast<u32>(bytes[1]) << 16) |
+           (static_cast<u32>(bytes[2]) << 8) | bytes[3];
+}
+inline void PutBe16(u8* bytes, u32 value) {
+    bytes[0] = static_cast<u8>(value >> 8);
+    bytes[1] = static_cast<u8>(value);
+}
+inline void PutBe32(u8* bytes, u32 value) {
+    PutBe16(bytes, value >> 16);
+    PutBe16(bytes + 2, value);
+}
+// Host-order 16 bits of a search key, wherever it lies.
+inline u16 GetHost16(const void* bytes) {
+    u16 value;
+    std::memcpy(&value, bytes, sizeof value);
+    return value;
+}
+inline u32 GetHost32(const void* bytes) {
+    u32 value;
+    std::memcpy(&value, bytes, sizeof value);
+    return value;
+}
+
+inline u32 RoundUpEven(u32 size) { return (size + 1) & ~1u; }
+// Bytes a key of this length takes in a node: length field and key, padded to even.
+inline u32 PaddedKeySize(u32 keyLength) { return (keyLength + 3) & ~1u; }
+
+class NodeBytes {
+public:
+    NodeBytes(const BTHeaderMem* hdr, const HfsNode* node)
+        : bufs_(node->bufs),
+          blockMask_(hdr->blockMask),
+          blockShift_(hdr->blockShift),
+          blocks_(hdr->blocksPerNode) {}
+
+    // Bytes the node's blocks hold; the node size wherever the geometry is sound.
+    u64 Limit() const { return static_cast<u64>(blocks_) << blockShift_; }
+    bool Contains(u32 offset, u32 size) const {
+        return static_cast<u64>(offset) + size <= Limit();
+    }
+
+    // Address of one byte, null past the node's blocks; and bytes from there to its block's end.
+    u8* At(u32 offset) const {
+        const u32 block = offset >> blockShift_;
+        return block < blocks_ ? bufs_[block].data + (offset & blockMask_) : nullptr;
+    }
+    u32 Room(u32 offset) const { return blockMask_ + 1 - (offset & blockMask_); }
+
+    u16 U16(u32 offset) const {
+        if (InOneBlock(offset, 2)) {
+            return GetBe16(At(offset));
+        }
+        u8 bytes[2] = {};
+        CopyOut(bytes, offset, 2);
+        return GetBe16(bytes);
+    }
+    u32 U32(u32 offset) const {
+        if (InOneBlock(offset, 4)) {
+            return GetBe32(At(offset));
+        }
+        u8 bytes[4] = {};
+        CopyOut(bytes, offset, 4);
+        return GetBe32(bytes);
+    }
+    u8 U8(u32 offset) const {
+        const u8* byte = At(offset);
+        return byte != nullptr ? *byte : u8{0};
+    }
+
+    // REQUIRES of all writers: the blocks written were marked with SetDirty.
+    void SetU8(u32 offset, u32 value) const;
+    void SetU16(u32 offset, u32 value) const;
+    void SetU32(u32 offset, u32 value) const;
+    void CopyOut(void* target, u32 offset, u32 size) const;
+    void CopyIn(u32 offset, const void* source, u32 size) const;
+    void Fill(u32 offset, u8 value, u32 size) const;
+    void Move(u32 target, u32 source, u32 size) const;  // overlap allowed
+
+private:
+    friend void CopyBetween(NodeBytes target, u32 targetOffset, NodeBytes source, u32 sourceOffset,
+                            u32 size);
+
+    bool InOneBlock(u32 offset, u32 size) const {
+        return __builtin_expect(
+            (offset >> blockShift_) < blocks_ && (offset & blockMask_) + size <= blockMask_ + 1, true);
+    }
+    u8* WriteAt(u32 offset) const;
+    void MovePieces(u32 target, u32 source, u32 size) const;
+
+    const HfsBcbBuf* bufs_;
+    u32 blockMask_;
+    u32 blockShift_;
+    u32 blocks_;
+};
+
+// Copies between two nodes; they must not be the same one.
+void CopyBetween(NodeBytes target, u32 targetOffset, NodeBytes source, u32 sourceOffset, u32 size);
+
+}  // namespace VELK

@@ -1,0 +1,39 @@
+// Intrusive red-black tree node. The owner of a tree walks and links by its own key and leaves the
+// rebalancing to insert_color; nothing here allocates or compares.
+#pragma once
+
+#include <cstdint>
+
+namespace VELK {
+
+struct rb_node {
+    std::uintptr_t parentColor;  // parent's address; lowest bit: 1 = black, 0 = red
+    rb_node* right;
+    rb_node* left;
+
+    rb_node* Parent() const {
+        return reinterpret_cast<rb_node*>(parentColor & ~static_cast<std::uintptr_t>(1));
+    }
+
+    // Hangs this node, red and without children, at `*slot`, a null child pointer of `parent`
+    // (or the root pointer, with `parent` null). insert_color must follow.
+    void Link(rb_node* parent, rb_node** slot) {
+        parentColor = reinterpret_cast<std::uintptr_t>(parent);
+        left = nullptr;
+        right = nullptr;
+        *slot = this;
+    }
+
+    // A node in no tree is its own parent.
+    void MarkUnlinked() { parentColor = reinterpret_cast<std::uintptr_t>(this); }
+    bool IsLinked() const { return Parent() != this; }
+
+    // Rebalances after Link.
+    void insert_color(rb_node** root);
+
+    // Takes this node out of the tree at `*root`, rebalances and marks it unlinked.
+    // REQUIRES: this node is in that tree.
+    void remove(rb_node** root);
+};
+
+}  // namespace VELK
