@@ -66,21 +66,22 @@ static_assert(kHeadMapRecord == kHeadEnd + 128);
 
 // Map nodes: one record from 14 to nodeSize - 6.
 constexpr u32 kMapNodeTail = 6;
-constexpr u32 kHeadMapOverhead = kHeadMapRecord + kHeadSlotsSize;  // bytes of node 0 that are no map
-constexpr u32 kMapNodeOverhead = kDescSize + kMapNodeTail;         // bytes of a map node that are no map
+constexpr u32 kHeadMapOverhead =
+    kHeadMapRecord + kHeadSlotsSize;                        // bytes of node 0 that are no map
+constexpr u32 kMapNodeOverhead = kDescSize + kMapNodeTail;  // bytes of a map node that are no map
 static_assert(kHeadMapOverhead == 256 && kMapNodeOverhead == 20);
 
-constexpr u32 kBTBigKeysMask = 2;             // key lengths are 16 bits wide
-constexpr u32 kBTVariableIndexKeysMask = 4;   // index keys have their own length
+constexpr u32 kBTBigKeysMask = 2;            // key lengths are 16 bits wide
+constexpr u32 kBTVariableIndexKeysMask = 4;  // index keys have their own length
 constexpr u8 kKeyCompareBinary = 0xBC;
 constexpr u8 kKeyCompareFolding = 0xCF;
 
 constexpr u32 kMinNodeShift = 9;
 constexpr u32 kMaxNodeShift = 15;
-constexpr u32 kMaxOpenDepth = 16;    // a header may claim this much and still opens
-constexpr u32 kMaxPathDepth = 15;    // levels a search path can hold
-constexpr u32 kMaxKeyLength = 520;   // of any key the engine accepts, without its length field
-constexpr u32 kChildSize = 4;        // data of an index record: the child's node number
+constexpr u32 kMaxOpenDepth = 16;   // a header may claim this much and still opens
+constexpr u32 kMaxPathDepth = 15;   // levels a search path can hold
+constexpr u32 kMaxKeyLength = 520;  // of any key the engine accepts, without its length field
+constexpr u32 kChildSize = 4;       // data of an index record: the child's node number
 
 // Catalog node IDs of the special files.
 constexpr u32 kExtentsFileId = 3;
@@ -97,22 +98,22 @@ constexpr u16 kVersionHfsx = 5;
 // count the key length field, which holds the number of bytes after itself.
 constexpr u32 kKeyLengthSize = 2;
 
-constexpr u32 kCatKeyParentId = 2;     // u32
-constexpr u32 kCatKeyNameLength = 6;   // u16: UTF-16 code units
+constexpr u32 kCatKeyParentId = 2;    // u32
+constexpr u32 kCatKeyNameLength = 6;  // u16: UTF-16 code units
 constexpr u32 kCatKeyName = 8;
-constexpr u32 kCatKeyFixed = 6;        // least key length
+constexpr u32 kCatKeyFixed = 6;  // least key length
 
-constexpr u32 kExtKeyForkType = 2;     // u8: 0 data, 0xFF resource
-constexpr u32 kExtKeyPad = 3;          // u8
-constexpr u32 kExtKeyFileId = 4;       // u32
-constexpr u32 kExtKeyStartBlock = 8;   // u32
+constexpr u32 kExtKeyForkType = 2;    // u8: 0 data, 0xFF resource
+constexpr u32 kExtKeyPad = 3;         // u8
+constexpr u32 kExtKeyFileId = 4;      // u32
+constexpr u32 kExtKeyStartBlock = 8;  // u32
 constexpr u32 kExtKeyFixed = 10;
-constexpr u32 kExtKeySize = 12;        // with its length field
+constexpr u32 kExtKeySize = 12;  // with its length field
 
-constexpr u32 kAttrKeyPad = 2;         // u16
-constexpr u32 kAttrKeyFileId = 4;      // u32
-constexpr u32 kAttrKeyStartBlock = 8;  // u32
-constexpr u32 kAttrKeyNameLength = 12; // u16
+constexpr u32 kAttrKeyPad = 2;          // u16
+constexpr u32 kAttrKeyFileId = 4;       // u32
+constexpr u32 kAttrKeyStartBlock = 8;   // u32
+constexpr u32 kAttrKeyNameLength = 12;  // u16
 constexpr u32 kAttrKeyName = 14;
 constexpr u32 kAttrKeyFixed = 12;
 
@@ -120,13 +121,14 @@ constexpr u32 kCatMaxKeyLength = 516;
 constexpr u32 kExtMaxKeyLength = 10;
 constexpr u32 kAttrMaxKeyLength = 266;
 
-constexpr u32 kExtentCount = 8;        // descriptors of an extent record
+constexpr u32 kExtentCount = 8;  // descriptors of an extent record
 constexpr u32 kExtentRecordSize = 64;
 constexpr u8 kForkData = 0x00;
 constexpr u8 kForkResource = 0xFF;
 
-// A key as the comparators see it: bytes, the first two of which are the key length. Search keys are
-// in host order and 4-byte aligned, node keys big-endian; only byte-wise access is made to either.
+// A key as the comparators see it: bytes, the first two of which are the key length. Search keys
+// are in host order and 4-byte aligned, node keys big-endian; only byte-wise access is made to
+// either.
 struct BTreeKey {
     u8 length[2];
 };

@@ -2,8 +2,8 @@
 // small tables of functions; src/hfs/volume is one such volume, examples/ram_volume the smallest.
 //
 // Two units are both easily called "block": the MAP block (mapBlockSize) is the unit in which the
-// volume hands tree bytes to the engine; the ALLOCATION block (allocBlockSize) is the unit of forks,
-// clumps and the allocation bitmap. They need not be equal.
+// volume hands tree bytes to the engine; the ALLOCATION block (allocBlockSize) is the unit of
+// forks, clumps and the allocation bitmap. They need not be equal.
 #pragma once
 
 #include "hfs/format.h"
@@ -32,9 +32,9 @@ struct HfsExtent {
 
 // Fork record of the volume header (HFS+ volume format), in host order.
 struct HfsFork {
-    u64 logicalSize;   // bytes
-    u32 clumpSize;     // growth step in bytes; 0 = the volume's default
-    u32 totalBlocks;   // allocation blocks of all extents, those in the overflow tree included
+    u64 logicalSize;  // bytes
+    u32 clumpSize;    // growth step in bytes; 0 = the volume's default
+    u32 totalBlocks;  // allocation blocks of all extents, those in the overflow tree included
     HfsExtent extents[kExtentCount];
 };
 
@@ -46,14 +46,14 @@ struct HfsVolumeOps {
     // [byteOffset, byteOffset + bytes); `dirty` is left alone. With `noRead` the old content is not
     // wanted: the caller overwrites all of it. All or nothing: on failure nothing is held and no
     // entry is filled. The engine passes fork null and forkType 0: the tree file itself.
-    int (*Map)(void* self, CFileSystemHfs* fs, HfsRuns* runs, HfsFork* fork, u8 forkType, u32 fileId,
-               u64 byteOffset, u32 bytes, bool noRead, HfsBcbBuf* bufs);
-    // Takes over the present content of a modified block for writing. Bytes changed and never handed
-    // over are gone when the block is released.
+    int (*Map)(void* self, CFileSystemHfs* fs, HfsRuns* runs, HfsFork* fork, u8 forkType,
+               u32 fileId, u64 byteOffset, u32 bytes, bool noRead, HfsBcbBuf* bufs);
+    // Takes over the present content of a modified block for writing. Bytes changed and never
+    // handed over are gone when the block is released.
     int (*DirtyMeta)(void* self, CFileSystemHfs* fs, buffer_head* bh);
     // Zero-fills a byte range of the tree file on disk.
-    int (*Zero)(void* self, CFileSystemHfs* fs, HfsRuns* runs, HfsFork* fork, u8 forkType, u32 fileId,
-                u64 byteOffset, u64 bytes);
+    int (*Zero)(void* self, CFileSystemHfs* fs, HfsRuns* runs, HfsFork* fork, u8 forkType,
+                u32 fileId, u64 byteOffset, u64 bytes);
     // Sets the size of the tree file's fork to `newSize` bytes, allocating or freeing allocation
     // blocks; updates the fork record and `runs`. On failure nothing has changed.
     int (*Resize)(void* self, CFileSystemHfs* fs, HfsRuns* runs, HfsFork* fork, u8 forkType,
@@ -96,8 +96,8 @@ public:
     HfsBufferCache cache;
     HfsService<HfsJournalOps> journal;  // empty: no journal
 
-    u16 mapBlockSize = 0;   // bytes, a power of two from 512 on
-    u8 mapBlockShift = 0;   // its log2
+    u16 mapBlockSize = 0;  // bytes, a power of two from 512 on
+    u8 mapBlockShift = 0;  // its log2
     u8 allocBlockShift = 0;
     u32 allocBlockSize = 0;  // bytes, a power of two from 512 on
     u32 totalBlocks = 0;     // allocation blocks
@@ -130,7 +130,8 @@ public:
     }
     int DirtyMeta(buffer_head* bh) { return service.ops->DirtyMeta(service.self, this, bh); }
     int Zero(HfsRuns* runs, HfsFork* fork, u8 forkType, u32 fileId, u64 byteOffset, u64 bytes) {
-        return service.ops->Zero(service.self, this, runs, fork, forkType, fileId, byteOffset, bytes);
+        return service.ops->Zero(service.self, this, runs, fork, forkType, fileId, byteOffset,
+                                 bytes);
     }
     int Resize(HfsRuns* runs, HfsFork* fork, u8 forkType, u32 fileId, u64 newSize) {
         return service.ops->Resize(service.self, this, runs, fork, forkType, fileId, newSize);

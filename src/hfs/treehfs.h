@@ -211,16 +211,17 @@ public:
     int _RotateLeft(HfsNode* left, HfsNode* node, int index, const BTreeKey* key, const void* data,
                     unsigned dataSize, int* outIndex, unsigned* outNodeNum, bool* rotated,
                     unsigned* moved, HfsConvert* convert);
-    int _RotateRight(HfsNode* node, HfsNode* right, int index, const BTreeKey* key, const void* data,
-                     unsigned dataSize, int* outIndex, unsigned* outNodeNum, unsigned* moved,
-                     HfsConvert* convert);
+    int _RotateRight(HfsNode* node, HfsNode* right, int index, const BTreeKey* key,
+                     const void* data, unsigned dataSize, int* outIndex, unsigned* outNodeNum,
+                     unsigned* moved, HfsConvert* convert);
 
     // insert_entry.cpp, insert_level.cpp, insert_node.cpp
-    // `keyLen` of InsertRecord and `keyLength` of DeleteRecord are the comparator's ID argument: the
-    // parent ID of a catalog key, the file ID of an extents or attributes key.
+    // `keyLen` of InsertRecord and `keyLength` of DeleteRecord are the comparator's ID argument:
+    // the parent ID of a catalog key, the file ID of an extents or attributes key.
     int InsertRecord(const void* key, unsigned keyLen, const void* data, unsigned dataSize);
-    int InsertTree(const BTreeKey* key, const void* data, unsigned dataSize, HfsNode* node, int index,
-                   int level, bool replacesSeparator, HfsFindData* path, HfsConvert* convert);
+    int InsertTree(const BTreeKey* key, const void* data, unsigned dataSize, HfsNode* node,
+                   int index, int level, bool replacesSeparator, HfsFindData* path,
+                   HfsConvert* convert);
     int InsertLevel(HfsFindData* path, InsertKey* first, const InsertKey* second, HfsNode* node,
                     int index, int level);
     int InsertNode(const InsertKey* insertKey, HfsNode* node, unsigned nodeNum, int index,

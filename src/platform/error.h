@@ -1,4 +1,5 @@
-// Statuses every operation returns, reason codes that go to the error report, and the report itself.
+// Statuses every operation returns, reason codes that go to the error report, and the report
+// itself.
 #pragma once
 
 #include "platform/types.h"
@@ -18,14 +19,14 @@ constexpr int kErrCorrupt = static_cast<int>(0xA000011Cu);    // tree structure 
 constexpr int kErrNoSpace = static_cast<int>(0xA0000123u);    // no free node, or volume reserve
 
 // Reason codes: why a failure arose, reported where it arose.
-constexpr u32 kReasonInvalid = 1;    // request or sibling links that cannot be served
-constexpr u32 kReasonUnknown = 3;    // a tree this engine does not know
-constexpr u32 kReasonTooLarge = 9;   // record larger than a node
-constexpr u32 kReasonTree = 10;      // links between nodes disagree
-constexpr u32 kReasonDepth = 11;     // deeper than the search path can hold
-constexpr u32 kReasonHeader = 14;    // header record out of range
-constexpr u32 kReasonNode = 15;      // the inside of one node is inconsistent
-constexpr u32 kReasonReserve = 16;   // the volume refuses a reservation
+constexpr u32 kReasonInvalid = 1;   // request or sibling links that cannot be served
+constexpr u32 kReasonUnknown = 3;   // a tree this engine does not know
+constexpr u32 kReasonTooLarge = 9;  // record larger than a node
+constexpr u32 kReasonTree = 10;     // links between nodes disagree
+constexpr u32 kReasonDepth = 11;    // deeper than the search path can hold
+constexpr u32 kReasonHeader = 14;   // header record out of range
+constexpr u32 kReasonNode = 15;     // the inside of one node is inconsistent
+constexpr u32 kReasonReserve = 16;  // the volume refuses a reservation
 
 }  // namespace VELK
 
@@ -36,5 +37,4 @@ extern "C" {
 // `line` is the stable number of the failing check (a site; see docs/reports.md).
 // Supplied by the platform; must not fail and must not call back into a tree.
 void VELKError(unsigned code, const char* fileName, int line);
-
 }

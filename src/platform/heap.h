@@ -10,5 +10,4 @@ void* velk_heap_alloc(std::size_t size);
 
 // Gives back what velk_heap_alloc returned; null is allowed.
 void velk_heap_free(void* memory);
-
 }

@@ -27,9 +27,9 @@ public:
     }
     ~CRunMapperT() { velk_heap_free(runs_); }
 
-    // Maps [vcn, vcn + length) to [lcn, lcn + length). What an earlier entry said of these blocks is
-    // replaced; neighbours that continue each other are merged. False: out of memory, a length of 0
-    // or a range past the largest block number; the map is then unchanged.
+    // Maps [vcn, vcn + length) to [lcn, lcn + length). What an earlier entry said of these blocks
+    // is replaced; neighbours that continue each other are merged. False: out of memory, a length
+    // of 0 or a range past the largest block number; the map is then unchanged.
     bool AddEntry(Block vcn, Block lcn, Block length);
 
     // Finds where block `vcn` lies and how many blocks from it on lie together. False: not mapped.

@@ -22,5 +22,4 @@ void velk_printk(void* handle, const char* format, ...) VELK_PRINTF(2, 3);
 
 // Prints `size` bytes at `bytes` for a person to read.
 void VELK_DumpMemory(const void* bytes, unsigned size);
-
 }

@@ -5,7 +5,9 @@ namespace VELK {
 
 namespace {
 
-inline u32 Least(u32 a, u32 b) { return a < b ? a : b; }
+inline u32 Least(u32 a, u32 b) {
+    return a < b ? a : b;
+}
 
 }  // namespace
 

@@ -1,10 +1,11 @@
-// The bytes of one cached node as one range [0, nodeSize): the only code that knows that a node lies
-// in blocks (besides the accessors, which describe pieces, and the marking of blocks). Everything
-// else speaks in node offsets.
+// The bytes of one cached node as one range [0, nodeSize): the only code that knows that a node
+// lies in blocks (besides the accessors, which describe pieces, and the marking of blocks).
+// Everything else speaks in node offsets.
 //
 // Offsets come from disk, so every access stays inside the node's blocks: a read that would leave
 // them yields 0 (or copies nothing), a write that would leave them changes nothing. Callers check
-// first; this is the net below them. 16- and 32-bit access works at odd offsets and over block ends.
+// first; this is the net below them. 16- and 32-bit access works at odd offsets and over block
+// ends.
 #pragma once
 
 #include <cstring>
@@ -13,7 +14,9 @@
 
 namespace VELK {
 
-inline u16 GetBe16(const u8* bytes) { return static_cast<u16>((bytes[0] << 8) | bytes[1]); }
+inline u16 GetBe16(const u8* bytes) {
+    return static_cast<u16>((bytes[0] << 8) | bytes[1]);
+}
 inline u32 GetBe32(const u8* bytes) {
     return (static_cast<u32>(bytes[0]) << 24) | (static_cast<u32>(bytes[1]) << 16) |
            (static_cast<u32>(bytes[2]) << 8) | bytes[3];
@@ -38,9 +41,13 @@ inline u32 GetHost32(const void* bytes) {
     return value;
 }
 
-inline u32 RoundUpEven(u32 size) { return (size + 1) & ~1u; }
+inline u32 RoundUpEven(u32 size) {
+    return (size + 1) & ~1u;
+}
 // Bytes a key of this length takes in a node: length field and key, padded to even.
-inline u32 PaddedKeySize(u32 keyLength) { return (keyLength + 3) & ~1u; }
+inline u32 PaddedKeySize(u32 keyLength) {
+    return (keyLength + 3) & ~1u;
+}
 
 class NodeBytes {
 public:
@@ -52,9 +59,7 @@ public:
 
     // Bytes the node's blocks hold; the node size wherever the geometry is sound.
     u64 Limit() const { return static_cast<u64>(blocks_) << blockShift_; }
-    bool Contains(u32 offset, u32 size) const {
-        return static_cast<u64>(offset) + size <= Limit();
-    }
+    bool Contains(u32 offset, u32 size) const { return static_cast<u64>(offset) + size <= Limit(); }
 
     // Address of one byte, null past the node's blocks; and bytes from there to its block's end.
     u8* At(u32 offset) const {
@@ -99,7 +104,8 @@ private:
 
     bool InOneBlock(u32 offset, u32 size) const {
         return __builtin_expect(
-            (offset >> blockShift_) < blocks_ && (offset & blockMask_) + size <= blockMask_ + 1, true);
+            (offset >> blockShift_) < blocks_ && (offset & blockMask_) + size <= blockMask_ + 1,
+            true);
     }
     u8* WriteAt(u32 offset) const;
     void MovePieces(u32 target, u32 source, u32 size) const;

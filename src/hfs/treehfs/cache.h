@@ -8,8 +8,8 @@ namespace VELK {
 // Links `node` into the tree of cached nodes by its number. False: the number is there already.
 bool LinkNode(CBTreeHfs* tree, HfsNode* node);
 
-// Takes a node whose references are gone out of the cache: count, tree, modified list, blocks, heap.
-// Unsaved changes are lost.
+// Takes a node whose references are gone out of the cache: count, tree, modified list, blocks,
+// heap. Unsaved changes are lost.
 void DiscardNode(CBTreeHfs* tree, HfsNode* node);
 
 // The full release: drops one reference and discards the node when none remains.

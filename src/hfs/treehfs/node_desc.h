@@ -7,12 +7,24 @@ namespace VELK {
 
 // Every node has at least one block and blocks hold at least 512 bytes, so the descriptor lies in
 // the first block whatever the geometry.
-inline u32 FLink(const HfsNode* node) { return GetBe32(node->bufs[0].data + kDescFLink); }
-inline u32 BLink(const HfsNode* node) { return GetBe32(node->bufs[0].data + kDescBLink); }
-inline s8 Kind(const HfsNode* node) { return static_cast<s8>(node->bufs[0].data[kDescKind]); }
-inline u32 Height(const HfsNode* node) { return node->bufs[0].data[kDescHeight]; }
-inline u32 NumRecords(const HfsNode* node) { return GetBe16(node->bufs[0].data + kDescNumRecords); }
-inline bool IsLeaf(const HfsNode* node) { return Kind(node) == kBTLeafNode; }
+inline u32 FLink(const HfsNode* node) {
+    return GetBe32(node->bufs[0].data + kDescFLink);
+}
+inline u32 BLink(const HfsNode* node) {
+    return GetBe32(node->bufs[0].data + kDescBLink);
+}
+inline s8 Kind(const HfsNode* node) {
+    return static_cast<s8>(node->bufs[0].data[kDescKind]);
+}
+inline u32 Height(const HfsNode* node) {
+    return node->bufs[0].data[kDescHeight];
+}
+inline u32 NumRecords(const HfsNode* node) {
+    return GetBe16(node->bufs[0].data + kDescNumRecords);
+}
+inline bool IsLeaf(const HfsNode* node) {
+    return Kind(node) == kBTLeafNode;
+}
 
 // REQUIRES of the writers: the descriptor's block was marked with SetDirty(node, 0).
 inline void SetFLink(const BTHeaderMem* hdr, HfsNode* node, u32 value) {

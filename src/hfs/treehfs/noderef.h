@@ -1,5 +1,5 @@
-// One counted reference on a cached node, given back by the plain release: the count falls, the node
-// stays cached. The full release, which drops unsaved changes, is always an explicit call.
+// One counted reference on a cached node, given back by the plain release: the count falls, the
+// node stays cached. The full release, which drops unsaved changes, is always an explicit call.
 #pragma once
 
 #include "hfs/treehfs.h"

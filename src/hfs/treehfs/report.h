@@ -5,8 +5,8 @@
 //   HFS_ASSERT(condition, site);             prints its line and goes on
 //
 // A site is the stable number of one check. It does not follow source lines, is never reused, and
-// belongs to one place; the catalogue docs/sites.txt is generated from the source. Statuses that are
-// part of normal life (absent, already there) are plain returns.
+// belongs to one place; the catalogue docs/sites.txt is generated from the source. Statuses that
+// are part of normal life (absent, already there) are plain returns.
 #pragma once
 
 #include "platform/error.h"
@@ -35,11 +35,11 @@ const char* TreeName(u32 fileId);
         }                                  \
     } while (false)
 
-#define HFS_ASSERT(condition, site)         \
-    do {                                    \
-        if (HFS_UNLIKELY(!(condition))) {   \
-            ::VELK::AssertFailed(site);     \
-        }                                   \
+#define HFS_ASSERT(condition, site)       \
+    do {                                  \
+        if (HFS_UNLIKELY(!(condition))) { \
+            ::VELK::AssertFailed(site);   \
+        }                                 \
     } while (false)
 
 #define HFS_TRACE(...)                                  \

@@ -17,7 +17,7 @@ struct HostHeap {
 
 struct HostSinks {
     void (*Error)(void* self, unsigned code, const char* fileName, int line);
-    void (*Trace)(void* self, const char* text);           // one finished text
+    void (*Trace)(void* self, const char* text);  // one finished text
     void (*Log)(void* self, void* handle, const char* text);
     void (*Dump)(void* self, const void* bytes, unsigned size);
     void* self;
