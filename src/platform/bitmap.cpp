@@ -1,0 +1,123 @@
+// Bit searches and counts over big-endian bitmaps. Whole words are read where eight whole bytes are
+// left, single bytes otherwise: a bitmap may end at any byte of somebody's buffer.
+#include "platform/bitmap.h"
+
+#include <bit>
+#include <cstring>
+
+namespace VELK {
+
+namespace {
+
+constexpr unsigned kWordBits = 64;
+
+// 64 bits with the lowest-numbered one on top.
+u64 LoadWord(const unsigned char* bytes) {
+    u64 word;
+    std::memcpy(&word, bytes, sizeof word);
+    if constexpr (std::endian::native == std::endian::little) {
+        word = __builtin_bswap64(word);
+    }
+    return word;
+}
+
+// First bit in first .. count - 1 that differs from `skip`, `count` when there is none.
+unsigned long FindOther(const unsigned char* bits, unsigned long first, unsigned long count,
+                        bool skip) {
+    const u64 invert = skip ? ~u64{0} : 0;
+    unsigned long bit = first;
+    while (bit < count) {
+        unsigned long found;
+        if (bit % 8 == 0 && count - bit >= kWordBits) {
+            const u64 word = LoadWord(bits + bit / 8) ^ invert;
+            found = bit + static_cast<unsigned long>(std::countl_zero(word));
+            bit += kWordBits;
+        } else {
+            const unsigned inByte = bit % 8;
+            const u8 byte = static_cast<u8>((bits[bit / 8] ^ invert) & (0xFFu >> inByte));
+            bit -= inByte;
+            found = bit + static_cast<unsigned long>(std::countl_zero(byte));
+            bit += 8;
+        }
+        if (found < bit) {
+            return found < count ? found : count;
+        }
+    }
+    return count;
+}
+
+// The bits of one byte that lie in [first, end), as a mask; `base` is the byte's first bit.
+u8 MaskOf(u64 base, u64 first, u64 end) {
+    unsigned mask = 0xFF;
+    if (first > base) {
+        mask &= 0xFFu >> (first - base);
+    }
+    if (end < base + 8) {
+        mask &= 0xFFu << (base + 8 - end);
+    }
+    return static_cast<u8>(mask);
+}
+
+}  // namespace
+
+unsigned long GetFreeBitPosBe(const unsigned char* bits, unsigned long first, unsigned long count) {
+    return FindOther(bits, first, count, true);
+}
+
+void CWndBitmap::Attach(u8* bits, u32 count) {
+    bits_ = bits;
+    count_ = count;
+    zeros_ = count;
+    u64 bit = 0;
+    for (; count - bit >= kWordBits; bit += kWordBits) {
+        zeros_ -= static_cast<u32>(std::popcount(LoadWord(bits + bit / 8)));
+    }
+    for (; bit < count; bit += 8) {
+        zeros_ -= static_cast<u32>(
+            std::popcount(static_cast<u8>(bits[bit / 8] & MaskOf(bit, bit, count))));
+    }
+}
+
+bool CWndBitmap::IsSet(u32 bit) const {
+    return bit >= count_ || (bits_[bit / 8] & (0x80u >> (bit % 8))) != 0;
+}
+
+u32 CWndBitmap::SetRun(u32 first, u32 count) {
+    const u64 end = static_cast<u64>(first) + count;
+    u32 changed = 0;
+    for (u64 base = first & ~7u; base < end; base += 8) {
+        const u8 mask = MaskOf(base, first, end);
+        u8* byte = bits_ + base / 8;
+        changed += static_cast<u32>(std::popcount(static_cast<u8>(~*byte & mask)));
+        *byte = static_cast<u8>(*byte | mask);
+    }
+    zeros_ -= changed;
+    return changed;
+}
+
+u32 CWndBitmap::ClearRun(u32 first, u32 count) {
+    const u64 end = static_cast<u64>(first) + count;
+    u32 changed = 0;
+    for (u64 base = first & ~7u; base < end; base += 8) {
+        const u8 mask = MaskOf(base, first, end);
+        u8* byte = bits_ + base / 8;
+        changed += static_cast<u32>(std::popcount(static_cast<u8>(*byte & mask)));
+        *byte = static_cast<u8>(*byte & ~mask);
+    }
+    zeros_ += changed;
+    return changed;
+}
+
+bool CWndBitmap::FindZeros(u32 from, u32 wanted, u32* first, u32* count) const {
+    const unsigned long start = FindOther(bits_, from, count_, true);
+    if (start >= count_ || wanted == 0) {
+        return false;
+    }
+    const unsigned long room = count_ - start;
+    const unsigned long limit = start + (wanted < room ? wanted : room);
+    *first = static_cast<u32>(start);
+    *count = static_cast<u32>(FindOther(bits_, start, limit, false) - start);
+    return true;
+}
+
+}  // namespace VELK
