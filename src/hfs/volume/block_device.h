@@ -1,0 +1,157 @@
+// Where the bytes of an image lie: a file or block device, memory, a part of another device, or
+// another device with changes kept in memory. All positions are 64-bit bytes.
+//
+// Reads go into buffers of the caller, never through a mapping: a file that is cut short while it
+// is open then gives an error instead of a fault.
+#pragma once
+
+#include <cstddef>
+#include <memory>
+#include <string>
+#include <unordered_map>
+#include <vector>
+
+#include "hfs/volume/problem.h"
+#include "platform/types.h"
+
+namespace VELK {
+
+constexpr int kIoPastEnd = -1;    // the range leaves the device
+constexpr int kIoReadOnly = -2;   // the device takes no writes
+constexpr int kIoNoMemory = -3;   // out of memory
+constexpr u32 kSectorSize = 512;  // smallest unit anything on a volume is changed in
+
+// Result of one transfer. A failed one may have moved some of the bytes.
+struct IoResult {
+    int error = 0;   // 0, a kIo... value, or an errno value
+    u64 offset = 0;  // first byte that could not be transferred
+
+    bool Ok() const { return error == 0; }
+};
+
+// "Input/output error" and the like.
+std::string IoErrorText(int error);
+
+class BlockDevice {
+public:
+    BlockDevice() = default;
+    BlockDevice(const BlockDevice&) = delete;
+    BlockDevice& operator=(const BlockDevice&) = delete;
+    virtual ~BlockDevice() = default;
+
+    virtual u64 Size() const = 0;
+    virtual bool IsWritable() const = 0;
+    // All of [offset, offset + bytes) or an error.
+    virtual IoResult Read(u64 offset, void* target, std::size_t bytes) = 0;
+    virtual IoResult Write(u64 offset, const void* source, std::size_t bytes) = 0;
+    virtual IoResult Zero(u64 offset, u64 bytes);
+    // Returns when everything written before has reached the medium.
+    virtual IoResult Sync() = 0;
+};
+
+// A regular file or a block device of the host.
+class FileDevice : public BlockDevice {
+public:
+    enum class Mode { kRead, kReadWrite, kCreate };
+
+    // Opens `path`; null with `*problem` set when that fails, when it is a folder, or when it is
+    // neither file nor block device. kCreate makes the file, or empties it, and gives it `size`
+    // bytes.
+    static std::unique_ptr<FileDevice> Open(const std::string& path, Mode mode, u64 size,
+                                            Problem* problem);
+    ~FileDevice() override;
+
+    u64 Size() const override { return size_; }
+    bool IsWritable() const override { return writable_; }
+    IoResult Read(u64 offset, void* target, std::size_t bytes) override;
+    IoResult Write(u64 offset, const void* source, std::size_t bytes) override;
+    IoResult Sync() override;
+    int Handle() const { return handle_; }
+
+private:
+    FileDevice(int handle, u64 size, bool writable)
+        : handle_(handle), size_(size), writable_(writable) {}
+
+    int handle_;
+    u64 size_;
+    bool writable_;
+};
+
+// Bytes in memory; untouched stretches take none.
+class MemoryDevice : public BlockDevice {
+public:
+    explicit MemoryDevice(u64 size);
+
+    u64 Size() const override { return size_; }
+    bool IsWritable() const override { return true; }
+    IoResult Read(u64 offset, void* target, std::size_t bytes) override;
+    IoResult Write(u64 offset, const void* source, std::size_t bytes) override;
+    IoResult Zero(u64 offset, u64 bytes) override;
+    IoResult Sync() override { return {}; }
+
+private:
+    static constexpr u32 kChunkSize = 1u << 16;
+
+    u64 size_;
+    std::vector<std::unique_ptr<u8[]>> chunks_;  // null: zeros
+};
+
+// The bytes [offset, offset + size) of another device, which must outlive this one.
+class SliceDevice : public BlockDevice {
+public:
+    SliceDevice(BlockDevice* base, u64 offset, u64 size)
+        : base_(base), offset_(offset), size_(size) {}
+
+    u64 Size() const override { return size_; }
+    bool IsWritable() const override { return base_->IsWritable(); }
+    IoResult Read(u64 offset, void* target, std::size_t bytes) override;
+    IoResult Write(u64 offset, const void* source, std::size_t bytes) override;
+    IoResult Zero(u64 offset, u64 bytes) override;
+    IoResult Sync() override { return base_->Sync(); }
+    u64 Offset() const { return offset_; }
+
+private:
+    BlockDevice* base_;
+    u64 offset_;
+    u64 size_;
+};
+
+// Another device with every change kept in memory; the other one is never written. Owns nothing
+// of the base, which must outlive this one.
+class OverlayDevice : public BlockDevice {
+public:
+    static constexpr u32 kPageSize = 4096;
+    static constexpr u32 kSectorsPerPage = kPageSize / kSectorSize;
+
+    // One page of changes: sectors of `changed` hold `bytes`, the others are the base's.
+    struct Page {
+        u8 changed = 0;  // bit i: sector i
+        u8 bytes[kPageSize];
+    };
+
+    explicit OverlayDevice(BlockDevice* base) : base_(base) {}
+
+    u64 Size() const override { return base_->Size(); }
+    bool IsWritable() const override { return true; }
+    IoResult Read(u64 offset, void* target, std::size_t bytes) override;
+    IoResult Write(u64 offset, const void* source, std::size_t bytes) override;
+    IoResult Sync() override { return {}; }
+
+    BlockDevice* Base() const { return base_; }
+    bool IsEmpty() const { return pages_.empty(); }
+    std::size_t PageCount() const { return pages_.size(); }
+    // Numbers of the changed pages, rising.
+    std::vector<u64> ChangedPages() const;
+    const Page* PageAt(u64 number) const;
+    // Forgets every change.
+    void Drop() { pages_.clear(); }
+
+private:
+    IoResult ReadPage(u64 offset, u8* target, u32 bytes);
+    IoResult WritePage(u64 offset, const u8* source, u32 bytes);
+
+    BlockDevice* base_;
+    std::unordered_map<u64, std::unique_ptr<Page>> pages_;
+};
+
+}  // namespace VELK

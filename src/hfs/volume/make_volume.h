@@ -1,0 +1,40 @@
+// Writes a new, empty HFS+ or HFSX volume onto a device. The trees are made by the engine's Create
+// and the first catalog records by its InsertRecord.
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "hfs/volume/block_device.h"
+#include "hfs/volume/image_volume.h"
+#include "hfs/volume/problem.h"
+
+namespace VELK {
+
+struct FormatOptions {
+    bool caseSensitive = false;  // HFSX with binary name order
+    u32 blockSize = 4096;        // allocation block, 512 to 65,536
+    u32 catalogNodeSize = 4096;  // 512 to 32,768
+    u32 extentsNodeSize = 4096;
+    u32 attributesNodeSize = 8192;
+    u64 catalogSize = 0;  // bytes; 0: by the clump size
+    u64 extentsSize = 0;
+    u64 attributesSize = 0;
+    u32 clumpSize = 0;  // of the tree forks, bytes; 0: by the volume's size
+    bool withAttributes = true;
+    bool emptyTrees = false;  // forks of size 0 and no records: trees are left to the caller
+    std::u16string name = u"Untitled";  // decomposed
+    u32 date = 0;                       // seconds since 1904, written to every date
+    u64 uuid = 0;                       // volume identifier
+    u32 mapBlockSize = 0;               // of the mounted volume; 0: the smallest node size
+};
+
+// Formats `device` and mounts it with Access::kWrite. Null with `*problem` set.
+std::unique_ptr<ImageVolume> MakeVolume(std::unique_ptr<BlockDevice> device,
+                                        const FormatOptions& options, Problem* problem);
+
+// A fresh volume of `size` bytes in memory.
+std::unique_ptr<ImageVolume> MakeMemoryVolume(u64 size, const FormatOptions& options,
+                                              Problem* problem);
+
+}  // namespace VELK

@@ -1,0 +1,100 @@
+// Texts of problems: numbers as people read them, names of statuses and special files.
+#include "hfs/volume/problem.h"
+
+#include <cstdarg>
+#include <cstdio>
+
+#include "hfs/format.h"
+#include "hfs/volume/image_volume.h"
+#include "platform/error.h"
+
+namespace VELK {
+
+Problem Failure(std::string what, std::string advice) {
+    Problem problem;
+    problem.exitClass = ExitClass::kFailed;
+    problem.what = std::move(what);
+    problem.advice = std::move(advice);
+    return problem;
+}
+
+Problem FailureAt(u64 offset, std::string what, std::string advice) {
+    Problem problem = Failure(std::move(what), std::move(advice));
+    problem.offset = offset;
+    return problem;
+}
+
+Problem UsageProblem(std::string what, std::string advice) {
+    Problem problem = Failure(std::move(what), std::move(advice));
+    problem.exitClass = ExitClass::kUsage;
+    return problem;
+}
+
+std::string Grouped(u64 number) {
+    std::string text = std::to_string(number);
+    for (std::size_t end = text.size(); end > 3; end -= 3) {
+        text.insert(end - 3, 1, ',');
+    }
+    return text;
+}
+
+std::string HexOffset(u64 number) {
+    return Format("0x%llx", static_cast<unsigned long long>(number));
+}
+
+std::string Format(const char* format, ...) {
+    char buffer[512];
+    va_list arguments;
+    va_start(arguments, format);
+    std::vsnprintf(buffer, sizeof buffer, format, arguments);
+    va_end(arguments);
+    return buffer;
+}
+
+const char* StatusName(int status) {
+    switch (status) {
+        case kOk:
+            return "ok";
+        case kErrInvalid:
+            return "invalid";
+        case kErrBadRecord:
+            return "bad-record";
+        case kErrNoMemory:
+            return "no-memory";
+        case kErrNotFound:
+            return "not-found";
+        case kErrExists:
+            return "exists";
+        case kErrTooLarge:
+            return "too-large";
+        case kErrCorrupt:
+            return "corrupt";
+        case kErrNoSpace:
+            return "no-space";
+        default:
+            return "status";
+    }
+}
+
+std::string StatusText(int status) {
+    return Format("%s (%08X)", StatusName(status), static_cast<unsigned>(status));
+}
+
+const char* ForkName(u32 fileId) {
+    switch (fileId) {
+        case kExtentsFileId:
+            return "extents";
+        case kCatalogFileId:
+            return "catalog";
+        case kAllocationFileId:
+            return "allocation";
+        case kStartupFileId:
+            return "startup";
+        case kAttributesFileId:
+            return "attributes";
+        default:
+            return "file";
+    }
+}
+
+}  // namespace VELK
