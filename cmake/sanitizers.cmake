@@ -1,7 +1,16 @@
+# Instrumented builds: sanitizers, write checks, fuzzing, coverage counters.
 if(TREEHFS_SANITIZE)
-  add_compile_options(-fsanitize=address,undefined -fno-sanitize-recover=all -fno-omit-frame-pointer)
+  add_compile_options(-fsanitize=address,undefined -fno-sanitize-recover=all
+    -fno-omit-frame-pointer)
   add_link_options(-fsanitize=address,undefined)
 endif()
 if(TREEHFS_PARANOID)
   add_compile_definitions(TREEHFS_PARANOID)
+endif()
+if(TREEHFS_FUZZ)
+  add_compile_options(-fsanitize=fuzzer-no-link)
+endif()
+if(TREEHFS_COVERAGE)
+  add_compile_options(--coverage -fprofile-update=atomic)
+  add_link_options(--coverage)
 endif()
