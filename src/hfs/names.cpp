@@ -26,7 +26,7 @@ bool IsPlainAscii(u16 unit) {
 }
 
 u16 FoldAscii(u16 unit) {
-    return unit - u16{'A'} < 26u ? static_cast<u16>(unit + 0x20) : unit;
+    return unit >= u'A' && unit <= u'Z' ? static_cast<u16>(unit + 0x20) : unit;
 }
 
 int Sign(u16 first, u16 second) {

@@ -37,6 +37,12 @@ constexpr FieldRun kAttributesKeyLayout[] = {{2, 2}, {4, 2}, {2, kRest}, {0, 0}}
 constexpr u32 kMaxThreadRecord = 10 + 2 * 255;
 constexpr u32 kForkAttributeSize = 88;
 
+void CopyBytes(void* target, const void* source, unsigned size) {
+    if (size != 0) {
+        std::memmove(target, source, size);
+    }
+}
+
 template <typename Field>
 void CopySwapped(u8* target, const u8* source) {
     Field field;
@@ -75,14 +81,14 @@ void CopyFields(const FieldRun* layout, void* target, const void* source, unsign
     for (; layout->width != 0; ++layout) {
         for (unsigned left = layout->count; left != 0; --left) {
             if (size - offset < layout->width) {
-                std::memmove(to + offset, from + offset, size - offset);
+                CopyBytes(to + offset, from + offset, size - offset);
                 return;
             }
             CopyField(to + offset, from + offset, layout->width);
             offset += layout->width;
         }
     }
-    std::memmove(to + offset, from + offset, size - offset);
+    CopyBytes(to + offset, from + offset, size - offset);
 }
 
 u16 HostU16(const void* bytes) {
@@ -174,9 +180,6 @@ void AttributesKeyToMemory(void* target, const void* source, unsigned size) {
 
 void CopyKey(void* target, const void* source) {
     std::memmove(target, source, HostKeySize(source));
-}
-void CopyBytes(void* target, const void* source, unsigned size) {
-    std::memmove(target, source, size);
 }
 
 constexpr HfsConvert kCatalogConvert = {kKeyLengthSize + kCatMaxKeyLength,
