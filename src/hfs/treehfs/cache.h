@@ -5,6 +5,15 @@
 
 namespace VELK {
 
+// The node a link of the tree of cached nodes, or of the modified list, belongs to.
+inline HfsNode* NodeOf(rb_node* link) {
+    return reinterpret_cast<HfsNode*>(link);
+}
+inline HfsNode* NodeOfModified(list_head* link) {
+    return reinterpret_cast<HfsNode*>(reinterpret_cast<u8*>(link) -
+                                      offsetof(HfsNode, modifiedLink));
+}
+
 // Links `node` into the tree of cached nodes by its number. False: the number is there already.
 bool LinkNode(CBTreeHfs* tree, HfsNode* node);
 

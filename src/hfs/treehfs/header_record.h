@@ -9,7 +9,8 @@ namespace VELK {
 void ReadHeaderRecord(CBTreeHfs* tree, const HfsNode* node0);
 
 // Writes the in-memory header into node 0's header record. btreeType, keyCompareType and the
-// reserved fields are not written. REQUIRES: node 0's first block was marked with SetDirty.
+// reserved fields are not written, only asserted to be what the tree believes. REQUIRES: node 0's
+// first block was marked with SetDirty.
 void WriteHeaderRecord(const CBTreeHfs* tree, HfsNode* node0);
 
 }  // namespace VELK

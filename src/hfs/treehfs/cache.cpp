@@ -1,0 +1,265 @@
+// The node cache: nodes by number in a red-black tree, counted references, and the two ways a node
+// leaves (the full release here, hand-over in cache_dirty.cpp). It has no size limit of its own.
+#include "hfs/treehfs/cache.h"
+
+#include <cstring>
+
+#include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/noderef.h"
+#include "hfs/treehfs/report.h"
+#include "platform/heap.h"
+
+namespace VELK {
+
+namespace {
+
+constexpr u16 kEmptyTail = kDescSize;  // last two bytes of a node: record 0, or free space, at 14
+
+HfsNode* FindCached(const CBTreeHfs* tree, u32 nodeNum) {
+    rb_node* link = tree->nodeRoot;
+    while (link != nullptr) {
+        HfsNode* node = NodeOf(link);
+        if (nodeNum == node->nodeNum) {
+            return node;
+        }
+        link = nodeNum < node->nodeNum ? link->left : link->right;
+    }
+    return nullptr;
+}
+
+// A node whose blocks do not make up nodeSize bytes could be read past its end: no node of such a
+// tree is ever handed out, although it opens.
+bool HasWholeBlocks(const BTHeaderMem& header) {
+    return static_cast<u64>(header.blocksPerNode) << header.blockShift == header.nodeSize;
+}
+
+HfsNode* NewNode(const BTHeaderMem& header, u32 nodeNum) {
+    const std::size_t size = sizeof(HfsNode) + header.blocksPerNode * sizeof(HfsBcbBuf);
+    HfsNode* node = static_cast<HfsNode*>(velk_heap_alloc(size));
+    if (node != nullptr) {
+        std::memset(static_cast<void*>(node), 0, size);
+        node->nodeNum = nodeNum;
+        node->modifiedLink.Init();
+        node->link.MarkUnlinked();
+    }
+    return node;
+}
+
+void FreeNodeMemory(CBTreeHfs* tree, HfsNode* node) {
+    for (u32 i = 0; i < tree->header.blocksPerNode; ++i) {
+        HFS_ASSERT(node->bufs[i].bh != nullptr, 2835);
+        tree->header.cache->Release(node->bufs[i].bh, 0);
+    }
+    velk_heap_free(node);
+}
+
+u8* TailOf(const BTHeaderMem& header, HfsNode* node) {
+    return node->bufs[header.blocksPerNode - 1].data + header.blockSize - kSlotSize;
+}
+
+// Fills a node that lies past the initialised part of the file: all zero but for its free-space
+// offset. On failure nothing stays open.
+int InitialiseNew(CBTreeHfs* tree, HfsNode* node) {
+    const BTHeaderMem& header = tree->header;
+    for (u32 i = 0; i < header.blocksPerNode; ++i) {
+        HfsBcbBuf* block = &node->bufs[i];
+        header.cache->BeginModify(block->bh);
+        if (tree->volume->journal) {
+            const HfsService<HfsJournalOps>& journal = tree->volume->journal;
+            const int status = journal.ops->GetCreateAccess(journal.self, block->bh);
+            if (status != kOk) {
+                header.cache->EndModify(block->bh);
+                return status;
+            }
+        }
+        std::memset(block->data, 0, header.blockSize);
+        block->dirty = true;
+        if (i + 1 == header.blocksPerNode) {
+            PutBe16(TailOf(header, node), kEmptyTail);
+        }
+        header.cache->EndModify(block->bh);
+    }
+    return kOk;
+}
+
+// Marks one block dirty on the way to emptying a node. A journal that refuses is only asserted: the
+// node must be empty for its new owner. True: the block was clean before.
+bool MarkForEmptying(CBTreeHfs* tree, HfsBcbBuf* block, bool* granted) {
+    *granted = true;
+    if (block->dirty) {
+        return false;
+    }
+    if (tree->volume->journal) {
+        const HfsService<HfsJournalOps>& journal = tree->volume->journal;
+        *granted = journal.ops->GetWriteAccess(journal.self, block->bh) == kOk;
+    }
+    block->dirty = true;
+    return true;
+}
+
+// Offset of the first 8-byte word of the block that is not zero, blockSize when all are.
+u32 FirstNonZeroWord(const u8* data, u32 blockSize) {
+    for (u32 at = 0; at < blockSize; at += 8) {
+        u64 word;
+        std::memcpy(&word, data + at, sizeof word);
+        if (word != 0) {
+            return at;
+        }
+    }
+    return blockSize;
+}
+
+// Empties a node that held something: zeroes each block from its first non-zero word on, so that
+// blocks already zero are neither journalled nor written, and sets the free-space offset.
+void EmptyExisting(CBTreeHfs* tree, HfsNode* node) {
+    const BTHeaderMem& header = tree->header;
+    bool madeDirty = false;
+    bool granted = true;
+    for (u32 i = 0; i < header.blocksPerNode; ++i) {
+        HfsBcbBuf* block = &node->bufs[i];
+        const u32 from = FirstNonZeroWord(block->data, header.blockSize);
+        if (from == header.blockSize) {
+            continue;
+        }
+        if (node->nodeNum >= tree->validNodes) {
+            HFS_TRACE("node %x must be zeroed. Valid=%x\n", node->nodeNum, tree->validNodes);
+        }
+        madeDirty |= MarkForEmptying(tree, block, &granted);
+        HFS_ASSERT(granted, 2745);
+        std::memset(block->data + from, 0, header.blockSize - from);
+    }
+    if (GetBe16(TailOf(header, node)) != kEmptyTail) {
+        madeDirty |= MarkForEmptying(tree, &node->bufs[header.blocksPerNode - 1], &granted);
+        HFS_ASSERT(granted, 2769);
+        PutBe16(TailOf(header, node), kEmptyTail);
+    }
+    if (madeDirty) {
+        node->modifiedLink.MoveTail(&tree->modifiedList);
+    }
+}
+
+// A node past the initialised part of the file is to be requested empty only.
+void AssertRequest(bool expected) {
+    HFS_ASSERT(expected, 2638);
+}
+
+// Maps a node that is not cached and links it, unreferenced.
+int LoadNode(CBTreeHfs* tree, u32 nodeNum, bool makeEmpty, HfsNode** out) {
+    HfsNode* node = NewNode(tree->header, nodeNum);
+    if (node == nullptr) {
+        return kErrNoMemory;
+    }
+    const bool isNew = nodeNum >= tree->validNodes;
+    int status = tree->volume->Map(&tree->runs, nullptr, 0, tree->fileId,
+                                   static_cast<u64>(nodeNum) << tree->nodeShift,
+                                   tree->header.nodeSize, isNew, node->bufs);
+    if (status != kOk) {
+        velk_heap_free(node);
+        Report(status, 2620);
+        return status;
+    }
+    tree->readCount += 1;
+    if (isNew) {
+        AssertRequest(makeEmpty);
+        status = InitialiseNew(tree, node);
+        if (status != kOk) {
+            FreeNodeMemory(tree, node);
+            Report(status, 2645);
+            return status;
+        }
+        HFS_ASSERT(LinkNode(tree, node), 2706);
+        node->modifiedLink.LinkTail(&tree->modifiedList);
+        *out = node;
+        return kOk;
+    }
+    const bool wasEmpty = tree->nodeRoot == nullptr;
+    HFS_ASSERT(LinkNode(tree, node), 2706);
+    if (makeEmpty) {
+        EmptyExisting(tree, node);
+    } else {
+        HFS_ASSERT(wasEmpty || GetBe16(TailOf(tree->header, node)) == kEmptyTail, 2671);
+    }
+    *out = node;
+    return kOk;
+}
+
+}  // namespace
+
+bool LinkNode(CBTreeHfs* tree, HfsNode* node) {
+    rb_node* parent = nullptr;
+    rb_node** slot = &tree->nodeRoot;
+    while (*slot != nullptr) {
+        parent = *slot;
+        const u32 number = NodeOf(parent)->nodeNum;
+        if (number == node->nodeNum) {
+            return false;
+        }
+        slot = node->nodeNum < number ? &parent->left : &parent->right;
+    }
+    node->link.Link(parent, slot);
+    node->link.insert_color(&tree->nodeRoot);
+    tree->nodeCount += 1;
+    if (tree->nodeCount > tree->maxNodeCount) {
+        tree->maxNodeCount = tree->nodeCount;
+    }
+    return true;
+}
+
+void DiscardNode(CBTreeHfs* tree, HfsNode* node) {
+    if (node->link.IsLinked()) {
+        tree->nodeCount -= 1;
+        node->link.remove(&tree->nodeRoot);
+    }
+    node->modifiedLink.Unlink();
+    FreeNodeMemory(tree, node);
+}
+
+void DropNode(CBTreeHfs* tree, HfsNode* node) {
+    node->refCount -= 1;
+    HFS_ASSERT(node->refCount <= 2, 2818);
+    if (node->refCount <= 0) {
+        DiscardNode(tree, node);
+    }
+}
+
+bool HasDirtyBlock(const BTHeaderMem* hdr, const HfsNode* node) {
+    for (u32 i = 0; i < hdr->blocksPerNode; ++i) {
+        if (node->bufs[i].dirty) {
+            return true;
+        }
+    }
+    return false;
+}
+
+int CBTreeHfs::GetINode(unsigned nodeNum, HfsNode** out, bool makeEmpty) {
+    *out = nullptr;
+    HfsNode* node = FindCached(this, nodeNum);
+    if (node != nullptr) {
+        hitCount += 1;
+        HFS_ASSERT(node->refCount <= 2, 2610);
+        if (makeEmpty) {
+            EmptyExisting(this, node);
+        }
+    } else {
+        if (!HasWholeBlocks(header)) {
+            return Fail(kErrCorrupt, kReasonNode, 2615);
+        }
+        if (nodeNum != 0 && nodeNum >= header.totalNodes && !makeEmpty) {
+            AssertRequest(false);
+            return kErrCorrupt;
+        }
+        const int status = LoadNode(this, nodeNum, makeEmpty, &node);
+        if (status != kOk) {
+            return status;
+        }
+    }
+    node->refCount = node->refCount > 0 ? node->refCount + 1 : 1;
+    *out = node;
+    return kOk;
+}
+
+void CBTreeHfs::PutINode(HfsNode* node, bool) {
+    DropNode(this, node);
+}
+
+}  // namespace VELK

@@ -1,0 +1,21 @@
+// Loading of one level of a search path.
+#pragma once
+
+#include "hfs/treehfs.h"
+
+namespace VELK {
+
+// A path describes levels 1 to 15; anything else is a tree too deep to search.
+int CheckLevel(int level);
+
+// Puts node `nodeNum` into path[level], index 0, and checks that it belongs there: its height and
+// its kind. After a failed check the node stays in the path for ClearPath to release.
+// REQUIRES: CheckLevel(level) succeeded.
+int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, HfsFindData* path);
+
+// Whether `path` stands on a record of a leaf: level 1, a leaf held there, its index at most
+// `slack` past the last record. False for a path that was cleared, failed half-way or was outlived
+// by its records.
+bool StandsOnLeaf(const HfsFindData* path, u32 slack);
+
+}  // namespace VELK
