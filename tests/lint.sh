@@ -1,0 +1,82 @@
+#!/usr/bin/env bash
+# lint.sh [FILE...]: everything that can be said about the code without running it. Without files
+# the whole project; findings are errors. What a tool is missing for is said and skipped.
+# shellcheck disable=SC2317  # steps are called through step()
+set -uo pipefail
+cd "$(dirname "${BASH_SOURCE[0]}")/.." || exit 1
+jobs=$(nproc 2>/dev/null || echo 2)
+failed=0
+
+step() {
+    printf '== %s\n' "$1"
+    shift
+    "$@" || {
+        failed=1
+        printf 'lint: findings above\n'
+    }
+}
+have() { command -v "$1" >/dev/null || ! printf 'lint: no %s here, skipped\n' "$1"; }
+
+if [ $# -gt 0 ]; then
+    sources=("$@")
+else
+    mapfile -t sources < <(git ls-files -co --exclude-standard '*.cpp' '*.h')
+fi
+units=()
+for source in "${sources[@]}"; do
+    [[ $source == *.cpp && -f $source ]] && units+=("$source")
+done
+# Units of the main build; consumers of the installed package and fuzz targets build elsewhere.
+known_units() {
+    python3 -c '
+import json, os, sys
+known = {os.path.relpath(entry["file"]) for entry in json.load(open(sys.argv[1]))}
+print("\n".join(unit for unit in sys.argv[2:] if unit in known))' "$1" "${units[@]}"
+}
+
+have clang-format && step "clang-format" clang-format --dry-run --Werror "${sources[@]}"
+
+configure() {
+    cmake -S . -B "build/lint-$1" -G Ninja -DCMAKE_CXX_COMPILER="$1" -DCMAKE_BUILD_TYPE=Debug \
+        -DCMAKE_CXX_COMPILER_LAUNCHER= >/dev/null
+}
+# Compiles every unit for its warnings alone, with the options of the build.
+syntax() {
+    python3 tests/syntax_only.py "build/lint-$1/compile_commands.json" "$jobs" "${units[@]}"
+}
+for compiler in g++ clang++; do
+    have "$compiler" || continue
+    if configure "$compiler"; then
+        step "$compiler, warnings" syntax "$compiler"
+    else
+        failed=1
+    fi
+done
+
+tidy() {
+    known_units build/lint-clang++/compile_commands.json |
+        grep '^src/' | xargs -r -P "$jobs" -n 1 clang-tidy --quiet -p build/lint-clang++ 2>/dev/null
+}
+[ -f build/lint-clang++/compile_commands.json ] && have clang-tidy && step "clang-tidy" tidy
+
+check_cpp() {
+    local own
+    mapfile -t own < <(printf '%s\n' "${units[@]}" | grep '^src/')
+    cppcheck --quiet --std=c++20 --language=c++ -j "$jobs" -I src --inline-suppr \
+        --enable=warning,performance,portability --error-exitcode=1 \
+        --suppressions-list=tests/cppcheck.txt \
+        --template='{file}:{line}: {severity}: {message} [{id}]' \
+        "${own[@]}"
+}
+have cppcheck && step "cppcheck" check_cpp
+
+have shellcheck && {
+    mapfile -t scripts < <(git ls-files -co --exclude-standard dev .ci/run '*.sh')
+    step "shellcheck" shellcheck "${scripts[@]}"
+}
+
+for check in banned lengths sites layers; do
+    step "health: $check" python3 "tests/health/$check.py"
+done
+[ "$failed" -eq 0 ] && printf '== nothing to complain about\n'
+exit "$failed"
