@@ -145,7 +145,8 @@ TEST_P(NodeBytesTest, RandomMovesEqualThoseOfAFlatBuffer) {
     std::mt19937 random(NodeSize() * 7 + MapBlock());
     for (int round = 0; round < 1500; ++round) {
         const u32 target = static_cast<u32>(random() % NodeSize());
-        const u32 source = round % 3 == 0 ? target ^ (random() % 4) : random() % NodeSize();
+        const u32 any = static_cast<u32>(random());
+        const u32 source = round % 3 == 0 ? target ^ (any % 4) : any % NodeSize();
         const u32 most = NodeSize() - std::max({target, source, 1u});
         const u32 size = most == 0 ? 0 : static_cast<u32>(random() % most);
         View().Move(target, source, size);
