@@ -66,9 +66,9 @@ void EncodeHeader(const VolumeHeader& header, u8* bytes);  // writes every byte
 void DecodeFork(const u8* bytes, HfsFork* fork);           // 80 bytes
 void EncodeFork(const HfsFork& fork, u8* bytes);
 
-// Whether a volume can be read by this header: signature, version, block size, block count against
-// `volumeBytes`. `headerOffset` is its place in the image, for the text; `limitBytes` 0: unknown.
-// A volume longer than `volumeBytes` is no problem here (the image may have been cut short).
+// Whether a volume can be read by this header: signature, version, block size, block count.
+// `headerOffset` is its place in the image, for the text. A volume longer than the image is no
+// problem here: the image may have been cut short.
 Problem CheckHeader(const VolumeHeader& header, u64 headerOffset);
 
 // Whether the extents of one special file lie inside the volume, do not overlap each other, are
