@@ -31,7 +31,7 @@ LINES = [
     "bytes node_desc report noderef",
     "node_access keys_compare header_record",
     "cache cache_dirty scratch",
-    "map_walk path_find path_deliver",
+    "map_walk path_level path_find path_deliver",
     "path_iterate badblocks",
     "record_insert record_delete record_move record_update",
     "map_alloc space_extend space_reserve space_clump",

@@ -80,18 +80,28 @@ class Banned(Tree):
 class Sites(Tree):
     def test_catalogue_matches_after_writing(self):
         self.engine("HFS_TRY(Get(a, b(c, d)), 11);\nreturn Fail(kErrCorrupt, kReasonNode, 12);\n"
-                    "HFS_ASSERT(a < b, 13);\nReport(status, 14);\n")
+                    "HFS_ASSERT(a < b, 13);\nReport(status, 14);\n"
+                    "if (HFS_UNLIKELY(a > (b))) {\n    AssertFailed(15);\n}\n")
         sites.write(self.root)
         self.assertEqual(sites.check(self.root), [])
         text = (self.root / "docs/sites.txt").read_text()
         self.assertIn("    11  pass    path_find.cpp        Get(a, b(c, d))\n", text)
         self.assertIn("    12  fail    path_find.cpp        kReasonNode\n", text)
+        self.assertIn("    15  assert  path_find.cpp        not (a > (b))\n", text)
 
     def test_two_owners_fail(self):
         self.engine("HFS_ASSERT(a, 7);\n")
         self.engine("HFS_ASSERT(b, 7);\n", "cache.cpp")
         sites.write(self.root)
         self.assertIn("site 7 belongs to", sites.check(self.root)[0])
+
+    def test_calls_of_a_helper_are_the_owners(self):
+        self.engine("int Bad(int site) {\n    return Fail(kErrCorrupt, kReasonTree, site);\n}\n"
+                    "int F() { return Bad(21); }\nint G() { return Bad(21); }\n")
+        sites.write(self.root)
+        self.assertEqual([s[:4] for s in sites.collect(self.root)[0]],
+                         [(21, "fail", "path_find.cpp", "kReasonTree")] * 2)
+        self.assertIn("site 21 belongs to", sites.check(self.root)[0])
 
     def test_stale_catalogue_fails(self):
         self.engine("HFS_ASSERT(a, 7);\n")

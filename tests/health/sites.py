@@ -8,7 +8,9 @@ import sys
 
 import common
 
-CALL = re.compile(r"\b(HFS_TRY|HFS_ASSERT|Fail|AssertFailed|Report)\s*\(")
+FORMS = ("HFS_TRY", "HFS_ASSERT", "Fail", "AssertFailed", "Report")
+# A helper that hands its last parameter on as the site: its calls are the owners.
+HELPER = re.compile(r"\b(?:int|void|bool)\s+(\w+)\(([^()]*\bint site)\)\s*\{([^{}]*)\}")
 KIND = {"HFS_TRY": "pass", "HFS_ASSERT": "assert", "Fail": "fail", "AssertFailed": "assert",
         "Report": "report"}
 # Where the forms themselves are defined; helpers there hand a site through.
@@ -38,24 +40,47 @@ def arguments(text, start):
     return [re.sub(r"\s+", " ", part).strip() for part in parts]
 
 
+def condition(text, position):
+    """The condition of the `if` that guards a call, on one line; empty when there is none."""
+    guard = text.rfind("if (", 0, position)
+    if guard < 0 or "}" in text[guard:position]:
+        return ""
+    checked = arguments(text, guard + len("if ("))[0]
+    unlikely = re.fullmatch(r"HFS_UNLIKELY\((.*)\)", checked)
+    return unlikely.group(1) if unlikely else checked
+
+
+def read_file(text, name, where, sites, findings):
+    """Adds the sites of one file; its helpers count in this file only."""
+    helpers = {match.group(1): match for match in HELPER.finditer(text)
+               if re.search(r"\b(?:Fail|AssertFailed|Report)\([^;]*\bsite\)", match.group(3))}
+    inside = [match.span() for match in helpers.values()]
+    for match in re.finditer(r"\b(" + "|".join((*FORMS, *helpers)) + r")\s*\(", text):
+        if any(start <= match.start() < end for start, end in inside):
+            continue
+        form, parts = match.group(1), arguments(text, match.end())
+        place = f"{where}:{common.line_of(text, match.start())}"
+        if not re.fullmatch(r"\d+", parts[-1]):
+            findings.append(f"{place}: {form}: site '{parts[-1]}' is no number")
+            continue
+        what = ", ".join(parts[:-1])
+        if form == "Fail" or form in helpers:
+            reason = re.search(r"kReason\w+", parts[1] if form == "Fail"
+                               else helpers[form].group(3))
+            guard = condition(text, match.start())
+            what = (reason.group(0) if reason else form) + (f" if {guard}" if guard else "")
+        elif form == "AssertFailed":
+            what = f"not ({condition(text, match.start())})"
+        sites.append((int(parts[-1]), KIND.get(form, "fail"), name, what, place))
+
+
 def collect(root):
-    """All sites as (number, kind, file, what) and the findings of calls without a number."""
+    """All sites as (number, kind, file, what, place) and the findings of calls without a number."""
     sites, findings = [], []
     for file in common.files(root, ["src/hfs/treehfs"], ["*.h", "*.cpp"]):
-        if file.name in DEFINING:
-            continue
-        text = common.blank(file.read_text(encoding="utf-8"))
-        for match in CALL.finditer(text):
-            parts = arguments(text, match.end())
-            where = f"{file.relative_to(root)}:{common.line_of(text, match.start())}"
-            if match.start() >= 2 and text[match.start() - 2:match.start()] in ("->", "::"):
-                continue
-            if not re.fullmatch(r"\d+", parts[-1]):
-                findings.append(f"{where}: {match.group(1)}: site '{parts[-1]}' is no number")
-                continue
-            fails = match.group(1) == "Fail" and len(parts) > 2
-            what = parts[1] if fails else ", ".join(parts[:-1])
-            sites.append((int(parts[-1]), KIND[match.group(1)], file.name, what, where))
+        if file.name not in DEFINING:
+            text = common.blank(file.read_text(encoding="utf-8"))
+            read_file(text, file.name, file.relative_to(root), sites, findings)
     return sorted(sites), findings
 
 

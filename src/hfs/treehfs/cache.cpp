@@ -143,6 +143,11 @@ void AssertRequest(bool expected) {
     HFS_ASSERT(expected, 2638);
 }
 
+// A number is cached once; a node whose number is there already stays outside.
+void LinkOnce(CBTreeHfs* tree, HfsNode* node) {
+    HFS_ASSERT(LinkNode(tree, node), 2706);
+}
+
 // Maps a node that is not cached and links it, unreferenced.
 int LoadNode(CBTreeHfs* tree, u32 nodeNum, bool makeEmpty, HfsNode** out) {
     HfsNode* node = NewNode(tree->header, nodeNum);
@@ -167,13 +172,13 @@ int LoadNode(CBTreeHfs* tree, u32 nodeNum, bool makeEmpty, HfsNode** out) {
             Report(status, 2645);
             return status;
         }
-        HFS_ASSERT(LinkNode(tree, node), 2706);
+        LinkOnce(tree, node);
         node->modifiedLink.LinkTail(&tree->modifiedList);
         *out = node;
         return kOk;
     }
     const bool wasEmpty = tree->nodeRoot == nullptr;
-    HFS_ASSERT(LinkNode(tree, node), 2706);
+    LinkOnce(tree, node);
     if (makeEmpty) {
         EmptyExisting(tree, node);
     } else {
