@@ -1,0 +1,150 @@
+// One line for every failure, and suggestions for mistyped words.
+#include "tool/errors.h"
+
+#include <algorithm>
+#include <cstdio>
+
+#include "tool/json_writer.h"
+#include "tool/name_text.h"
+
+namespace VELK::tool {
+
+namespace {
+
+// Edit distance in which swapping two neighbours counts as one step.
+std::size_t EditDistance(const std::string& a, const std::string& b) {
+    std::vector<std::vector<std::size_t>> steps(a.size() + 1,
+                                                std::vector<std::size_t>(b.size() + 1));
+    for (std::size_t i = 0; i <= a.size(); ++i) {
+        for (std::size_t j = 0; j <= b.size(); ++j) {
+            if (i == 0 || j == 0) {
+                steps[i][j] = i + j;
+                continue;
+            }
+            const std::size_t change = a[i - 1] == b[j - 1] ? 0 : 1;
+            std::size_t best =
+                std::min({steps[i - 1][j] + 1, steps[i][j - 1] + 1, steps[i - 1][j - 1] + change});
+            if (i > 1 && j > 1 && a[i - 1] == b[j - 2] && a[i - 2] == b[j - 1]) {
+                best = std::min(best, steps[i - 2][j - 2] + 1);
+            }
+            steps[i][j] = best;
+        }
+    }
+    return steps[a.size()][b.size()];
+}
+
+ToolError MakeError(const std::string& subject, int exitCode, std::string what,
+                    std::string advice) {
+    ToolError error;
+    error.subject = subject;
+    error.problem.exitClass = static_cast<ExitClass>(exitCode);
+    error.problem.what = std::move(what);
+    error.problem.advice = std::move(advice);
+    error.exitCode = exitCode;
+    return error;
+}
+
+}  // namespace
+
+void ThrowProblem(const std::string& subject, const Problem& problem) {
+    ToolError error;
+    error.subject = subject;
+    error.problem = problem;
+    error.exitCode = problem ? static_cast<int>(problem.exitClass) : int{kExitFailed};
+    throw error;
+}
+
+void ThrowFailed(const std::string& subject, std::string what, std::string advice) {
+    throw MakeError(subject, kExitFailed, std::move(what), std::move(advice));
+}
+
+void ThrowNo(const std::string& subject, std::string what, std::string advice) {
+    throw MakeError(subject, kExitNo, std::move(what), std::move(advice));
+}
+
+void ThrowArgument(const std::string& subject, std::string what, std::string advice) {
+    throw MakeError(subject, kExitUsage, std::move(what), std::move(advice));
+}
+
+void ThrowUsage(const std::string& command, std::string what, std::string advice) {
+    ToolError error = MakeError("", kExitUsage, std::move(what), std::move(advice));
+    error.command = command;
+    throw error;
+}
+
+std::string ErrorLine(const ToolError& error) {
+    std::string line = "treehfs";
+    if (!error.command.empty()) {
+        line += " " + error.command;
+    }
+    line += ": ";
+    if (!error.subject.empty()) {
+        line += error.subject + ": ";
+    }
+    return EscapedText(line + error.problem.Text());
+}
+
+std::string ErrorJson(const ToolError& error) {
+    std::string text;
+    JsonWriter json(&text);
+    json.BeginObject();
+    json.Member("schema", "treehfs.error/1");
+    json.Member("code", error.exitCode);
+    if (!error.command.empty()) {
+        json.Member("command", error.command);
+    }
+    if (!error.subject.empty()) {
+        json.Member("image", error.subject);
+    }
+    json.Member("what", error.problem.what);
+    if (error.problem.status != 0) {
+        json.Member("status", StatusName(error.problem.status));
+    }
+    if (error.problem.offset) {
+        json.Member("offset", *error.problem.offset);
+    }
+    if (error.problem.fileId) {
+        json.Member("tree", ForkName(*error.problem.fileId));
+    }
+    if (error.problem.node) {
+        json.Member("node", *error.problem.node);
+    }
+    if (!error.problem.advice.empty()) {
+        json.Member("advice", error.problem.advice);
+    }
+    json.EndObject();
+    return text;
+}
+
+void PrintError(const ToolError& error, bool json) {
+    const std::string line = (json ? ErrorJson(error) : ErrorLine(error)) + "\n";
+    std::fwrite(line.data(), 1, line.size(), stderr);
+}
+
+void PrintNote(const std::string& subject, const Problem& note) {
+    const std::string line = EscapedText("treehfs: " + subject + ": " + note.Text()) + "\n";
+    std::fwrite(line.data(), 1, line.size(), stderr);
+}
+
+std::string NearestWord(const std::string& wrong, const std::vector<std::string>& words) {
+    std::string nearest;
+    std::size_t best = std::max<std::size_t>(1, std::min<std::size_t>(3, wrong.size() / 2)) + 1;
+    for (const std::string& word : words) {
+        if (wrong.size() > word.size() + 3) {
+            continue;
+        }
+        const std::size_t distance = EditDistance(wrong, word);
+        if (distance < best && distance < word.size()) {
+            best = distance;
+            nearest = word;
+        }
+    }
+    return nearest;
+}
+
+std::string DidYouMean(const std::string& wrong, const std::vector<std::string>& words) {
+    const std::string nearest = NearestWord(wrong, words);
+    return nearest.empty() ? "" : " (did you mean " + nearest + "?)";
+}
+
+}  // namespace VELK::tool

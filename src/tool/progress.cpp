@@ -1,0 +1,121 @@
+// Progress lines and interruption.
+#include "tool/progress.h"
+
+#include <fmt/format.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <atomic>
+#include <csignal>
+#include <cstdio>
+
+#include "hfs/volume/problem.h"
+#include "tool/command.h"
+#include "tool/errors.h"
+#include "tool/text_format.h"
+
+namespace VELK::tool {
+
+namespace {
+
+std::atomic<bool> g_interrupted{false};
+
+void OnInterrupt(int) {
+    g_interrupted.store(true, std::memory_order_relaxed);
+}
+
+}  // namespace
+
+void InstallInterruptHandler() {
+    struct sigaction action {};
+    action.sa_handler = OnInterrupt;
+    sigemptyset(&action.sa_mask);
+    action.sa_flags = static_cast<int>(SA_RESETHAND);  // a second Ctrl-C ends at once
+    sigaction(SIGINT, &action, nullptr);
+    sigaction(SIGTERM, &action, nullptr);
+}
+
+void ThrowIfInterrupted() {
+    if (g_interrupted.load(std::memory_order_relaxed)) {
+        throw Interrupted{};
+    }
+}
+
+Progress::Progress(const Invocation& call, std::string what, std::string unit, u64 total,
+                   u32 unitBytes)
+    : what_(std::move(what)),
+      unit_(std::move(unit)),
+      total_(total),
+      unitBytes_(unitBytes),
+      onTerminal_(call.showProgress),
+      fd_(call.progressFd),
+      start_(Clock::now()),
+      last_(start_) {}
+
+Progress::~Progress() {
+    Erase();
+}
+
+void Progress::Restart(std::string what, u64 total) {
+    Erase();
+    what_ = std::move(what);
+    total_ = total;
+    done_ = 0;
+    start_ = Clock::now();
+    last_ = start_;
+}
+
+void Progress::Look() {
+    ThrowIfInterrupted();
+    if (!onTerminal_ && fd_ < 0) {
+        return;
+    }
+    const Clock::time_point now = Clock::now();
+    if (now - last_ < std::chrono::milliseconds(250)) {
+        return;
+    }
+    last_ = now;
+    if (fd_ >= 0) {
+        std::string name = what_;
+        std::replace(name.begin(), name.end(), ' ', '.');
+        const std::string line = fmt::format("{} {} {}\n", name, done_, total_);
+        // A reader that went away is no reason to stop the work.
+        if (write(fd_, line.data(), line.size()) < 0) {
+            fd_ = -1;
+        }
+    }
+    const double seconds = std::chrono::duration<double>(now - start_).count();
+    if (onTerminal_ && seconds >= 1.0) {
+        Draw(seconds);
+    }
+}
+
+void Progress::Draw(double seconds) {
+    constexpr std::size_t kBarWidth = 24;
+    const double part =
+        total_ == 0 ? 0.0 : std::min(1.0, static_cast<double>(done_) / static_cast<double>(total_));
+    std::string bar(static_cast<std::size_t>(part * static_cast<double>(kBarWidth)), '#');
+    bar.resize(kBarWidth, ' ');
+    std::string line = fmt::format("\r{} {:3.0f}% [{}]  {}/{} {}", what_, part * 100.0, bar,
+                                   Grouped(done_), Grouped(total_), unit_);
+    if (unitBytes_ != 0) {
+        const double rate = static_cast<double>(done_) * unitBytes_ / seconds;
+        line += fmt::format("  {}/s", ShortBytes(static_cast<u64>(rate)));
+    }
+    if (part > 0) {
+        const u64 left = static_cast<u64>(seconds / part - seconds + 0.5);
+        line += fmt::format("  {}:{:02} left", left / 60, left % 60);
+    }
+    line += "\x1b[K";
+    std::fwrite(line.data(), 1, line.size(), stderr);
+    drawn_ = true;
+}
+
+void Progress::Erase() {
+    if (drawn_) {
+        std::fputs("\r\x1b[K", stderr);
+        drawn_ = false;
+    }
+}
+
+}  // namespace VELK::tool
