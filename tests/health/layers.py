@@ -34,7 +34,7 @@ LINES = [
     "map_walk path_level path_find path_deliver",
     "path_iterate badblocks",
     "record_insert record_delete record_move record_update",
-    "map_alloc space_extend space_reserve space_clump",
+    "map_alloc space_fork space_extend space_reserve space_clump",
     "balance insert_entry insert_level insert_node",
     "delete_tree",
     "tree_open tree_flush tree_create",
