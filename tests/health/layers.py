@@ -29,9 +29,9 @@ ENGINE_PUBLIC = {"bytes.h": "big-endian loads and stores of the whole project"}
 # Inside the engine, lowest first.
 LINES = [
     "bytes node_desc report noderef",
-    "node_access keys_compare header_record",
-    "cache cache_dirty scratch",
-    "map_walk path_level path_find path_deliver",
+    "node_access keys_compare header_record slots",
+    "cache cache_dirty scratch separator",
+    "map_walk path_level path_find path_deliver path_check",
     "path_iterate badblocks",
     "record_insert record_delete record_move record_update",
     "map_alloc space_fork space_extend space_reserve space_clump",

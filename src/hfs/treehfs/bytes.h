@@ -67,6 +67,11 @@ public:
         return block < blocks_ ? bufs_[block].data + (offset & blockMask_) : nullptr;
     }
     u32 Room(u32 offset) const { return blockMask_ + 1 - (offset & blockMask_); }
+    // Whether the block that holds this byte was marked modified.
+    bool IsDirty(u32 offset) const {
+        const u32 block = offset >> blockShift_;
+        return block < blocks_ && bufs_[block].dirty;
+    }
 
     u16 U16(u32 offset) const {
         if (InOneBlock(offset, 2)) {

@@ -1,0 +1,126 @@
+// InsertRecord: look the key up, put the record into its leaf, make sure there are nodes for splits
+// before the first one. Also the first leaf of an empty tree, and InsertTree for records that
+// start at any level.
+#include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/noderef.h"
+#include "hfs/treehfs/path_check.h"
+#include "hfs/treehfs/report.h"
+
+namespace VELK {
+
+namespace {
+
+// Makes the first leaf, which is also the root, of a record. A failure leaves the leaf allocated.
+int InsertFirst(CBTreeHfs* tree, const BTreeKey* key, const void* data, u32 dataSize) {
+    BTHeaderMem* hdr = &tree->header;
+    if (hdr->freeNodes == 0) {
+        if (hdr->totalNodes == UINT32_MAX) {
+            return Fail(kErrCorrupt, kReasonTree, 9250);
+        }
+        HFS_TRY(tree->ExtendBTree(hdr->totalNodes + 1, nullptr, nullptr), 5032);
+    }
+    NodeRef leaf;
+    HFS_TRY(tree->AllocateNode(leaf.Out()), 5034);
+    HFS_TRY(tree->SetDirty(leaf.Get(), 0), 9251);
+    SetKind(hdr, leaf.Get(), kBTLeafNode);
+    SetHeight(hdr, leaf.Get(), 1);
+    HFS_TRY(tree->_InsertKeyRecord(leaf.Get(), 0, key, 0, data, dataSize, &tree->convert), 5046);
+    hdr->treeDepth = 1;
+    hdr->leafRecords = 1;
+    hdr->rootNode = leaf->nodeNum;
+    hdr->firstLeafNode = leaf->nodeNum;
+    hdr->lastLeafNode = leaf->nodeNum;
+    tree->isDirty = true;
+    return kOk;
+}
+
+// Grows the file when a split at every level could run out of nodes. Looks at the free nodes;
+// deletion's test looks at the total on purpose.
+int ReserveForSplits(CBTreeHfs* tree) {
+    const BTHeaderMem& hdr = tree->header;
+    const u32 depth = hdr.treeDepth;
+    if (hdr.freeNodes >= depth + 1) {
+        return kOk;
+    }
+    const u64 need = static_cast<u64>(hdr.totalNodes) + (depth - hdr.freeNodes);
+    const u64 wanted = need + (need + 1 > tree->CalcMapBits() ? 2 : 1);  // one for a map node
+    if (wanted > UINT32_MAX) {
+        return Fail(kErrCorrupt, kReasonTree, 9252);
+    }
+    HFS_TRY(tree->ExtendBTree(static_cast<u32>(wanted), nullptr, nullptr), 5087);
+    return kOk;
+}
+
+}  // namespace
+
+// Inserts a record that is not there yet. An odd `dataSize` is padded with a zero.
+// A failure may leave nodes half-changed: the volume restores.
+int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, unsigned dataSize) {
+    const BTreeKey* searchKey = static_cast<const BTreeKey*>(key);
+    const u64 evenDataSize = (static_cast<u64>(dataSize) + 1) / 2 * 2;
+    if (PaddedKeySize(GetHost16(key)) + evenDataSize > header.nodeSize) {
+        return Fail(kErrTooLarge, kReasonTooLarge, 5026);
+    }
+    if (dataSize == 0) {
+        return Fail(kErrInvalid, kReasonInvalid, 9253);  // no lookup could read it again
+    }
+    if (header.treeDepth == 0) {
+        return InsertFirst(this, searchKey, data, dataSize);
+    }
+
+    bool found = false;
+    HFS_TRY(FindEntry(searchKey, keyLen, &findData, &found, nullptr, nullptr, nullptr, nullptr),
+            5057);
+    if (found) {
+        return kErrExists;
+    }
+    HFS_ASSERT(findData.valid, 5062);
+    HFS_ASSERT(!found, 5066);
+    HfsNode* leaf = findData.path[findData.level].node;
+    const int index = findData.path[findData.level].index;
+    if (header.leafRecords == UINT32_MAX) {
+        return Fail(kErrCorrupt, kReasonTree, 9254);
+    }
+
+    // At index 0 the leaf's first key changes, and with it the separator in the parent.
+    bool inserted = false;
+    if (index > 0) {
+        HFS_TRY(_InsertKeyRecord(leaf, index, searchKey, 0, data, dataSize, &convert, &inserted),
+                5071);
+    }
+    if (!inserted) {
+        const int status = ReserveForSplits(this);
+        if (status != 0) {
+            return status;
+        }
+        HFS_TRY(InsertTree(searchKey, data, dataSize, leaf, index, 1, false, &findData, &convert),
+                5092);
+    }
+    header.leafRecords += 1;
+    isDirty = true;
+    return kOk;
+}
+
+// Inserts a record at `index` of `node`, which the path holds at `level`, and carries the
+// consequences up the path.
+int CBTreeHfs::InsertTree(const BTreeKey* key, const void* data, unsigned dataSize, HfsNode* node,
+                          int index, int level, bool replacesSeparator, HfsFindData* path,
+                          HfsConvert* hook) {
+    if (level < 1 || static_cast<u32>(level) > kMaxPathDepth || path->path[level].node != node ||
+        node == nullptr || !ParentsLeadHere(this, path, static_cast<u32>(level))) {
+        return Fail(kErrInvalid, kReasonInvalid, 9255);
+    }
+    InsertKey entry;
+    entry.convert = hook;
+    entry.key = key;
+    entry.keyLength = hook != nullptr ? GetKeyLengthLe(&header, key, level == 1)
+                                      : GetKeyLength(&header, key, level == 1);
+    entry.data = data;
+    entry.dataSize = dataSize;
+    entry.replacesSeparator = replacesSeparator;
+    entry.secondKeyFollows = false;
+    HFS_TRY(InsertLevel(path, &entry, nullptr, node, index, level), 4593);
+    return kOk;
+}
+
+}  // namespace VELK

@@ -1,0 +1,35 @@
+// Checks of a stored search path. See path_check.h.
+#include "hfs/treehfs/path_check.h"
+
+#include "hfs/treehfs/node_desc.h"
+
+namespace VELK {
+
+bool StandsOnRecord(const HfsFindData* path) {
+    const HfsFindLevel& leaf = path->path[1];
+    return path->level == 1 && leaf.node != nullptr && IsLeaf(leaf.node) && leaf.index >= 0 &&
+           static_cast<u32>(leaf.index) < NumRecords(leaf.node);
+}
+
+bool ParentsLeadHere(const CBTreeHfs* tree, const HfsFindData* path, u32 level) {
+    const BTHeaderMem* hdr = &tree->header;
+    const u32 depth = hdr->treeDepth;
+    if (level > depth || depth > kMaxPathDepth) {
+        return false;
+    }
+    for (; level < depth; ++level) {
+        const HfsFindLevel& parent = path->path[level + 1];
+        if (parent.node == nullptr || Kind(parent.node) != kBTIndexNode || parent.index < 0 ||
+            static_cast<u32>(parent.index) >= NumRecords(parent.node)) {
+            return false;
+        }
+        unsigned child = 0;
+        if (parent.node->GetChildNodeNum(hdr, parent.index, &child) != 0 ||
+            child != path->path[level].node->nodeNum) {
+            return false;
+        }
+    }
+    return path->path[depth].node->nodeNum == hdr->rootNode;
+}
+
+}  // namespace VELK

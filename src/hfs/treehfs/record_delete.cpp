@@ -1,0 +1,63 @@
+// Takes one record out of one node and closes the gap. Looks at no other node.
+#include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/report.h"
+#include "hfs/treehfs/slots.h"
+
+namespace VELK {
+
+namespace {
+
+// Gives every slot from that of the record before the last up to that of the record behind the
+// deleted one the value of its lower neighbour, less the deleted bytes. Blocks are marked as the
+// walk enters them; a failure leaves the slots before in place.
+int CloseSlots(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 index) {
+    const NodeBytes bytes(&tree->header, node);
+    const u32 removed = slots.end - slots.start;
+    const u32 end = SlotOffset(&tree->header, index);
+    u32 position = slots.limit + kSlotSize;
+    u32 lower = slots.free;  // value of the slot below `position` before the change
+    while (position < end) {
+        if (bytes.Room(position - kSlotSize) == kSlotSize) {
+            HFS_TRY(tree->SetDirty(node, position), 1074);
+        }
+        u32 piece = bytes.Room(position);
+        if (piece > end - position) {
+            piece = end - position;
+        }
+        u8* slot = bytes.At(position);
+        for (u8* const pieceEnd = slot + piece; slot < pieceEnd; slot += kSlotSize) {
+            HFS_ASSERT(lower > removed, 1082);
+            const u32 value = GetBe16(slot);
+            PutBe16(slot, lower - removed);
+            lower = value;
+        }
+        position += piece;
+    }
+    return kOk;
+}
+
+}  // namespace
+
+// Removes record `index` (-1: the last one). Bytes that become free space are not cleared.
+// Marks modified the slots, the moved bytes and the descriptor. A failure part way leaves what was
+// moved so far in place.
+int CBTreeHfs::_DeleteRecord(HfsNode* node, int index) {
+    const u32 count = NumRecords(node);
+    const u32 record = index == -1 ? count - 1 : static_cast<u32>(index);
+    HFS_ASSERT(record < count, 943);
+    RecordSlots slots;
+    if (!LoadRecordSlots(&header, node, record, &slots)) {
+        return Fail(kErrCorrupt, kReasonNode, 9210);
+    }
+    HFS_TRY(SetDirty(node, slots.limit), 962);
+    HFS_TRY(SetDirty(node, slots.start, slots.free - slots.start), 1011);
+    const NodeBytes bytes(&header, node);
+    bytes.Move(slots.start, slots.end, slots.free - slots.end);
+
+    HFS_TRY(SetDirty(node, 0), 1054);
+    SetNumRecords(&header, node, count - 1);
+    bytes.SetU16(slots.limit, 0);
+    return CloseSlots(this, node, slots, record);
+}
+
+}  // namespace VELK

@@ -1,0 +1,198 @@
+// Puts one record into one node: _InsertRecord opens a gap and counts the record, _InsertKeyRecord
+// fills it with a key and its data, converted to disk form on the way. Neither looks at another
+// node. That a record does not fit is an answer to callers that ask for it.
+#include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/report.h"
+#include "hfs/treehfs/scratch.h"
+#include "hfs/treehfs/slots.h"
+
+namespace VELK {
+
+namespace {
+
+// Gives every slot from the new free-space slot at `first` up to that of the record behind the new
+// one the value of its upper neighbour, raised by the new record's size. Blocks are marked as the
+// walk enters them; a failure leaves the slots before in place.
+int OpenSlots(CBTreeHfs* tree, HfsNode* node, u32 first, u32 slotCount, u32 size) {
+    const NodeBytes bytes(&tree->header, node);
+    HFS_TRY(tree->SetDirty(node, first), 1268);
+    HFS_ASSERT(bytes.IsDirty(first), 1269);
+    const u32 end = first + kSlotSize * slotCount;
+    u32 position = first;
+    while (position < end) {
+        u32 piece = bytes.Room(position);
+        const bool more = end - position > piece;
+        if (!more) {
+            piece = end - position;
+        }
+        u8* slot = bytes.At(position);
+        u8* const last = slot + piece - kSlotSize;
+        for (; slot < last; slot += kSlotSize) {
+            PutBe16(slot, GetBe16(slot + kSlotSize) + size);
+        }
+        position += piece;
+        if (more) {
+            HFS_TRY(tree->SetDirty(node, position), 1284);
+            HFS_ASSERT(bytes.IsDirty(position), 1285);
+        }
+        PutBe16(last, bytes.U16(position) + size);
+    }
+    return kOk;
+}
+
+// Moves the records from `index` on up by `size` bytes. `key` holds where free space starts and
+// comes back with the place of the gap.
+int OpenGap(CBTreeHfs* tree, HfsNode* node, int index, u32 size, NodeKey* key) {
+    const BTHeaderMem* hdr = &tree->header;
+    const u32 free = key->offset;
+    NodeKey record{};
+    HFS_TRY(node->GetKey(hdr, index, &record), 1203);
+    if (!IsInsertPoint(record.offset, free) || !IsInsertPoint(record.offset + record.size, free)) {
+        return Fail(kErrCorrupt, kReasonNode, 9200);
+    }
+    HFS_TRY(tree->SetDirty(node, record.offset, free + size - record.offset), 1214);
+    NodeBytes(hdr, node).Move(record.offset + size, record.offset, free - record.offset);
+
+    key->offset = record.offset;
+    key->firstBytes = record.firstBytes;
+    key->ptr = record.ptr;
+    key->next1 = record.next1;
+    key->next2 = record.next2;
+    return kOk;
+}
+
+// Copies or converts the key to the start of the new record. The source may lie in `scratch`: a
+// key that is already in disk form goes straight into its blocks.
+void StoreKey(CBTreeHfs* tree, const NodeBytes& bytes, u32 offset, const BTreeKey* key, u32 keySize,
+              const HfsConvert* convert) {
+    if (convert == nullptr || convert->KeyToDisk == nullptr) {
+        bytes.CopyIn(offset, key, keySize);
+    } else if (keySize <= bytes.Room(offset)) {
+        convert->KeyToDisk(bytes.At(offset), key);
+    } else {
+        convert->KeyToDisk(tree->scratch, key);
+        bytes.CopyIn(offset, tree->scratch, keySize);
+    }
+}
+
+// Copies or converts the data behind the key, which has left the scratch buffer by now.
+int StoreData(CBTreeHfs* tree, const NodeBytes& bytes, u32 offset, const void* data, u32 dataSize,
+              const HfsConvert* convert) {
+    if (convert == nullptr || convert->DataToDisk == nullptr) {
+        bytes.CopyIn(offset, data, dataSize);
+    } else if (dataSize <= bytes.Room(offset)) {
+        convert->DataToDisk(bytes.At(offset), data, dataSize);
+    } else {
+        u8* piece = DataScratch(tree, dataSize);
+        if (piece == nullptr) {
+            return Fail(kErrCorrupt, kReasonNode, 9201);
+        }
+        convert->DataToDisk(piece, data, dataSize);
+        bytes.CopyIn(offset, piece, dataSize);
+    }
+    if ((dataSize & 1) != 0) {
+        bytes.SetU8(offset + dataSize, 0);
+    }
+    return kOk;
+}
+
+}  // namespace
+
+// Opens a gap of `size` bytes at record `index` (-1: behind the last record). `key` then describes
+// its place; its `size` and slot fields are those of the free space before the insertion.
+// Marks modified what it moves, the slots and the descriptor. A failure leaves what was moved.
+int CBTreeHfs::_InsertRecord(HfsNode* node, int index, unsigned size, NodeKey* key,
+                             bool* inserted) {
+    const u32 count = NumRecords(node);
+    if (index == -1) {
+        index = static_cast<int>(count);
+    }
+    HFS_ASSERT(static_cast<u32>(index) <= count, 1170);
+    HFS_TRY(node->GetFreeKey(&header, count, key), 1174);
+    const u32 free = key->offset;
+    const u32 limit = key->entryPos;
+    HFS_ASSERT(free <= limit, 1179);
+    if (static_cast<u32>(index) > count || !IsInsertPoint(free, limit) || size == 0 ||
+        (size & 1) != 0) {
+        return Fail(kErrCorrupt, kReasonNode, 9202);
+    }
+    if (static_cast<u64>(free) + size + kSlotSize > limit) {
+        if (inserted == nullptr) {
+            return Fail(kErrInvalid, kReasonInvalid, 1183);
+        }
+        *inserted = false;
+        return kOk;
+    }
+
+    if (static_cast<u32>(index) == count) {
+        HFS_TRY(SetDirty(node, free, size), 1257);
+    } else {
+        const int status = OpenGap(this, node, index, size, key);
+        if (status != 0) {
+            return status;
+        }
+    }
+    const u32 slotCount = count - static_cast<u32>(index) + 1;
+    const int status = OpenSlots(this, node, limit - kSlotSize, slotCount, size);
+    if (status != 0) {
+        return status;
+    }
+
+    HFS_TRY(SetDirty(node, 0), 1295);
+    HFS_ASSERT(NodeBytes(&header, node).IsDirty(0), 1296);
+    SetNumRecords(&header, node, count + 1);
+    if (inserted != nullptr) {
+        *inserted = true;
+    }
+    return kOk;
+}
+
+// Inserts a record. `keyLen`, when not 0, is the length its stored key claims; the space follows
+// the key's own length all the same. Exactly `dataSize` bytes are read; a zero pads an odd size.
+// A failure after the gap was opened leaves a record whose bytes are not all written.
+int CBTreeHfs::_InsertKeyRecord(HfsNode* node, int index, const BTreeKey* key, unsigned keyLen,
+                                const void* data, unsigned dataSize, HfsConvert* hook,
+                                bool* inserted) {
+    const u32 keyLength = hook != nullptr ? GetHost16(key) : GetBe16(key->length);
+    if (keyLen == 0) {
+        keyLen = keyLength;
+    } else {
+        HFS_ASSERT(keyLen >= keyLength, 1359);
+    }
+    HFS_ASSERT(keyLen <= kMaxKeyLength, 1362);
+    if (dataSize == 0) {
+        return Fail(kErrInvalid, kReasonInvalid, 9203);  // no lookup could read it again
+    }
+    if (hook != nullptr && header.blocksPerNode > 1) {
+        HFS_TRY(EnsureScratch(this), 9204);
+    }
+
+    const u32 keySize = keyLength + kKeyLengthSize;
+    const u32 paddedKeySize = PaddedKeySize(keyLength);
+    const u64 recordSize = (static_cast<u64>(dataSize) + 1) / 2 * 2 + paddedKeySize;
+    // A size beyond 32 bits fits no node either.
+    const u32 size = recordSize > UINT32_MAX ? UINT32_MAX - 1 : static_cast<u32>(recordSize);
+    NodeKey record{};
+    HFS_TRY(_InsertRecord(node, index, size, &record, inserted), 1370);
+    if (inserted != nullptr && !*inserted) {
+        return kOk;
+    }
+
+    const NodeBytes bytes(&header, node);
+    StoreKey(this, bytes, record.offset, key, keySize, hook);
+    if (keyLen != keyLength) {
+        bytes.SetU16(record.offset, keyLen);
+        bytes.Fill(record.offset + keySize, 0, paddedKeySize - keySize);
+    } else if ((keyLength & 1) != 0) {
+        HFS_ASSERT(paddedKeySize == keySize + 1, 1471);
+        bytes.SetU8(record.offset + keySize, 0);
+    }
+    return StoreData(this, bytes, record.offset + paddedKeySize, data, dataSize, hook);
+}
+
+int CBTreeHfs::_InsertKeyRecord(HfsNode* node, int index, const BTreeKey* key, unsigned keyLen,
+                                const void* data, unsigned dataSize, HfsConvert* hook) {
+    return _InsertKeyRecord(node, index, key, keyLen, data, dataSize, hook, nullptr);
+}
+
+}  // namespace VELK

@@ -1,0 +1,64 @@
+// Building of separators. See separator.h.
+#include "hfs/treehfs/separator.h"
+
+#include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/scratch.h"
+#include "platform/heap.h"
+
+namespace VELK {
+
+int FirstKey(CBTreeHfs* tree, HfsNode* node, const BTreeKey** key) {
+    NodeKey record{};
+    const int status = node->GetKey(&tree->header, 0, &record);
+    if (status != 0) {
+        return status;
+    }
+    return GatherKey(tree, node, record, key);
+}
+
+int FirstKeyAside(CBTreeHfs* tree, HfsNode* node, const BTreeKey** key, void** heap) {
+    *heap = nullptr;
+    NodeKey record{};
+    const int status = node->GetKey(&tree->header, 0, &record);
+    if (status != 0) {
+        return status;
+    }
+    if (record.keySize <= record.firstBytes) {
+        *key = reinterpret_cast<const BTreeKey*>(record.ptr);
+        return kOk;
+    }
+    *heap = velk_heap_alloc(record.keySize);
+    if (*heap == nullptr) {
+        return kErrNoMemory;
+    }
+    NodeBytes(&tree->header, node).CopyOut(*heap, record.offset, record.keySize);
+    *key = static_cast<const BTreeKey*>(*heap);
+    return kOk;
+}
+
+void Separator::Fill(const BTHeaderMem* hdr, const BTreeKey* key, u32 nodeNum) {
+    PutBe32(child, nodeNum);
+    entry.convert = nullptr;
+    entry.key = key;
+    entry.keyLength = GetKeyLength(hdr, key, false);
+    entry.data = child;
+    entry.dataSize = kChildSize;
+    entry.replacesSeparator = false;
+    entry.secondKeyFollows = false;
+}
+
+bool WasEmptied(const BTHeaderMem* hdr, const HfsNode* node, const BTreeKey* key) {
+    if (node->refCount <= 1) {
+        return false;  // nobody else holds it, so no key of it is on its way
+    }
+    const u8* bytes = key->length;
+    for (u32 block = 0; block < hdr->blocksPerNode; ++block) {
+        const u8* data = node->bufs[block].data;
+        if (bytes >= data && bytes < data + hdr->blockSize) {
+            return true;
+        }
+    }
+    return false;
+}
+
+}  // namespace VELK

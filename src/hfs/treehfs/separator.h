@@ -1,0 +1,30 @@
+// Separators: the index records that lead from a parent to a child, made of the child's first key,
+// taken whole, and its node number.
+#pragma once
+
+#include "hfs/treehfs.h"
+
+namespace VELK {
+
+// The first key of `node` in one piece: in place, or gathered into the tree's `scratch`. An
+// accessor's failure is reported by it, kErrNoMemory and a key longer than scratch are not.
+int FirstKey(CBTreeHfs* tree, HfsNode* node, const BTreeKey** key);
+
+// The first key of `node` in one piece without the tree's scratch buffer, which holds another key:
+// in place, or gathered into a heap block that the caller frees (`*heap`, else null).
+int FirstKeyAside(CBTreeHfs* tree, HfsNode* node, const BTreeKey** key, void** heap);
+
+// A separator on its way into a parent. The key stays where it lies.
+struct Separator {
+    InsertKey entry;
+    u8 child[kChildSize];
+
+    void Fill(const BTHeaderMem* hdr, const BTreeKey* key, u32 nodeNum);
+};
+
+// Whether `key`, still to be inserted, lay in the bytes of the newly allocated `node`. A damaged
+// map can call a node free that is in use; the key would then be read from a node that was emptied
+// and refilled.
+bool WasEmptied(const BTHeaderMem* hdr, const HfsNode* node, const BTreeKey* key);
+
+}  // namespace VELK
