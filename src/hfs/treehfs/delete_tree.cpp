@@ -18,6 +18,7 @@ namespace {
 bool Rekey(CBTreeHfs* tree, HfsNode* node) {
     if (node->link.IsLinked()) {
         node->link.remove(&tree->nodeRoot);
+        tree->nodeCount -= 1;
     }
     return LinkNode(tree, node);
 }
