@@ -37,6 +37,12 @@ struct Attribute {
     u8 value[kValueSize];
 };
 
+// Room for any record of the tree: a caller cannot know what lies there (see minDataBuffer).
+union AnyAttribute {
+    Attribute found;
+    u8 bytes[4096];
+};
+
 void Prepare(CBTreeHfs* tree, RamVolume* volume) {
     tree->volume = &volume->fs;
     tree->fileId = kAttributesFileId;
@@ -70,12 +76,12 @@ int LookUp(RamVolume* volume) {
     u32 found = 0;
     for (u32 fileId = 16; fileId < 16 + kRecords && status == kOk; ++fileId) {
         const AttributeKey key = KeyOf(fileId);
-        Attribute record = {};
+        AnyAttribute buffer = {};
         unsigned size = 0;
-        status = tree.FindRecord(&key, fileId, &record, sizeof record, &size, nullptr);
+        status = tree.FindRecord(&key, fileId, &buffer, sizeof buffer, &size, nullptr);
         u32 value = 0;
-        std::memcpy(&value, record.value, sizeof value);
-        found += status == kOk && size == sizeof record && value == fileId ? 1 : 0;
+        std::memcpy(&value, buffer.found.value, sizeof value);
+        found += status == kOk && size == sizeof buffer.found && value == fileId ? 1 : 0;
     }
     std::printf("opened again: %u of %u records found\n", found, kRecords);
     tree.Dtor();
