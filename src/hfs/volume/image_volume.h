@@ -131,8 +131,9 @@ public:
     // Writes the whole image as it stands after the last commit.
     Problem SaveTo(std::FILE* file);
 
+    struct State;  // private to the volume layer
+
 private:
-    struct State;
     explicit ImageVolume(std::unique_ptr<State> state);
     std::unique_ptr<State> state_;
 };

@@ -220,16 +220,12 @@ Problem CheckHeader(const VolumeHeader& header, u64 headerOffset) {
     return problem;
 }
 
-Problem CheckForkExtents(const VolumeHeader& header, u32 fileId) {
-    const HfsFork* fork = header.ForkOf(fileId);
-    if (fork == nullptr) {
-        return {};
-    }
+Problem CheckForkExtents(const HfsFork& fork, u32 volumeBlocks, u32 fileId) {
     std::string fault;
     u64 blocks = 0;
     bool ended = false;
     for (u32 i = 0; i < kExtentCount && fault.empty(); ++i) {
-        const HfsExtent& extent = fork->extents[i];
+        const HfsExtent& extent = fork.extents[i];
         if (extent.blockCount == 0) {
             ended = true;
             continue;
@@ -237,13 +233,13 @@ Problem CheckForkExtents(const VolumeHeader& header, u32 fileId) {
         const u64 end = static_cast<u64>(extent.startBlock) + extent.blockCount;
         if (ended) {
             fault = Format("extent %u follows an unused one", i);
-        } else if (end > header.totalBlocks) {
+        } else if (end > volumeBlocks) {
             fault = Format("extent %u (blocks ", i) + Grouped(extent.startBlock) + " to " +
-                    Grouped(end - 1) + ") leaves the volume of " + Grouped(header.totalBlocks) +
+                    Grouped(end - 1) + ") leaves the volume of " + Grouped(volumeBlocks) +
                     " blocks";
         }
         for (u32 other = 0; other < i && fault.empty(); ++other) {
-            const HfsExtent& before = fork->extents[other];
+            const HfsExtent& before = fork.extents[other];
             const u64 beforeEnd = static_cast<u64>(before.startBlock) + before.blockCount;
             if (extent.startBlock < beforeEnd && before.startBlock < end) {
                 fault = Format("extents %u and %u overlap", other, i);
@@ -251,9 +247,9 @@ Problem CheckForkExtents(const VolumeHeader& header, u32 fileId) {
         }
         blocks += extent.blockCount;
     }
-    if (fault.empty() && blocks > fork->totalBlocks) {
+    if (fault.empty() && blocks > fork.totalBlocks) {
         fault = "extents hold " + Grouped(blocks) + " blocks, the fork says " +
-                Grouped(fork->totalBlocks);
+                Grouped(fork.totalBlocks);
     }
     if (fault.empty()) {
         return {};

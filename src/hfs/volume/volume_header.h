@@ -73,7 +73,7 @@ Problem CheckHeader(const VolumeHeader& header, u64 headerOffset);
 
 // Whether the extents of one special file lie inside the volume, do not overlap each other, are
 // packed from the front and add up to no more than the fork's blocks.
-Problem CheckForkExtents(const VolumeHeader& header, u32 fileId);
+Problem CheckForkExtents(const HfsFork& fork, u32 volumeBlocks, u32 fileId);
 
 // Fields in which two headers differ, by name, separated by ", "; empty: none.
 std::string HeaderDifferences(const VolumeHeader& a, const VolumeHeader& b);

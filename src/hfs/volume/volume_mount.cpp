@@ -1,0 +1,250 @@
+// Mounting: place, header, alternate header, forks, map block, journal. Reads the volume and
+// changes nothing.
+#include <algorithm>
+#include <bit>
+
+#include "hfs/volume/journal_state.h"
+#include "hfs/volume/volume_state.h"
+#include "hfs/volume/wire.h"
+
+namespace VELK {
+
+namespace {
+
+constexpr u32 kNodeSizeInFork = kHeadNodeSize;  // node 0 starts the fork
+
+bool ReadHeaderAt(BlockDevice* image, u64 offset, VolumeHeader* header) {
+    u8 bytes[kHeaderSize];
+    if (!image->Read(offset, bytes, sizeof bytes).Ok()) {
+        return false;
+    }
+    DecodeHeader(bytes, header);
+    return true;
+}
+
+bool LooksLikeHeader(const VolumeHeader& header) {
+    return (header.signature == kSignatureHfsPlus || header.signature == kSignatureHfsx) &&
+           IsPowerOfTwo(header.blockSize) && header.blockSize >= kSectorSize;
+}
+
+// The alternate header stands 1,024 bytes before the volume's end. Where the map (or the image)
+// does not end with the volume, that end is known only to within one block.
+std::optional<u64> FindAlternate(BlockDevice* image, const VolumePlace& place,
+                                 const VolumeHeader* main, VolumeHeader* header) {
+    std::vector<u64> sizes = {place.size};
+    if (main != nullptr) {
+        const u64 size = u64{main->totalBlocks} * main->blockSize;
+        for (u64 tail = 0; tail < main->blockSize && tail < (u64{1} << 16); tail += kSectorSize) {
+            sizes.push_back(size + tail);
+        }
+    }
+    for (const u64 size : sizes) {
+        if (size < 2 * kHeaderOffset + kHeaderSize) {
+            continue;
+        }
+        const u64 at = place.offset + size - kAltHeaderFromEnd;
+        if (ReadHeaderAt(image, at, header) && LooksLikeHeader(*header) &&
+            (main == nullptr || header->blockSize == main->blockSize)) {
+            return at;
+        }
+    }
+    return std::nullopt;
+}
+
+std::string VolumeWords(const VolumePlace& place) {
+    return place.partition == 0 ? std::string("the volume")
+                                : Format("the volume (partition %u)", place.partition);
+}
+
+Problem TruncatedNote(u64 imageSize, const VolumePlace& place, u64 end) {
+    Problem note = FailureAt(
+        imageSize,
+        "image ends at " + Grouped(imageSize) + ", " + VolumeWords(place) + " at " + Grouped(end),
+        "reading what is there; check and dump need --keep-going");
+    note.status = kErrVolumeTruncated;
+    note.check = "V02";
+    return note;
+}
+
+// Extents of different special files that claim the same blocks.
+void NoteOverlaps(const VolumeHeader& header, std::vector<Problem>* notes) {
+    for (std::size_t i = 0; i < kSpecialFileIds.size(); ++i) {
+        for (std::size_t j = i + 1; j < kSpecialFileIds.size(); ++j) {
+            const HfsFork* a = header.ForkOf(kSpecialFileIds[i]);
+            const HfsFork* b = header.ForkOf(kSpecialFileIds[j]);
+            bool overlap = false;
+            for (const HfsExtent& x : a->extents) {
+                for (const HfsExtent& y : b->extents) {
+                    overlap = overlap || (x.blockCount != 0 && y.blockCount != 0 &&
+                                          x.startBlock < u64{y.startBlock} + y.blockCount &&
+                                          y.startBlock < u64{x.startBlock} + x.blockCount);
+                }
+            }
+            if (overlap) {
+                Problem note =
+                    Failure(std::string(ForkName(kSpecialFileIds[i])) + " file and " +
+                                ForkName(kSpecialFileIds[j]) + " file claim the same blocks",
+                            "run check");
+                note.check = "V04";
+                notes->push_back(note);
+            }
+        }
+    }
+}
+
+// Node size a tree's header states, 0 when it cannot be read or is no node size.
+u32 StatedNodeSize(ImageVolume::State* state, u32 fileId) {
+    const HfsFork* fork = state->header.ForkOf(fileId);
+    if (fork->extents[0].blockCount == 0) {
+        return 0;
+    }
+    u8 bytes[2];
+    const u64 at = u64{fork->extents[0].startBlock} * state->header.blockSize + kNodeSizeInFork;
+    if (!state->volume->Read(at, bytes, sizeof bytes).Ok()) {
+        return 0;
+    }
+    const u32 size = Be16(bytes);
+    return IsPowerOfTwo(size) && size >= (1u << kMinNodeShift) && size <= (1u << kMaxNodeShift)
+               ? size
+               : 0;
+}
+
+// The map block is the smallest node size of the volume's trees, so that nearly every node is one
+// piece in memory whatever the allocation block.
+Problem ChooseMapBlock(ImageVolume::State* state) {
+    u32 smallest = 0;
+    for (std::size_t i = 0; i < kTreeCount; ++i) {
+        const u32 size = StatedNodeSize(state, kSpecialFileIds[i]);
+        if (size != 0 && (smallest == 0 || size < smallest)) {
+            smallest = size;
+        }
+    }
+    const u32 wanted = state->options.mapBlockSize;
+    if (wanted != 0) {
+        if (!IsPowerOfTwo(wanted) || wanted < kSectorSize || wanted > (1u << kMaxNodeShift)) {
+            return UsageProblem(
+                "map block " + std::to_string(wanted) + " is not a power of two from 512 to 32,768",
+                "");
+        }
+        if (smallest != 0 && wanted > smallest) {
+            return UsageProblem("map block " + Grouped(wanted) +
+                                    ": the smallest node of the volume has " + Grouped(smallest) +
+                                    " bytes",
+                                "give at most that");
+        }
+        smallest = wanted;
+    } else if (smallest == 0) {
+        smallest = kSectorSize;
+    }
+    state->fs.mapBlockSize = static_cast<u16>(smallest);
+    state->fs.mapBlockShift = Log2(smallest);
+    return {};
+}
+
+void FillFileSystem(ImageVolume::State* state) {
+    const VolumeHeader& header = state->header;
+    CFileSystemHfs& fs = state->fs;
+    fs.allocBlockSize = header.blockSize;
+    fs.allocBlockShift = Log2(header.blockSize);
+    fs.totalBlocks = header.totalBlocks;
+    fs.volumeSize = state->volumeBytes;
+    fs.version = header.version;
+    fs.defaultClumpSize = header.dataClumpSize;
+    for (const u32 fileId : kSpecialFileIds) {
+        *fs.ForkOf(fileId) = *header.ForkOf(fileId);
+    }
+    state->InstallServices();
+}
+
+// Stacks the devices: image, changes in memory, open transaction, the volume's part of it.
+void StackDevices(ImageVolume::State* state) {
+    BlockDevice* home = state->image.get();
+    if (state->options.access == Access::kOverlay) {
+        state->overlay = std::make_unique<OverlayDevice>(home);
+        home = state->overlay.get();
+    }
+    BlockDevice* top = home;
+    if (state->options.access != Access::kReadOnly) {
+        state->transaction = std::make_unique<Transaction>(home);
+        top = state->transaction->Staged();
+    }
+    state->volume = std::make_unique<SliceDevice>(top, state->place.offset, state->volumeBytes);
+}
+
+Problem ReadHeaders(ImageVolume::State* state) {
+    const VolumePlace& place = state->place;
+    const u64 mainOffset = place.offset + kHeaderOffset;
+    const bool hasMain = ReadHeaderAt(state->image.get(), mainOffset, &state->header);
+    const Problem mainProblem =
+        hasMain ? CheckHeader(state->header, mainOffset)
+                : FailureAt(mainOffset, "volume header at " + Grouped(mainOffset) + ": unreadable",
+                            "try --backup-header");
+    state->alternateOffset = FindAlternate(
+        state->image.get(), place, mainProblem ? nullptr : &state->header, &state->alternate);
+    if (!state->options.backupHeader) {
+        return mainProblem;
+    }
+    if (!state->alternateOffset) {
+        return FailureAt(place.offset + place.size - kAltHeaderFromEnd,
+                         "alternate volume header at " +
+                             Grouped(place.offset + place.size - kAltHeaderFromEnd) +
+                             ": there is none",
+                         "");
+    }
+    state->header = state->alternate;
+    state->usedBackup = true;
+    Problem problem = CheckHeader(state->header, *state->alternateOffset);
+    problem.advice.clear();
+    return problem;
+}
+
+}  // namespace
+
+Problem ImageVolume::State::Mount(VolumeScan* scan) {
+    PlaceOptions where;
+    where.offset = options.offset;
+    where.partition = options.partition;
+    where.lenient = options.backupHeader;
+    if (Problem problem = LocateVolume(image.get(), where, scan)) {
+        return problem;
+    }
+    place = scan->place;
+    if (Problem problem = ReadHeaders(this)) {
+        return problem;
+    }
+    const u64 blocksBytes = u64{header.totalBlocks} * header.blockSize;
+    volumeBytes = std::max(place.size, blocksBytes);
+    if (place.size >= blocksBytes + header.blockSize) {
+        volumeBytes =
+            alternateOffset && *alternateOffset >= place.offset + blocksBytes - kAltHeaderFromEnd
+                ? *alternateOffset + kAltHeaderFromEnd - place.offset
+                : blocksBytes;
+    }
+    StackDevices(this);
+    FillFileSystem(this);
+    if (Problem problem = ChooseMapBlock(this)) {
+        return problem;
+    }
+    if (place.offset + blocksBytes > image->Size()) {
+        isTruncated = true;
+        notes.push_back(TruncatedNote(image->Size(), place, place.offset + blocksBytes));
+    }
+    NoteOverlaps(header, &notes);
+    journal = ReadJournalState(volume.get(), header, place.offset);
+    if (journal.present && !journal.empty) {
+        notes.push_back(
+            FailureAt(journal.offset,
+                      "the journal holds transactions (" + Grouped(journal.pendingBytes) + " B)",
+                      "read as the volume stands without them"));
+    }
+    isWritable = options.access != Access::kReadOnly;
+    if (isWritable) {
+        if (Problem problem = LoadBitmap()) {
+            return problem;
+        }
+        TakeSnapshot();
+    }
+    return {};
+}
+
+}  // namespace VELK

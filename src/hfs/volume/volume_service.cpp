@@ -1,0 +1,201 @@
+// The service tables of an image volume: lends map blocks gathered from wherever the fork lies,
+// stages what comes back.
+//
+// A buffer belongs to the node that mapped it and to nobody else, since a tree caches each node
+// once; so there is nothing to look up here, and releasing a buffer forgets what was not handed
+// over.
+#include <cstring>
+#include <new>
+
+#include "hfs/volume/volume_state.h"
+#include "platform/heap.h"
+
+namespace VELK {
+
+namespace {
+
+// What a buffer_head of this volume points at; the block's bytes follow it.
+struct alignas(16) MapBuffer {
+    HfsRuns* runs;
+    u64 offset;  // of the block in its fork
+    u32 fileId;
+    u32 size;
+
+    u8* Bytes() { return reinterpret_cast<u8*>(this + 1); }
+};
+
+MapBuffer* BufferOf(buffer_head* bh) {
+    return reinterpret_cast<MapBuffer*>(bh);
+}
+
+ImageVolume::State* StateOf(void* self);
+
+void ReleaseBuffers(HfsBcbBuf* bufs, u32 count) {
+    for (u32 i = 0; i < count; ++i) {
+        velk_heap_free(bufs[i].bh);
+        bufs[i].bh = nullptr;
+        bufs[i].data = nullptr;
+    }
+}
+
+}  // namespace
+
+// Puts a failed transfer into words and returns its status.
+int ImageVolume::State::IoStatus(const IoResult& result, u32 fileId, u64 forkOffset, bool isWrite) {
+    if (result.error == kIoNoMemory) {
+        return kErrNoMemory;
+    }
+    const u64 at = place.offset + result.offset;
+    std::string where =
+        fileId == 0 ? std::string("volume") : std::string(ForkName(fileId)) + " file";
+    std::optional<u32> node;
+    TreeSlot* slot = Slot(fileId);
+    if (slot != nullptr && slot->isOpen) {
+        node = static_cast<u32>(forkOffset >> slot->Get()->nodeShift);
+        where = std::string(ForkName(fileId)) + " node " + std::to_string(*node);
+    }
+    if (result.error == kIoPastEnd) {
+        lastIo = FailureAt(at,
+                           "image ends at " + Grouped(image->Size()) + ", " + where + " (" +
+                               HexOffset(at) + ") lies behind that",
+                           "");
+        lastIo.status = kErrVolumeTruncated;
+    } else {
+        lastIo = FailureAt(at,
+                           std::string(isWrite ? "write" : "read") + " error at " + HexOffset(at) +
+                               " (" + where + "): " + IoErrorText(result.error),
+                           "");
+        lastIo.status = result.error == kIoReadOnly ? kErrVolumeReadOnly : kErrVolumeIo;
+    }
+    lastIo.fileId = fileId;
+    lastIo.node = node;
+    return lastIo.status;
+}
+
+int ImageVolume::State::ReadBytes(const HfsRuns& runs, u32 fileId, u64 offset, void* target,
+                                  u64 bytes) {
+    u8* out = static_cast<u8*>(target);
+    return ForEachPiece(runs, fs.allocBlockShift, offset, bytes, kErrVolumeUnmapped,
+                        [&](u64 at, u64 done, u64 piece) {
+                            const IoResult result =
+                                volume->Read(at, out + done, static_cast<std::size_t>(piece));
+                            return result.Ok() ? 0 : IoStatus(result, fileId, offset, false);
+                        });
+}
+
+int ImageVolume::State::WriteBytes(const HfsRuns& runs, u32 fileId, u64 offset, const void* source,
+                                   u64 bytes) {
+    if (!isWritable) {
+        return kErrVolumeReadOnly;
+    }
+    const u8* in = static_cast<const u8*>(source);
+    return ForEachPiece(runs, fs.allocBlockShift, offset, bytes, kErrVolumeUnmapped,
+                        [&](u64 at, u64 done, u64 piece) {
+                            const IoResult result =
+                                volume->Write(at, in + done, static_cast<std::size_t>(piece));
+                            return result.Ok() ? 0 : IoStatus(result, fileId, offset, true);
+                        });
+}
+
+int ImageVolume::State::ZeroBytes(const HfsRuns& runs, u32 fileId, u64 offset, u64 bytes) {
+    if (!isWritable) {
+        return kErrVolumeReadOnly;
+    }
+    return ForEachPiece(runs, fs.allocBlockShift, offset, bytes, kErrVolumeUnmapped,
+                        [&](u64 at, u64, u64 piece) {
+                            const IoResult result = volume->Zero(at, piece);
+                            return result.Ok() ? 0 : IoStatus(result, fileId, offset, true);
+                        });
+}
+
+namespace {
+
+ImageVolume::State* StateOf(void* self) {
+    return static_cast<ImageVolume::State*>(self);
+}
+
+int LendBlock(ImageVolume::State* state, HfsRuns* runs, u32 fileId, u64 offset, bool noRead,
+              HfsBcbBuf* buf) {
+    const u32 size = state->fs.mapBlockSize;
+    void* memory = velk_heap_alloc(sizeof(MapBuffer) + size);
+    if (memory == nullptr) {
+        return kErrNoMemory;
+    }
+    MapBuffer* buffer = new (memory) MapBuffer{runs, offset, fileId, size};
+    int status = 0;
+    if (noRead) {
+        // Nothing is read, but a block that lies nowhere is found out here and not when it is
+        // handed over.
+        std::memset(buffer->Bytes(), 0, size);
+        status = ForEachPiece(*runs, state->fs.allocBlockShift, offset, size, kErrVolumeUnmapped,
+                              [](u64, u64, u64) { return 0; });
+    } else {
+        status = state->ReadBytes(*runs, fileId, offset, buffer->Bytes(), size);
+    }
+    if (status != 0) {
+        velk_heap_free(memory);
+        return status;
+    }
+    buf->bh = reinterpret_cast<buffer_head*>(buffer);
+    buf->data = buffer->Bytes();
+    return 0;
+}
+
+int Map(void* self, CFileSystemHfs*, HfsRuns* runs, HfsFork*, u8, u32 fileId, u64 byteOffset,
+        u32 bytes, bool noRead, HfsBcbBuf* bufs) {
+    ImageVolume::State* state = StateOf(self);
+    const u32 blockSize = state->fs.mapBlockSize;
+    const u32 count = bytes / blockSize;
+    for (u32 i = 0; i < count; ++i) {
+        const int status =
+            LendBlock(state, runs, fileId, byteOffset + u64{i} * blockSize, noRead, &bufs[i]);
+        if (status != 0) {
+            ReleaseBuffers(bufs, i);
+            return status;
+        }
+    }
+    return 0;
+}
+
+int DirtyMeta(void* self, CFileSystemHfs*, buffer_head* bh) {
+    ImageVolume::State* state = StateOf(self);
+    MapBuffer* buffer = BufferOf(bh);
+    const int status = state->WriteBytes(*buffer->runs, buffer->fileId, buffer->offset,
+                                         buffer->Bytes(), buffer->size);
+    if (status == 0) {
+        state->handedOver += 1;
+    }
+    return status;
+}
+
+int Zero(void* self, CFileSystemHfs*, HfsRuns* runs, HfsFork*, u8, u32 fileId, u64 byteOffset,
+         u64 bytes) {
+    return StateOf(self)->ZeroBytes(*runs, fileId, byteOffset, bytes);
+}
+
+int Resize(void* self, CFileSystemHfs*, HfsRuns* runs, HfsFork*, u8, u32 fileId, u64 newSize) {
+    return StateOf(self)->Resize(runs, fileId, newSize);
+}
+
+void Release(void*, buffer_head* bh, int) {
+    velk_heap_free(bh);
+}
+
+// The bytes of a buffer are the node's own until they are handed over: nothing to open or close.
+void BeginModify(void*, buffer_head*) {}
+void EndModify(void*, buffer_head*) {}
+
+constexpr HfsVolumeOps kVolumeOps = {Map, DirtyMeta, Zero, Resize};
+constexpr HfsCacheOps kCacheOps = {Release, BeginModify, EndModify};
+
+}  // namespace
+
+void ImageVolume::State::InstallServices() {
+    fs.service.ops = &kVolumeOps;
+    fs.service.self = this;
+    fs.cache.ops = &kCacheOps;
+    fs.cache.self = this;
+    fs.bitmap = &bitmap;
+}
+
+}  // namespace VELK
