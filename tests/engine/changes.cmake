@@ -1,0 +1,8 @@
+# Changes to trees: insertion, sharing, splits, update, deletion.
+add_executable(change_tests
+  churn_test.cpp
+  flat_tree.cpp
+)
+target_link_libraries(change_tests PRIVATE test_support treehfs velk_host GTest::gtest_main)
+add_test(NAME change_tests COMMAND change_tests)
+set_tests_properties(change_tests PROPERTIES TIMEOUT 300)
