@@ -151,17 +151,18 @@ int MemVolume::OnMap(void* self, CFileSystemHfs* fs, HfsRuns* /*runs*/, HfsFork*
     }
     for (u32 b = 0; b < bytes / blockSize; ++b) {
         auto block = std::make_unique<Block>();
-        block->data.reset(new u8[blockSize]);
+        block->memory.reset(new u8[blockSize + volume->options.misalign]);
+        block->data = block->memory.get() + volume->options.misalign;
         block->fileId = fileId;
         block->offset = byteOffset + static_cast<u64>(b) * blockSize;
         if (noRead) {
-            std::memset(block->data.get(), 0xA5, blockSize);
+            std::memset(block->data, 0xA5, blockSize);
         } else {
-            std::memcpy(block->data.get(), file.data() + block->offset, blockSize);
+            std::memcpy(block->data, file.data() + block->offset, blockSize);
         }
         buffer_head* bh = reinterpret_cast<buffer_head*>(block.get());
         bufs[b].bh = bh;
-        bufs[b].data = block->data.get();
+        bufs[b].data = block->data;
         volume->lent_[bh] = std::move(block);
     }
     return kOk;
@@ -181,7 +182,7 @@ int MemVolume::OnDirtyMeta(void* self, CFileSystemHfs* fs, buffer_head* bh) {
     if (block->offset + fs->mapBlockSize > file.size()) {
         return kMemNoRange;
     }
-    std::memcpy(file.data() + block->offset, block->data.get(), fs->mapBlockSize);
+    std::memcpy(file.data() + block->offset, block->data, fs->mapBlockSize);
     return kOk;
 }
 

@@ -57,6 +57,7 @@ struct MemVolumeOptions {
     bool hasJournal = false;
     u64 maxFileSize = ~0ull;  // Resize beyond fails
     u8 stale = 0xE5;          // what freshly allocated disk bytes hold
+    u32 misalign = 0;         // bytes every block is off its alignment
 };
 
 class MemVolume {
@@ -92,7 +93,8 @@ public:
 
 private:
     struct Block {
-        std::unique_ptr<u8[]> data;
+        std::unique_ptr<u8[]> memory;
+        u8* data;
         u32 fileId;
         u64 offset;
         bool access = false;
