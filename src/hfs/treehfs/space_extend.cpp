@@ -87,9 +87,8 @@ int BuildMapNode(CBTreeHfs* tree, u32 nodeNum, u32 next) {
     const BTHeaderMem* hdr = &tree->header;
     NodeRef node;
     HFS_TRY(tree->GetINode(nodeNum, node.Out(), true), 4104);
-    // The node comes empty but not always marked: its blocks may have been zero on disk.
+    // An emptied node has its last block marked, but its first may have been zero and stay clean.
     HFS_TRY(tree->SetDirty(node.Get(), 0), 9425);
-    HFS_TRY(tree->SetDirty(node.Get(), SlotOffset(hdr, 1)), 9426);
     SetKind(hdr, node.Get(), kBTMapNode);
     SetNumRecords(hdr, node.Get(), 1);
     NodePtr slot;
