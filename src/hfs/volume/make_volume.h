@@ -26,6 +26,7 @@ struct FormatOptions {
     std::u16string name = u"Untitled";  // decomposed
     u32 date = 0;                       // seconds since 1904, written to every date
     u64 uuid = 0;                       // volume identifier
+    bool deviceIsZero = false;          // just made: nothing has to be zeroed
     u32 mapBlockSize = 0;               // of the mounted volume; 0: the smallest node size
 };
 
