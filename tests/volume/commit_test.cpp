@@ -1,0 +1,351 @@
+// Changes: committed all together, gone after a restore, kept out of the image by an overlay.
+#include <gtest/gtest.h>
+
+#include <cstring>
+
+#include "capture.h"
+#include "hfs/volume/convert.h"
+#include "hfs/volume/make_volume.h"
+#include "hfs/volume/wire.h"
+
+namespace VELK {
+namespace {
+
+// Catalog key of a thread-like record in host order: number as parent, empty name.
+struct alignas(4) NumberKey {
+    u8 bytes[kCatKeyName] = {};
+
+    explicit NumberKey(u32 number) {
+        const u16 length = kCatKeyFixed;
+        std::memcpy(bytes, &length, sizeof length);
+        std::memcpy(bytes + kCatKeyParentId, &number, sizeof number);
+    }
+};
+
+class CommitTest : public testing::Test {
+protected:
+    void Make(u64 size, const FormatOptions& options) {
+        volume_ = MakeMemoryVolume(size, options, &problem_);
+        ASSERT_NE(nullptr, volume_) << problem_.Text();
+        size_ = size;
+    }
+    static FormatOptions Small() {
+        FormatOptions options;
+        options.blockSize = 512;
+        options.catalogNodeSize = 512;
+        options.extentsNodeSize = 512;
+        options.attributesNodeSize = 512;
+        options.clumpSize = 512;
+        return options;
+    }
+    CBTreeHfs* Catalog() { return volume_->Tree(kCatalogFileId, &problem_); }
+    int Insert(u32 number) {
+        const NumberKey key(number);
+        const u8 data[100] = {0xFF, 0xFF};
+        return Catalog()->InsertRecord(key.bytes, number, data, sizeof data);
+    }
+    bool Has(u32 number) {
+        const NumberKey key(number);
+        HfsFindData path;
+        bool found = false;
+        EXPECT_EQ(0, Catalog()->FindEntry(reinterpret_cast<const BTreeKey*>(key.bytes), number,
+                                          &path, &found, nullptr, nullptr, nullptr, nullptr));
+        path.ClearPath();
+        return found;
+    }
+    std::vector<u8> Bytes() {
+        std::vector<u8> bytes(static_cast<std::size_t>(size_));
+        EXPECT_EQ(0, volume_->ReadVolume(0, bytes.data(), bytes.size()));
+        return bytes;
+    }
+
+    test::Capture capture_;
+    Problem problem_;
+    u64 size_ = 0;
+    std::unique_ptr<ImageVolume> volume_;
+};
+
+TEST_F(CommitTest, NothingReachesTheDeviceBeforeTheCommit) {
+    Make(1 << 20, Small());
+    const std::vector<u8> before = Bytes();
+    ASSERT_EQ(0, Insert(100));
+    EXPECT_EQ(before, Bytes());
+    ASSERT_EQ(0, volume_->Commit(0));
+    EXPECT_NE(before, Bytes());
+    EXPECT_TRUE(Has(100));
+}
+
+TEST_F(CommitTest, ACommitWithoutChangesWritesNothing) {
+    Make(1 << 20, Small());
+    const u64 written = volume_->CommittedBytes();
+    ASSERT_EQ(0, volume_->Commit(0));
+    EXPECT_EQ(written, volume_->CommittedBytes());
+}
+
+TEST_F(CommitTest, RestoreLeavesTheLastCommitByteForByte) {
+    Make(1 << 20, Small());
+    for (u32 i = 100; i < 200; ++i) {
+        ASSERT_EQ(0, Insert(i));
+    }
+    ASSERT_EQ(0, volume_->Commit(0));
+    const std::vector<u8> committed = Bytes();
+    const u32 freeBlocks = volume_->Header().freeBlocks;
+    for (u32 i = 200; i < 3000; ++i) {
+        ASSERT_EQ(0, Insert(i));
+    }
+    ASSERT_EQ(0, Catalog()->Flush(0));  // staged, not committed
+    for (u32 i = 3000; i < 3100; ++i) {
+        ASSERT_EQ(0, Insert(i));
+    }
+    volume_->CountCatalogRecord(1, 5000, 1);
+    EXPECT_NE(freeBlocks, volume_->Header().freeBlocks);
+    volume_->Restore();
+    EXPECT_EQ(committed, Bytes());
+    EXPECT_EQ(freeBlocks, volume_->Header().freeBlocks);
+    EXPECT_EQ(0u, volume_->Header().folderCount);
+    EXPECT_EQ(102u, Catalog()->header.leafRecords);
+    EXPECT_TRUE(Has(199));
+    EXPECT_FALSE(Has(200));
+    EXPECT_TRUE(volume_->IsWritable());
+    EXPECT_FALSE(Catalog()->IsDirty());
+    ASSERT_EQ(0, volume_->Commit(0));
+    EXPECT_EQ(committed, Bytes());
+}
+
+// The work that a restore threw away can be done again and gives the bytes it would have given.
+TEST_F(CommitTest, WorkAfterARestoreEqualsUndisturbedWork) {
+    Make(1 << 20, Small());
+    for (u32 i = 100; i < 2000; ++i) {
+        ASSERT_EQ(0, Insert(i));
+    }
+    volume_->Restore();
+    for (u32 i = 100; i < 1000; ++i) {
+        ASSERT_EQ(0, Insert(i));
+    }
+    ASSERT_EQ(0, volume_->Commit(0));
+    const std::vector<u8> disturbed = Bytes();
+    Make(1 << 20, Small());
+    for (u32 i = 100; i < 1000; ++i) {
+        ASSERT_EQ(0, Insert(i));
+    }
+    ASSERT_EQ(0, volume_->Commit(0));
+    EXPECT_EQ(Bytes(), disturbed);
+}
+
+TEST_F(CommitTest, ATreeMadeAndNotCommittedIsGoneAfterARestore) {
+    FormatOptions options = Small();
+    options.withAttributes = false;
+    Make(1 << 20, options);
+    const std::vector<u8> before = Bytes();
+    ASSERT_EQ(0, volume_->CreateTree(kAttributesFileId, 9, nullptr));
+    EXPECT_TRUE(volume_->HasTree(kAttributesFileId));
+    volume_->Restore();
+    EXPECT_FALSE(volume_->HasTree(kAttributesFileId));
+    EXPECT_EQ(before, Bytes());
+    ASSERT_EQ(0, volume_->CreateTree(kAttributesFileId, 9, nullptr));
+    ASSERT_EQ(0, volume_->Commit(0));
+    volume_->Restore();
+    EXPECT_TRUE(volume_->HasTree(kAttributesFileId));
+}
+
+TEST_F(CommitTest, OnlyFailuresThatMayHaveChangedSomethingRestore) {
+    Make(1 << 20, Small());
+    EXPECT_FALSE(volume_->RestoreAfter(kOk));
+    EXPECT_FALSE(volume_->RestoreAfter(kErrNotFound));
+    EXPECT_FALSE(volume_->RestoreAfter(kErrExists));
+    EXPECT_FALSE(volume_->RestoreAfter(kErrTooLarge));
+    EXPECT_TRUE(volume_->RestoreAfter(kErrNoSpace));
+    EXPECT_TRUE(volume_->RestoreAfter(kErrCorrupt));
+}
+
+TEST_F(CommitTest, AFullVolumeRefusesGrowthAndKeepsWhatWasCommitted) {
+    Make(96 << 10, Small());
+    int status = 0;
+    u32 number = 100;
+    while (status == 0 && number < 100000) {
+        status = Insert(number);
+        number += 1;
+        if (status == 0 && number % 50 == 0) {
+            ASSERT_EQ(0, volume_->Commit(0));
+        }
+    }
+    EXPECT_EQ(kErrNoSpace, status);
+    EXPECT_TRUE(volume_->RestoreAfter(status));
+    EXPECT_TRUE(Has(number / 50 * 50 - 1));
+    EXPECT_FALSE(Has(number));
+}
+
+// Two trees growing in turn take blocks between each other's, so their forks fall apart.
+class OverflowTest : public CommitTest {
+protected:
+    void GrowInTurn(u32 steps) {
+        for (u32 i = 0; i < steps; ++i) {
+            for (const u32 fileId : {kCatalogFileId, kAttributesFileId}) {
+                CBTreeHfs* tree = volume_->Tree(fileId, &problem_);
+                ASSERT_NE(nullptr, tree);
+                ASSERT_EQ(0, tree->ExtendBTree(tree->header.totalNodes + 1, nullptr, nullptr));
+            }
+        }
+    }
+    u32 InlineBlocks(u32 fileId) {
+        u32 blocks = 0;
+        for (const HfsExtent& extent : volume_->Fs()->ForkOf(fileId)->extents) {
+            blocks += extent.blockCount;
+        }
+        return blocks;
+    }
+};
+
+TEST_F(OverflowTest, ForksOfMoreThanEightExtentsComeBackWhole) {
+    Make(1 << 20, Small());
+    GrowInTurn(40);
+    ASSERT_EQ(0, volume_->Commit(0));
+    const std::vector<HfsExtent> extents = volume_->ForkExtents(kCatalogFileId);
+    ASSERT_GT(extents.size(), 24u);
+    EXPECT_LT(InlineBlocks(kCatalogFileId), volume_->Fs()->catalogFork.totalBlocks);
+
+    const std::vector<u8> bytes = Bytes();
+    auto device = std::make_unique<MemoryDevice>(bytes.size());
+    ASSERT_TRUE(device->Write(0, bytes.data(), bytes.size()).Ok());
+    auto again = ImageVolume::Open(std::move(device), OpenOptions{}, nullptr, &problem_);
+    ASSERT_NE(nullptr, again) << problem_.Text();
+    ASSERT_NE(nullptr, again->Tree(kCatalogFileId, &problem_)) << problem_.Text();
+    const std::vector<HfsExtent> found = again->ForkExtents(kCatalogFileId);
+    ASSERT_EQ(extents.size(), found.size());
+    for (std::size_t i = 0; i < found.size(); ++i) {
+        EXPECT_EQ(extents[i].startBlock, found[i].startBlock) << i;
+        EXPECT_EQ(extents[i].blockCount, found[i].blockCount) << i;
+    }
+    const u32 records = again->Tree(kExtentsFileId, &problem_)->header.leafRecords;
+    EXPECT_EQ(
+        (extents.size() - 8 + 7) / 8 + (again->ForkExtents(kAttributesFileId).size() - 8 + 7) / 8,
+        records);
+    EXPECT_TRUE(again->Notes().empty());
+}
+
+TEST_F(OverflowTest, RecordsFollowAForkThatGrowsFurther) {
+    Make(1 << 20, Small());
+    GrowInTurn(12);
+    ASSERT_EQ(0, volume_->Commit(0));
+    GrowInTurn(12);
+    ASSERT_EQ(0, volume_->Commit(0));
+    // The catalog's first growth continues its only extent, so it has one extent less.
+    EXPECT_EQ(24u, volume_->ForkExtents(kCatalogFileId).size());     // 8 and two full records
+    EXPECT_EQ(25u, volume_->ForkExtents(kAttributesFileId).size());  // 8 and three, the last of 1
+    EXPECT_EQ(5u, volume_->Tree(kExtentsFileId, &problem_)->header.leafRecords);
+}
+
+TEST_F(OverflowTest, ARestoreDropsRecordsNotCommitted) {
+    Make(1 << 20, Small());
+    const std::vector<u8> before = Bytes();
+    GrowInTurn(20);
+    volume_->Restore();
+    EXPECT_EQ(1u, volume_->ForkExtents(kCatalogFileId).size());
+    ASSERT_EQ(0, volume_->Commit(0));
+    EXPECT_EQ(before, Bytes());
+}
+
+TEST_F(OverflowTest, TheExtentsTreeItselfStopsAtEightExtents) {
+    Make(1 << 20, Small());
+    int status = 0;
+    for (u32 i = 0; i < 40 && status == 0; ++i) {
+        CBTreeHfs* catalog = volume_->Tree(kCatalogFileId, &problem_);
+        CBTreeHfs* extents = volume_->Tree(kExtentsFileId, &problem_);
+        ASSERT_EQ(0, catalog->ExtendBTree(catalog->header.totalNodes + 1, nullptr, nullptr));
+        status = extents->ExtendBTree(extents->header.totalNodes + 1, nullptr, nullptr);
+    }
+    EXPECT_EQ(kErrNoSpace, status);
+    EXPECT_EQ(8u, volume_->ForkExtents(kExtentsFileId).size());
+}
+
+TEST_F(CommitTest, AnOverlayNeverWritesTheImage) {
+    Make(1 << 20, Small());
+    const std::vector<u8> image = Bytes();
+    auto device = std::make_unique<MemoryDevice>(image.size());
+    MemoryDevice* home = device.get();
+    ASSERT_TRUE(device->Write(0, image.data(), image.size()).Ok());
+    OpenOptions options;
+    options.access = Access::kOverlay;
+    volume_ = ImageVolume::Open(std::move(device), options, nullptr, &problem_);
+    ASSERT_NE(nullptr, volume_) << problem_.Text();
+    for (u32 i = 100; i < 500; ++i) {
+        ASSERT_EQ(0, Insert(i));
+    }
+    ASSERT_EQ(0, volume_->Commit(0));
+    EXPECT_TRUE(Has(499));
+    EXPECT_NE(image, Bytes());
+    std::vector<u8> below(image.size());
+    ASSERT_TRUE(home->Read(0, below.data(), below.size()).Ok());
+    EXPECT_EQ(image, below);
+}
+
+TEST_F(CommitTest, AReadOnlyVolumeRefusesEveryChange) {
+    Make(1 << 20, Small());
+    const std::vector<u8> image = Bytes();
+    auto device = std::make_unique<MemoryDevice>(image.size());
+    ASSERT_TRUE(device->Write(0, image.data(), image.size()).Ok());
+    volume_ = ImageVolume::Open(std::move(device), OpenOptions{}, nullptr, &problem_);
+    ASSERT_NE(nullptr, volume_) << problem_.Text();
+    EXPECT_FALSE(volume_->IsWritable());
+    ASSERT_EQ(0, Insert(100));
+    EXPECT_EQ(kErrVolumeReadOnly, Catalog()->Flush(0));
+    EXPECT_EQ(kErrVolumeReadOnly, volume_->Commit(0));
+    EXPECT_EQ(kErrVolumeReadOnly, volume_->CreateTree(kAttributesFileId, 12, nullptr));
+    EXPECT_EQ(image, Bytes());
+}
+
+TEST_F(CommitTest, HeaderCountsFollowCatalogRecords) {
+    Make(1 << 20, Small());
+    volume_->CountCatalogRecord(1, 16, 1);
+    volume_->CountCatalogRecord(2, 40, 1);
+    volume_->CountCatalogRecord(2, 17, 1);
+    volume_->CountCatalogRecord(3, 16, 1);
+    volume_->CountCatalogRecord(2, 17, -1);
+    ASSERT_EQ(0, volume_->Commit(0));
+    const std::vector<u8> bytes = Bytes();
+    EXPECT_EQ(1u, Be32(bytes.data() + 1024 + 32));
+    EXPECT_EQ(1u, Be32(bytes.data() + 1024 + 36));
+    EXPECT_EQ(41u, Be32(bytes.data() + 1024 + 64));
+}
+
+// The cache falls back under its budget, and a path held by a caller stays good.
+TEST_F(CommitTest, TrimCacheKeepsHeldAndModifiedNodes) {
+    FormatOptions small = Small();
+    small.name = u"Trim";
+    Make(1 << 20, small);
+    for (u32 i = 100; i < 900; ++i) {
+        ASSERT_EQ(0, Insert(i));
+    }
+    ASSERT_EQ(0, volume_->Commit(0));
+    const std::vector<u8> image = Bytes();
+    auto device = std::make_unique<MemoryDevice>(image.size());
+    ASSERT_TRUE(device->Write(0, image.data(), image.size()).Ok());
+    OpenOptions options;
+    options.access = Access::kOverlay;
+    options.cacheBudget = 8192;
+    volume_ = ImageVolume::Open(std::move(device), options, nullptr, &problem_);
+    ASSERT_NE(nullptr, volume_) << problem_.Text();
+    const NumberKey key(500);
+    HfsFindData path;
+    bool found = false;
+    ASSERT_EQ(0, Catalog()->FindEntry(reinterpret_cast<const BTreeKey*>(key.bytes), 500, &path,
+                                      &found, nullptr, nullptr, nullptr, nullptr));
+    ASSERT_TRUE(found);
+    ASSERT_EQ(0, Insert(1000));
+    u64 most = 0;
+    for (u32 i = 100; i < 900; ++i) {
+        EXPECT_TRUE(Has(i));
+        volume_->TrimCache();
+        most = std::max(most, volume_->CachedBytes());
+    }
+    EXPECT_LT(most, 24000u);
+    EXPECT_TRUE(Has(1000));
+    u8 record[128];
+    unsigned size = 0;
+    EXPECT_EQ(0, Catalog()->IncPos(0, record, sizeof record, &size, nullptr, 0, nullptr, &path));
+    EXPECT_EQ(100u, size);
+    path.ClearPath();
+}
+
+}  // namespace
+}  // namespace VELK
