@@ -1,0 +1,87 @@
+// One catalog file in chunks of memory. See memory_volume.h.
+#include "memory_volume.h"
+
+#include <cstring>
+
+#include "platform/error.h"
+
+namespace VELK::bench {
+
+namespace {
+
+constexpr u64 kVolumeSize = (u64{1} << 30) - 4096;  // below the size that has clumps of its own
+constexpr int kNoRange = 0x101;
+
+}  // namespace
+
+const HfsVolumeOps MemoryVolume::kVolumeOps = {Map, DirtyMeta, Zero, Resize};
+const HfsCacheOps MemoryVolume::kCacheOps = {Release, Modify, Modify};
+
+MemoryVolume::MemoryVolume() {
+    fs.service = {&kVolumeOps, this};
+    fs.cache = {&kCacheOps, this};
+    fs.mapBlockShift = kMapShift;
+    fs.mapBlockSize = 1u << kMapShift;
+    fs.allocBlockShift = kMapShift;
+    fs.allocBlockSize = 1u << kMapShift;
+    fs.volumeSize = kVolumeSize;
+    fs.totalBlocks = static_cast<u32>(kVolumeSize >> kMapShift);
+    fs.defaultClumpSize = 1u << kChunkShift;
+    bitmapBytes_.resize(fs.totalBlocks / 8);
+    bitmap_.Attach(bitmapBytes_.data(), fs.totalBlocks);
+    fs.bitmap = &bitmap_;
+}
+
+MemoryVolume::~MemoryVolume() {
+    for (u8* chunk : chunks_) {
+        std::free(chunk);
+    }
+}
+
+int MemoryVolume::Map(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u32, u64 byteOffset,
+                      u32 bytes, bool, HfsBcbBuf* bufs) {
+    if (byteOffset + bytes > fs->catalogFork.logicalSize) {
+        return kNoRange;
+    }
+    auto* volume = static_cast<MemoryVolume*>(self);
+    for (u32 i = 0; i < bytes >> kMapShift; ++i) {
+        bufs[i].data = volume->At(byteOffset + (u64{i} << kMapShift));
+        bufs[i].bh = reinterpret_cast<buffer_head*>(bufs[i].data);
+    }
+    return kOk;
+}
+
+int MemoryVolume::DirtyMeta(void*, CFileSystemHfs*, buffer_head*) {
+    return kOk;
+}
+
+int MemoryVolume::Zero(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u32, u64 byteOffset,
+                       u64 bytes) {
+    if (byteOffset + bytes > fs->catalogFork.logicalSize) {
+        return kNoRange;
+    }
+    for (u64 at = byteOffset; at < byteOffset + bytes; at += 1u << kMapShift) {
+        std::memset(static_cast<MemoryVolume*>(self)->At(at), 0, 1u << kMapShift);
+    }
+    return kOk;
+}
+
+int MemoryVolume::Resize(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u32, u64 newSize) {
+    auto* volume = static_cast<MemoryVolume*>(self);
+    while (volume->BytesHeld() < newSize) {
+        void* chunk = std::calloc(1, std::size_t{1} << kChunkShift);
+        if (chunk == nullptr) {
+            return kErrNoSpace;
+        }
+        volume->chunks_.push_back(static_cast<u8*>(chunk));
+    }
+    fs->catalogFork.logicalSize = newSize;
+    fs->catalogFork.totalBlocks = static_cast<u32>((newSize + (1u << kMapShift) - 1) >> kMapShift);
+    return kOk;
+}
+
+void MemoryVolume::Release(void*, buffer_head*, int) {}
+
+void MemoryVolume::Modify(void*, buffer_head*) {}
+
+}  // namespace VELK::bench
