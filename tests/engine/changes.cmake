@@ -2,6 +2,8 @@
 add_executable(change_tests
   churn_test.cpp
   flat_tree.cpp
+  record_delete_test.cpp
+  record_insert_test.cpp
 )
 target_link_libraries(change_tests PRIVATE test_support treehfs velk_host GTest::gtest_main)
 add_test(NAME change_tests COMMAND change_tests)

@@ -85,7 +85,10 @@ LooseNode::LooseNode(const Bytes& bytes, u32 mapBlockSize, u32 nodeNum, bool dir
     }
 }
 
-LooseNode::~LooseNode() = default;
+// A tree may have queued the node; it outlives it.
+LooseNode::~LooseNode() {
+    node_->modifiedLink.Unlink();
+}
 
 Bytes LooseNode::Content() const {
     Bytes content;

@@ -43,21 +43,12 @@ int PutRecord(CBTreeHfs* tree, HfsFindData* path, const InsertKey* key, HfsNode*
     return status;
 }
 
-// Whether nodes allocated for the first record leave the key of the second alone.
-bool SecondIsIntact(const BTHeaderMem* hdr, const LevelChange& change, const InsertKey* second) {
-    return !(change.newNode && WasEmptied(hdr, change.newNode.Get(), second->key)) &&
-           !(change.newRoot && WasEmptied(hdr, change.newRoot.Get(), second->key));
-}
-
 // Puts `first` and then `second`, if there is one, into the level's node.
 int PutRecords(CBTreeHfs* tree, HfsFindData* path, const InsertKey* first, const InsertKey* second,
                HfsNode* node, int index, int level, LevelChange* change) {
     HFS_TRY(PutRecord(tree, path, first, node, node->nodeNum, index, level, change), 4639);
     if (second == nullptr) {
         return kOk;
-    }
-    if (!SecondIsIntact(&tree->header, *change, second)) {
-        return Fail(kErrCorrupt, kReasonTree, 9240);
     }
     HFS_TRY(PutRecord(tree, path, second, node, change->nodeNum, change->index + 1, level, change),
             4665);
