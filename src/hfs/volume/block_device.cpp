@@ -36,7 +36,7 @@ MemoryDevice::MemoryDevice(u64 size) : size_(size) {
 
 IoResult MemoryDevice::Read(u64 offset, void* target, std::size_t bytes) {
     if (!Fits(offset, bytes, size_)) {
-        return {kIoPastEnd, std::min(offset, size_)};
+        return {kIoPastEnd, offset};
     }
     u8* out = static_cast<u8*>(target);
     while (bytes > 0) {
@@ -57,7 +57,7 @@ IoResult MemoryDevice::Read(u64 offset, void* target, std::size_t bytes) {
 
 IoResult MemoryDevice::Write(u64 offset, const void* source, std::size_t bytes) {
     if (!Fits(offset, bytes, size_)) {
-        return {kIoPastEnd, std::min(offset, size_)};
+        return {kIoPastEnd, offset};
     }
     const u8* in = static_cast<const u8*>(source);
     while (bytes > 0) {
@@ -80,7 +80,7 @@ IoResult MemoryDevice::Write(u64 offset, const void* source, std::size_t bytes) 
 
 IoResult MemoryDevice::Zero(u64 offset, u64 bytes) {
     if (!Fits(offset, bytes, size_)) {
-        return {kIoPastEnd, std::min(offset, size_)};
+        return {kIoPastEnd, offset};
     }
     while (bytes > 0) {
         const std::size_t at = static_cast<std::size_t>(offset % kChunkSize);
@@ -99,7 +99,7 @@ IoResult MemoryDevice::Zero(u64 offset, u64 bytes) {
 
 IoResult SliceDevice::Read(u64 offset, void* target, std::size_t bytes) {
     if (!Fits(offset, bytes, size_)) {
-        return {kIoPastEnd, std::min(offset, size_)};
+        return {kIoPastEnd, offset};
     }
     IoResult result = base_->Read(offset_ + offset, target, bytes);
     result.offset -= std::min(result.offset, offset_);
@@ -108,7 +108,7 @@ IoResult SliceDevice::Read(u64 offset, void* target, std::size_t bytes) {
 
 IoResult SliceDevice::Write(u64 offset, const void* source, std::size_t bytes) {
     if (!Fits(offset, bytes, size_)) {
-        return {kIoPastEnd, std::min(offset, size_)};
+        return {kIoPastEnd, offset};
     }
     IoResult result = base_->Write(offset_ + offset, source, bytes);
     result.offset -= std::min(result.offset, offset_);
@@ -117,7 +117,7 @@ IoResult SliceDevice::Write(u64 offset, const void* source, std::size_t bytes) {
 
 IoResult SliceDevice::Zero(u64 offset, u64 bytes) {
     if (!Fits(offset, bytes, size_)) {
-        return {kIoPastEnd, std::min(offset, size_)};
+        return {kIoPastEnd, offset};
     }
     IoResult result = base_->Zero(offset_ + offset, bytes);
     result.offset -= std::min(result.offset, offset_);
@@ -126,7 +126,7 @@ IoResult SliceDevice::Zero(u64 offset, u64 bytes) {
 
 IoResult OverlayDevice::Read(u64 offset, void* target, std::size_t bytes) {
     if (!Fits(offset, bytes, Size())) {
-        return {kIoPastEnd, std::min(offset, Size())};
+        return {kIoPastEnd, offset};
     }
     if (pages_.empty()) {
         return base_->Read(offset, target, bytes);
@@ -181,7 +181,7 @@ IoResult OverlayDevice::ReadPage(u64 offset, u8* target, u32 bytes) {
 
 IoResult OverlayDevice::Write(u64 offset, const void* source, std::size_t bytes) {
     if (!Fits(offset, bytes, Size())) {
-        return {kIoPastEnd, std::min(offset, Size())};
+        return {kIoPastEnd, offset};
     }
     const u8* in = static_cast<const u8*>(source);
     while (bytes > 0) {

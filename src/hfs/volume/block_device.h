@@ -24,7 +24,7 @@ constexpr u32 kSectorSize = 512;  // smallest unit anything on a volume is chang
 // Result of one transfer. A failed one may have moved some of the bytes.
 struct IoResult {
     int error = 0;   // 0, a kIo... value, or an errno value
-    u64 offset = 0;  // first byte that could not be transferred
+    u64 offset = 0;  // first byte that could not be transferred; kIoPastEnd: of the range
 
     bool Ok() const { return error == 0; }
 };

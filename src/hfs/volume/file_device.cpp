@@ -119,6 +119,7 @@ FileDevice::~FileDevice() {
 
 IoResult FileDevice::Read(u64 offset, void* target, std::size_t bytes) {
     u8* out = static_cast<u8*>(target);
+    const u64 start = offset;
     while (bytes > 0) {
         const ssize_t count = pread(handle_, out, bytes, static_cast<off_t>(offset));
         if (count < 0) {
@@ -128,7 +129,7 @@ IoResult FileDevice::Read(u64 offset, void* target, std::size_t bytes) {
             return {errno, offset};
         }
         if (count == 0) {
-            return {kIoPastEnd, offset};
+            return {kIoPastEnd, start};
         }
         out += count;
         offset += static_cast<u64>(count);
