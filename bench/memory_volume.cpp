@@ -27,7 +27,7 @@ MemoryVolume::MemoryVolume() {
     fs.volumeSize = kVolumeSize;
     fs.totalBlocks = static_cast<u32>(kVolumeSize >> kMapShift);
     fs.defaultClumpSize = 1u << kChunkShift;
-    bitmapBytes_.resize(fs.totalBlocks / 8);
+    bitmapBytes_.resize((fs.totalBlocks + 7) / 8);
     bitmap_.Attach(bitmapBytes_.data(), fs.totalBlocks);
     fs.bitmap = &bitmap_;
 }
