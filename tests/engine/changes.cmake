@@ -1,5 +1,6 @@
 # Changes to trees: insertion, sharing, splits, update, deletion.
 add_executable(change_tests
+  balance_test.cpp
   churn_test.cpp
   flat_tree.cpp
   record_delete_test.cpp
