@@ -67,8 +67,11 @@ void Invocation::DeclareTrees(TreeDefault treeDefault) {
                      : "catalog, extents or attributes (c e a); default catalog");
 }
 
-void Invocation::DeclareWalk() {
+void Invocation::DeclareRange() {
     options.Text("--range", &range, "FROM..TO", "only records with keys from FROM to TO");
+}
+
+void Invocation::DeclareLimits() {
     options.Count("--limit", &limitNumber_, "N", "at most N records");
     options.Count("--offset-records", &skipNumber_, "N", "leave out the first N records");
 }

@@ -43,7 +43,8 @@ public:
     // --- before Parse: which options the command takes. The general ones are always there. -------
     void DeclareImage();  // IMAGE and what says where the volume lies in it
     void DeclareTrees(TreeDefault treeDefault);
-    void DeclareWalk();        // --range --limit --offset-records
+    void DeclareRange();       // --range
+    void DeclareLimits();      // --limit --offset-records
     void DeclareKeepGoing();   // --keep-going
     void DeclareJson();        // --json
     void DeclareOutputFile();  // -o FILE, --force

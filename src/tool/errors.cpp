@@ -130,6 +130,11 @@ std::string NearestWord(const std::string& wrong, const std::vector<std::string>
     std::string nearest;
     std::size_t best = std::max<std::size_t>(1, std::min<std::size_t>(3, wrong.size() / 2)) + 1;
     for (const std::string& word : words) {
+        if (wrong.size() >= 3 && word.starts_with(wrong)) {
+            return word;
+        }
+    }
+    for (const std::string& word : words) {
         if (wrong.size() > word.size() + 3) {
             continue;
         }

@@ -12,13 +12,10 @@
 namespace VELK::tool {
 
 // One row per command, one file per command.
-extern const Command kHelpCommand, kVersionCommand, kCompletionCommand;
+extern const Command kCompletionCommand, kHelpCommand, kLsCommand, kVersionCommand;
 
 const Command* const kCommands[] = {
-    &kCompletionCommand,
-    &kHelpCommand,
-    &kVersionCommand,
-    nullptr,
+    &kLsCommand, &kCompletionCommand, &kHelpCommand, &kVersionCommand, nullptr,
 };
 
 const Command* FindCommand(const std::string& name) {

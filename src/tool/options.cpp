@@ -261,7 +261,11 @@ void OptionSet::Impl::Run() {
         app.parse(reversed);
     } catch (const CLI::ArgumentMismatch& error) {
         const std::string text = error.what();
-        ThrowUsage(command.name, text.substr(0, text.find(':')) + " needs a value", "");
+        const std::size_t colon = text.find(':');
+        if (colon == std::string::npos) {
+            ThrowUsage(command.name, "--" + text.substr(0, text.find(' ')) + " takes no value", "");
+        }
+        ThrowUsage(command.name, text.substr(0, colon) + " needs a value", "");
     } catch (const CLI::ParseError& error) {
         const std::string text = error.what();
         ThrowUsage(command.name, text.substr(0, text.find('\n')), "");

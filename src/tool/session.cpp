@@ -1,0 +1,114 @@
+// Opening the image of a command.
+#include "tool/session.h"
+
+#include <fmt/format.h>
+
+#include <cstdio>
+
+#include "tool/engine_trace.h"
+#include "tool/errors.h"
+
+namespace VELK::tool {
+
+namespace {
+
+OpenOptions OptionsOf(const Invocation& call) {
+    OpenOptions options;
+    options.offset = call.offset;
+    options.partition = call.partition;
+    options.backupHeader = call.backupHeader;
+    options.mapBlockSize = call.mapBlockSize;
+    return options;
+}
+
+void ExplainPlace(const std::string& image, const VolumeScan& scan) {
+    for (const PartitionEntry& entry : scan.partitions) {
+        std::fprintf(stderr, "treehfs: %s: partition %u (%s): %s\n", image.c_str(), entry.number,
+                     entry.contentName.c_str(), entry.reason.c_str());
+    }
+}
+
+}  // namespace
+
+Session::Session(const Invocation& call, Truncated truncated)
+    : image_(call.image), quiet_(call.quiet), json_(call.json) {
+    if (call.trace) {
+        TraceEngine();
+    }
+    Problem problem;
+    volume_ = ImageVolume::OpenFile(image_, OptionsOf(call), &scan_, &problem);
+    if (call.verbose) {
+        ExplainPlace(image_, scan_);
+    }
+    if (!volume_) {
+        ThrowProblem(image_, problem);
+    }
+    if (volume_->IsTruncated() && truncated == Truncated::kRefuse && !call.keepGoing) {
+        for (const Problem& note : volume_->Notes()) {
+            if (note.status == kErrVolumeTruncated) {
+                ThrowProblem(image_, note);
+            }
+        }
+    }
+    if (quiet_) {
+        return;
+    }
+    for (const Problem& note : volume_->Notes()) {
+        PrintNote(image_, note);
+    }
+    if (call.verbose) {
+        PrintNote(image_, Failure(fmt::format("volume at byte {}, read through the {} header",
+                                              Grouped(volume_->Place().offset),
+                                              volume_->UsedBackupHeader() ? "alternate" : "first"),
+                                  ""));
+    }
+}
+
+CBTreeHfs* Session::Tree(u32 fileId) {
+    Problem problem;
+    CBTreeHfs* tree = volume_->Tree(fileId, &problem);
+    if (tree == nullptr) {
+        ThrowProblem(image_, problem);
+    }
+    return tree;
+}
+
+std::string Session::OffsetText(u32 fileId, u64 forkOffset) {
+    const std::optional<u64> offset = volume_->ImageOffset(fileId, forkOffset);
+    return offset ? "image offset " + HexOffset(*offset) : "";
+}
+
+Problem Session::ProblemOf(u32 fileId, u32 node, int status, const std::string& detail) {
+    const bool fromVolume =
+        status == kErrVolumeIo || status == kErrVolumeTruncated || status == kErrVolumeUnmapped;
+    if (fromVolume && volume_->LastIoProblem()) {
+        return volume_->LastIoProblem();
+    }
+    const CBTreeHfs* tree = volume_->OpenTree(fileId);
+    const u64 forkOffset = tree != nullptr ? u64{node} << tree->nodeShift : 0;
+    std::string what = fmt::format("{} node {}: {}", ForkName(fileId), node, StatusText(status));
+    if (!detail.empty()) {
+        what += ": " + detail;
+    }
+    const std::string place = OffsetText(fileId, forkOffset);
+    if (!place.empty()) {
+        what += " (" + place + ")";
+    }
+    Problem problem = Failure(what, "run check; --keep-going goes past it");
+    problem.status = status;
+    problem.fileId = fileId;
+    problem.node = node;
+    problem.offset = volume_->ImageOffset(fileId, forkOffset);
+    return problem;
+}
+
+void Session::NotePassedOver(const Problem& problem) {
+    passedOver_ += 1;
+    ToolError error;
+    error.subject = image_;
+    error.problem = problem;
+    error.problem.advice = "passed over";
+    PrintError(error, json_);
+}
+
+}  // namespace VELK::tool
