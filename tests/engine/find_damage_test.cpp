@@ -1,0 +1,365 @@
+// Lookup on damaged trees and failing services: a status, its reports, no reference lost, nothing
+// to write.
+#include <gtest/gtest.h>
+
+#include "bench.h"
+
+namespace VELK::test {
+namespace {
+
+// The SmallTree of nine leaves: leaves 1 .. 9 of two records, index nodes 10, 11, 12, root 13.
+constexpr u32 kRoot = 13;
+constexpr u32 kIndex = 10;
+constexpr u32 kLeaf = 1;
+
+class FindDamage : public GeometryTest {
+protected:
+    FindDamage() : bench_(Blocks(MapBlock())), image_(SmallTree(NodeSize(), 9)) {}
+    ~FindDamage() override { path_.ClearPath(); }
+
+    // Opens the damaged tree and looks its first record up.
+    int Find() {
+        bench_.Open(image_);
+        bench_.capture.TraceAll();
+        const HostKey key = NthHostKey(4, 0);
+        bool found = true;
+        const int status =
+            bench_->FindEntry(key, key.id, &path_, &found, nullptr, nullptr, nullptr, nullptr);
+        EXPECT_TRUE(LedgerHolds(*bench_.tree, References(path_)));
+        EXPECT_TRUE(bench_->modifiedList.IsEmpty());
+        return status;
+    }
+    // Node offset of the child number of record `index` in an index node of this image.
+    u32 ChildAt(u32 index) const { return 14 + index * 24 + 20; }
+
+    Bench bench_;
+    TreeImage image_;
+    HfsFindData path_;
+};
+
+TEST_P(FindDamage, ARootOfZeroIsRefused) {
+    image_.Patch32(0, 16, 0);
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(), Events{Reported(kReasonTree, 2980)});
+    EXPECT_TRUE(path_.valid);
+    EXPECT_EQ(path_.searchCount, 1u);
+}
+
+TEST_P(FindDamage, ARootOfTheWrongHeightIsRefused) {
+    image_.Patch8(kRoot, 9, 4);
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Traced("Incorrect node height: 4 != 3\n"), Reported(kReasonTree, 2916),
+                      Reported(kErrCorrupt, 2982)}));
+    EXPECT_EQ(path_.path[3].node->nodeNum, kRoot);
+}
+
+TEST_P(FindDamage, ALeafOfTheWrongHeightIsRefused) {
+    image_.Patch8(kLeaf, 9, 0);
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Traced("Incorrect node height: 0 != 1\n"), Reported(kReasonTree, 2916),
+                      Reported(kErrCorrupt, 2982)}));
+    EXPECT_EQ(References(path_), 3u);
+}
+
+TEST_P(FindDamage, ALeafOfIndexKindIsRefused) {
+    image_.Patch8(kLeaf, 8, 0);
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Traced("Incorrect node type (0): expected leaf\n"),
+                      Reported(kReasonTree, 2925), Reported(kErrCorrupt, 2982)}));
+}
+
+TEST_P(FindDamage, AnIndexNodeOfLeafKindIsRefused) {
+    image_.Patch8(kIndex, 8, 0xFF);
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Traced("Incorrect node type (-1): expected index\n"),
+                      Reported(kReasonTree, 2934), Reported(kErrCorrupt, 2982)}));
+}
+
+TEST_P(FindDamage, AChildOfZeroIsRefused) {
+    image_.Patch32(kRoot, ChildAt(0), 0);
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(), Events{Reported(kReasonTree, 2980)});
+    EXPECT_EQ(References(path_), 1u);
+}
+
+TEST_P(FindDamage, AChildPastTheFileIsAssertedAndRefused) {
+    for (const u32 child : {22u, 23u, 0x7FFFFFFFu, 0xFFFFFFFFu}) {
+        image_.Patch32(kIndex, ChildAt(0), child);
+        EXPECT_EQ(Find(), kErrCorrupt);
+        EXPECT_EQ(bench_.capture.Take(), (Events{Asserted(2638), Reported(kErrCorrupt, 2909),
+                                                 Reported(kErrCorrupt, 2982)}));
+        EXPECT_EQ(References(path_), 2u);
+        path_.ClearPath();
+        bench_->Dtor();
+    }
+}
+
+TEST_P(FindDamage, AChildNeverWrittenLeavesNothingToWrite) {
+    image_.Patch32(kIndex, ChildAt(0), 20);
+    bench_.Open(image_);
+    bench_->validNodes = 15;
+    const HostKey key = NthHostKey(4, 0);
+    bool found = true;
+    EXPECT_EQ(bench_->FindEntry(key, key.id, &path_, &found, nullptr, nullptr, nullptr, nullptr),
+              kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Assertions(), std::vector<int>{2638});
+    EXPECT_TRUE(bench_->modifiedList.IsEmpty());
+    EXPECT_EQ(bench_->validNodes, 15u);
+    EXPECT_TRUE(LedgerHolds(*bench_.tree, References(path_)));
+    EXPECT_EQ(bench_->Flush(0), kOk);
+    EXPECT_EQ(bench_.volume.Count(Call::kDirtyMeta), 0u);
+}
+
+TEST_P(FindDamage, ChildrenInARingEndAtTheFirstWrongHeight) {
+    for (const u32 child : {kRoot, kIndex}) {
+        image_ = SmallTree(NodeSize(), 9);
+        image_.Patch32(kIndex, ChildAt(0), child);
+        EXPECT_EQ(Find(), kErrCorrupt);
+        EXPECT_EQ(bench_.capture.Of(Event::Kind::kReport),
+                  (Events{Reported(kReasonTree, 2916), Reported(kErrCorrupt, 2982)}));
+        EXPECT_EQ(References(path_), 3u);
+        path_.ClearPath();
+        bench_->Dtor();
+    }
+}
+
+TEST_P(FindDamage, ADepthThatIsTooSmallEndsAtTheRoot) {
+    image_.Patch16(0, 14, 2);
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Of(Event::Kind::kReport),
+              (Events{Reported(kReasonTree, 2916), Reported(kErrCorrupt, 2982)}));
+}
+
+TEST_P(FindDamage, ARecordThatCannotBeLocatedIsReported) {
+    image_.Patch16(kLeaf, NodeSize() - 4, NodeSize());
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Reported(kReasonNode, kAnySite), Reported(kErrCorrupt, 3005)}));
+    EXPECT_EQ(References(path_), 3u);
+}
+
+TEST_P(FindDamage, ARecordCountTheNodeCannotHoldIsReported) {
+    image_.Patch16(kLeaf, 10, 65535);
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Of(Event::Kind::kReport).back(), Reported(kErrCorrupt, 3005));
+}
+
+TEST_P(FindDamage, AChildNumberOfTheWrongSizeIsReported) {
+    // The only record of node 12 gets two bytes of data more.
+    image_.Patch16(12, NodeSize() - 4, 14 + 26);
+    bench_.Open(image_);
+    const HostKey key = NthHostKey(4, 17);
+    bool found = false;
+    EXPECT_EQ(bench_->FindEntry(key, key.id, &path_, &found, nullptr, nullptr, nullptr, nullptr),
+              kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Reported(kReasonNode, kAnySite), Reported(kErrCorrupt, 3095)}));
+}
+
+TEST_P(FindDamage, AnIndexNodeWithoutRecordsIsRefused) {
+    NodeImage empty{.kind = kBTIndexNode, .height = 3};
+    image_.SetNode(kRoot, empty.Build(NodeSize()));
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take().back(), Reported(kErrCorrupt, 3095));
+}
+
+TEST_P(FindDamage, ALeafWithoutRecordsHoldsNothing) {
+    image_.SetNode(kLeaf, NodeImage{}.Build(NodeSize()));
+    EXPECT_EQ(Find(), kOk);
+    EXPECT_EQ(path_.path[1].index, 0);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// Each Map of a lookup fails in turn.
+TEST_P(FindDamage, AnUnreadableNodeIsReportedAtEveryLevel) {
+    for (u32 nth = 1; nth <= 3; ++nth) {
+        Bench bench(Blocks(MapBlock()));
+        bench.Open(image_);
+        HfsFindData path;
+        const HostKey key = NthHostKey(4, 0);
+        bool found = true;
+        bench.faults.Fail(Call::kMap, nth);
+        EXPECT_EQ(bench->FindEntry(key, key.id, &path, &found, nullptr, nullptr, nullptr, nullptr),
+                  kFaultStatus);
+        EXPECT_EQ(bench.capture.Take(),
+                  (Events{Reported(kFaultStatus, kAnySite), Reported(kFaultStatus, 2909),
+                          Reported(kFaultStatus, 2982)}));
+        EXPECT_EQ(References(path), nth - 1);
+        EXPECT_TRUE(LedgerHolds(*bench.tree, nth - 1));
+        EXPECT_EQ(bench->FindRecord(key.Get(), key.id, nullptr, 0, nullptr, &path), kOk);
+        path.ClearPath();
+    }
+}
+
+TEST_P(FindDamage, EveryAllocationFailsOnceAndNothingLeaks) {
+    for (u32 nth = 1; nth <= 3; ++nth) {
+        Bench bench(Blocks(MapBlock()));
+        bench.Open(image_);
+        HfsFindData path;
+        const HostKey key = NthHostKey(4, 0);
+        bool found = true;
+        bench.heap.FailNth(nth);
+        EXPECT_EQ(bench->FindEntry(key, key.id, &path, &found, nullptr, nullptr, nullptr, nullptr),
+                  kErrNoMemory);
+        EXPECT_EQ(References(path), nth - 1);
+        EXPECT_TRUE(LedgerHolds(*bench.tree, nth - 1));
+        path.ClearPath();
+    }
+}
+
+INSTANTIATE_GEOMETRIES(FindDamage, FewGeometries);
+
+// ---- keys that a comparator could not read safely
+
+struct BadKey {
+    u32 fileId;
+    u32 keyLength;
+    u32 nameLength;  // where the key has one
+};
+std::ostream& operator<<(std::ostream& out, const BadKey& key) {
+    return out << "file " << key.fileId << " length " << key.keyLength << " name "
+               << key.nameLength;
+}
+
+class FindBadKey : public ::testing::TestWithParam<BadKey> {
+protected:
+    // A tree of one leaf whose only record has this key and ends right behind its data.
+    int Find() {
+        const BadKey& bad = GetParam();
+        Bytes key(2 + bad.keyLength);
+        Put16(&key, 0, bad.keyLength);
+        const u32 nameAt = bad.fileId == 8 ? 12 : 6;
+        if (bad.fileId != 3 && key.size() >= nameAt + 2) {
+            Put16(&key, nameAt, bad.nameLength);
+        }
+        TreeShape shape;
+        shape.fileId = bad.fileId;
+        shape.nodeSize = 2048;
+        bench_.Open(BuildTree(shape, {{key, Bytes(2, 0x61)}}));
+        const HostKey search = NthHostKey(bad.fileId, 0);
+        return bench_->FindRecord(search.Get(), 7, nullptr, 0, nullptr, nullptr);
+    }
+    Bench bench_{Blocks(512), GetParam().fileId};
+};
+
+class FindGoodKey : public FindBadKey {};
+
+TEST_P(FindBadKey, IsRefusedLikeARecordThatCannotBeLocated) {
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Of(Event::Kind::kReport),
+              (Events{Reported(kReasonNode, kAnySite), Reported(kErrCorrupt, 3005),
+                      Reported(kErrCorrupt, 3126)}));
+}
+
+INSTANTIATE_TEST_SUITE_P(Keys, FindBadKey,
+                         ::testing::Values(BadKey{4, 0, 0}, BadKey{4, 5, 0}, BadKey{4, 6, 1},
+                                           BadKey{4, 7, 1}, BadKey{4, 8, 2}, BadKey{4, 516, 256},
+                                           BadKey{4, 516, 65535}, BadKey{4, 521, 0},
+                                           BadKey{4, 1000, 255}, BadKey{3, 0, 0}, BadKey{3, 9, 0},
+                                           BadKey{3, 521, 0}, BadKey{3, 1500, 0}, BadKey{8, 0, 0},
+                                           BadKey{8, 11, 0}, BadKey{8, 12, 1}, BadKey{8, 14, 2},
+                                           BadKey{8, 266, 128}, BadKey{8, 521, 0},
+                                           BadKey{8, 266, 0x8000}));
+
+TEST_P(FindGoodKey, IsCompared) {
+    EXPECT_EQ(Find(), kErrNotFound);
+    EXPECT_EQ(bench_.capture.Of(Event::Kind::kReport), Events{});
+}
+
+INSTANTIATE_TEST_SUITE_P(Keys, FindGoodKey,
+                         ::testing::Values(BadKey{4, 6, 0}, BadKey{4, 8, 1}, BadKey{4, 9, 1},
+                                           BadKey{4, 516, 255}, BadKey{4, 520, 255},
+                                           BadKey{3, 10, 0}, BadKey{3, 520, 0}, BadKey{8, 12, 0},
+                                           BadKey{8, 14, 1}, BadKey{8, 266, 127},
+                                           BadKey{8, 520, 254}));
+
+int AlwaysGreater(const BTreeKey* /*searchKey*/, unsigned /*id*/, const BTreeKey* /*nodeKey*/) {
+    return 1;
+}
+
+TEST(FindForeignKeys, AForeignComparatorSeesAnyKey) {
+    Bench bench(Blocks(512));
+    TreeShape shape;
+    bench.Open(BuildTree(shape, {{Bytes{0, 0}, Bytes(4)}}));
+    bench->compareKeys = AlwaysGreater;
+    const HostKey key = NthHostKey(4, 0);
+    EXPECT_EQ(bench->FindRecord(key.Get(), key.id, nullptr, 0, nullptr, nullptr), kErrNotFound);
+    EXPECT_EQ(bench.capture.Take(), Events{});
+}
+
+// ---- ReadLevel
+
+class ReadLevelTest : public ::testing::Test {
+protected:
+    ReadLevelTest() : bench_(Blocks(512)) { bench_.Open(SmallTree(512, 9)); }
+    ~ReadLevelTest() override { path_.ClearPath(); }
+    Bench bench_;
+    HfsFindData path_;
+};
+
+TEST_F(ReadLevelTest, LoadsALeafAndAnIndexNode) {
+    EXPECT_EQ(bench_->ReadLevel(1, 3, &path_), kOk);
+    EXPECT_EQ(bench_->ReadLevel(2, 11, &path_), kOk);
+    EXPECT_EQ(path_.path[1].node->nodeNum, 3u);
+    EXPECT_EQ(path_.path[2].node->nodeNum, 11u);
+    EXPECT_TRUE(LedgerHolds(*bench_.tree, 2));
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+TEST_F(ReadLevelTest, ReleasesWhatTheLevelHeldAndResetsTheIndex) {
+    bench_->ReadLevel(1, 3, &path_);
+    path_.path[1].index = 1;
+    EXPECT_EQ(bench_->ReadLevel(1, 4, &path_), kOk);
+    EXPECT_EQ(path_.path[1].index, 0);
+    EXPECT_EQ(CachedNode(*bench_.tree, 3)->refCount, 0);
+    EXPECT_TRUE(LedgerHolds(*bench_.tree, 1));
+}
+
+TEST_F(ReadLevelTest, LevelsAPathCannotHoldAreRefused) {
+    const HfsFindData before = path_;
+    for (const int level : {16, 17, 1000, 0x7FFFFFFF, 0, -1, -0x7FFFFFFF - 1}) {
+        EXPECT_EQ(bench_->ReadLevel(level, 3, &path_), kErrCorrupt);
+        EXPECT_EQ(bench_.capture.Take(), Events{Reported(kReasonDepth, 2898)});
+    }
+    EXPECT_EQ(path_.valid, before.valid);
+    EXPECT_EQ(References(path_), 0u);
+}
+
+TEST_F(ReadLevelTest, AnUnreadableNodeLeavesTheLevelEmpty) {
+    bench_->ReadLevel(1, 3, &path_);
+    bench_.faults.Fail(Call::kMap, 1);
+    EXPECT_EQ(bench_->ReadLevel(1, 4, &path_), kFaultStatus);
+    EXPECT_EQ(path_.path[1].node, nullptr);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Reported(kFaultStatus, kAnySite), Reported(kFaultStatus, 2909)}));
+}
+
+TEST_F(ReadLevelTest, ANodeOfAnotherLevelStaysReferenced) {
+    EXPECT_EQ(bench_->ReadLevel(2, 3, &path_), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(), Events{Reported(kReasonTree, 2916)});
+    EXPECT_EQ(path_.path[2].node->nodeNum, 3u);
+    EXPECT_TRUE(LedgerHolds(*bench_.tree, 1));
+}
+
+TEST_F(ReadLevelTest, TheHeaderNodeIsNoLeaf) {
+    EXPECT_EQ(bench_->ReadLevel(1, 0, &path_), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(), Events{Reported(kReasonTree, 2916)});
+}
+
+// A count so far below zero that a new reference does not lift it cannot arise: the cache revives.
+TEST_F(ReadLevelTest, ANodeWithANegativeCountIsRevived) {
+    bench_->ReadLevel(1, 3, &path_);
+    HfsNode* node = path_.path[1].node;
+    path_.path[1].node = nullptr;
+    node->refCount = -5;
+    EXPECT_EQ(bench_->ReadLevel(1, 3, &path_), kOk);
+    EXPECT_EQ(node->refCount, 1);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+}  // namespace
+}  // namespace VELK::test

@@ -1,0 +1,213 @@
+// What a lookup delivers into the caller's buffers, and FindRecord.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+
+#include "bench.h"
+
+namespace VELK::test {
+namespace {
+
+// Records of the catalog: keys of 20 bytes, data of 8.
+class FindOutput : public ::testing::Test {
+protected:
+    FindOutput() : bench_(Blocks(512)) { bench_.Open(SmallTree(512)); }
+    ~FindOutput() override { path_.ClearPath(); }
+
+    // Looks record 3 up with these capacities; 0 with a null buffer.
+    int Find(u32 recordCapacity, u32 keyCapacity, u32 n = 3) {
+        const HostKey key = NthHostKey(4, n);
+        recordSize_ = recordCapacity;
+        keySize_ = keyCapacity;
+        return bench_->FindEntry(key, key.id, &path_, &found_, wantRecord_ ? record_ : nullptr,
+                                 &recordSize_, wantKey_ ? keyOut_ : nullptr, &keySize_);
+    }
+    Bytes Record(u32 size) const { return Bytes(record_, record_ + size); }
+    Bytes Key(u32 size) const { return Bytes(keyOut_, keyOut_ + size); }
+
+    Bench bench_;
+    HfsFindData path_;
+    bool found_ = false;
+    bool wantRecord_ = true;
+    bool wantKey_ = true;
+    u32 recordSize_ = 0;
+    u32 keySize_ = 0;
+    u8 record_[64] = {};
+    alignas(8) u8 keyOut_[kKeyLengthSize + kMaxKeyLength] = {};
+};
+
+const HostKey kKey3 = NthHostKey(4, 3);
+const Bytes kHostKey3(kKey3.bytes, kKey3.bytes + 20);
+
+TEST_F(FindOutput, BuffersOfTheRightSizeAssertNothing) {
+    EXPECT_EQ(Find(8, 20), kOk);
+    EXPECT_EQ(recordSize_, 8u);
+    EXPECT_EQ(keySize_, 20u);
+    EXPECT_EQ(Record(8), Pattern(8, 3));
+    EXPECT_EQ(Key(20), kHostKey3);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+TEST_F(FindOutput, ASmallKeyBufferGetsTheWholeKeyAllTheSame) {
+    EXPECT_EQ(Find(8, 5), kOk);
+    EXPECT_EQ(keySize_, 5u);
+    EXPECT_EQ(Key(20), kHostKey3);
+    EXPECT_EQ(keyOut_[20], 0);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+TEST_F(FindOutput, ALargeKeyBufferIsAsserted) {
+    EXPECT_EQ(Find(8, 21), kOk);
+    EXPECT_EQ(keySize_, 20u);
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(3039)});
+}
+
+TEST_F(FindOutput, AKeyBufferBelowTheHooksMinimumIsAsserted) {
+    bench_->convert.minKeyBuffer = 21;
+    EXPECT_EQ(Find(8, 20), kOk);
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(3040)});
+}
+
+TEST_F(FindOutput, ASmallRecordBufferIsAssertedAndFilled) {
+    EXPECT_EQ(Find(6, 20), kOk);
+    EXPECT_EQ(recordSize_, 6u);
+    Bytes expected = Pattern(8, 3);
+    std::fill(expected.begin() + 6, expected.end(), u8{0});
+    EXPECT_EQ(Record(8), expected);
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(3051)});
+}
+
+TEST_F(FindOutput, ALargeRecordBufferGetsTheRecordsSize) {
+    EXPECT_EQ(Find(64, 20), kOk);
+    EXPECT_EQ(recordSize_, 8u);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+TEST_F(FindOutput, ARecordBufferBelowTheHooksMinimumIsAsserted) {
+    bench_->convert.minDataBuffer = 9;
+    EXPECT_EQ(Find(8, 20), kOk);
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(3052)});
+}
+
+TEST_F(FindOutput, TheKeyIsDeliveredBeforeTheRecord) {
+    bench_->convert.minKeyBuffer = 64;
+    bench_->convert.minDataBuffer = 64;
+    EXPECT_EQ(Find(7, 21), kOk);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Asserted(3039), Asserted(3040), Asserted(3051), Asserted(3052)}));
+}
+
+TEST_F(FindOutput, NullBuffersAreNotWanted) {
+    wantRecord_ = wantKey_ = false;
+    EXPECT_EQ(Find(3, 4), kOk);
+    EXPECT_TRUE(found_);
+    EXPECT_EQ(recordSize_, 3u);
+    EXPECT_EQ(keySize_, 4u);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+TEST_F(FindOutput, AnAbsentKeyDeliversNothing) {
+    const HostKey key = NthHostKey(4, 3, true);
+    u32 size = 8;
+    u32 keySize = 20;
+    EXPECT_EQ(bench_->FindEntry(key, key.id, &path_, &found_, record_, &size, keyOut_, &keySize),
+              kOk);
+    EXPECT_FALSE(found_);
+    EXPECT_EQ(size, 8u);
+    EXPECT_EQ(keySize, 20u);
+    EXPECT_EQ(Record(8), Bytes(8));
+    EXPECT_EQ(Key(20), Bytes(20));
+}
+
+TEST_F(FindOutput, AnEqualIndexKeyDeliversOnlyTheLeafRecord) {
+    EXPECT_EQ(Find(8, 20, 2), kOk);  // first of leaf 2: its key stands in the root too
+    EXPECT_EQ(recordSize_, 8u);
+    EXPECT_EQ(Record(8), Pattern(8, 2));
+}
+
+TEST_F(FindOutput, AMisalignedKeyBufferIsAssertedAndFilled) {
+    const HostKey key = NthHostKey(4, 3);
+    u32 size = 20;
+    EXPECT_EQ(bench_->FindEntry(key, key.id, &path_, &found_, nullptr, nullptr, keyOut_ + 4, &size),
+              kOk);
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(2963)});
+    EXPECT_EQ(Bytes(keyOut_ + 4, keyOut_ + 24), kHostKey3);
+}
+
+TEST_F(FindOutput, AMisalignedKeyBufferIsAssertedOnAnEmptyTreeToo) {
+    bench_->header.treeDepth = 0;
+    const HostKey key = NthHostKey(4, 3);
+    u32 size = 20;
+    EXPECT_EQ(bench_->FindEntry(key, key.id, &path_, &found_, nullptr, nullptr, keyOut_ + 1, &size),
+              kOk);
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(2963)});
+}
+
+TEST_F(FindOutput, MissingHooksCopyTheBytes) {
+    bench_->convert = {};
+    EXPECT_EQ(Find(8, 20), kOk);
+    EXPECT_EQ(Record(8), Pattern(8, 3));
+    EXPECT_EQ(Key(20), NthDiskKey(4, 3));
+}
+
+// Sizes the hooks were called with.
+u32 hookKeySize;
+u32 hookDataSize;
+void NoteKey(void* /*target*/, const void* /*source*/, unsigned size) {
+    hookKeySize = size;
+}
+void NoteData(void* /*target*/, const void* /*source*/, unsigned size) {
+    hookDataSize = size;
+}
+
+TEST_F(FindOutput, HooksGetTheWholeKeyAndTheCutRecord) {
+    bench_->convert.KeyToMemory = NoteKey;
+    bench_->convert.DataToMemory = NoteData;
+    EXPECT_EQ(Find(6, 5), kOk);
+    EXPECT_EQ(hookKeySize, 20u);
+    EXPECT_EQ(hookDataSize, 6u);
+}
+
+TEST_F(FindOutput, TheSearchArgumentReachesTheComparator) {
+    HostKey key = NthHostKey(4, 3);
+    EXPECT_EQ(
+        bench_->FindEntry(key, key.id + 1, &path_, &found_, nullptr, nullptr, nullptr, nullptr),
+        kOk);
+    EXPECT_FALSE(found_);
+}
+
+// ---- FindRecord
+
+TEST_F(FindOutput, FindRecordDeliversTheRecord) {
+    u32 size = 0;
+    EXPECT_EQ(bench_->FindRecord(kKey3.Get(), kKey3.id, record_, 8, &size, &path_), kOk);
+    EXPECT_EQ(size, 8u);
+    EXPECT_EQ(Record(8), Pattern(8, 3));
+    EXPECT_EQ(References(path_), 2u);
+}
+
+TEST_F(FindOutput, FindRecordOfAnAbsentKeyIsNotReported) {
+    const HostKey key = NthHostKey(4, 3, true);
+    u32 size = 0;
+    EXPECT_EQ(bench_->FindRecord(key.Get(), key.id, record_, 8, &size, &path_), kErrNotFound);
+    EXPECT_EQ(size, 8u);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+TEST_F(FindOutput, FindRecordWithoutABufferLeavesTheSize) {
+    u32 size = 77;
+    EXPECT_EQ(bench_->FindRecord(kKey3.Get(), kKey3.id, nullptr, 8, &size, &path_), kOk);
+    EXPECT_EQ(size, 77u);
+}
+
+TEST_F(FindOutput, FindRecordReportsAFailure) {
+    bench_.faults.Fail(Call::kMap, 1);
+    u32 size = 0;
+    EXPECT_EQ(bench_->FindRecord(kKey3.Get(), kKey3.id, record_, 8, &size, &path_), kFaultStatus);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Reported(kFaultStatus, kAnySite), Reported(kFaultStatus, 2909),
+                      Reported(kFaultStatus, 2982), Reported(kFaultStatus, 3126)}));
+}
+
+}  // namespace
+}  // namespace VELK::test
