@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "capture.h"
+#include "disk_builder.h"
 #include "hfs/volume/convert.h"
 #include "hfs/volume/make_volume.h"
 #include "hfs/volume/wire.h"
@@ -306,6 +307,136 @@ TEST_F(CommitTest, HeaderCountsFollowCatalogRecords) {
     EXPECT_EQ(1u, Be32(bytes.data() + 1024 + 32));
     EXPECT_EQ(1u, Be32(bytes.data() + 1024 + 36));
     EXPECT_EQ(41u, Be32(bytes.data() + 1024 + 64));
+}
+
+// --- writing to the medium -----------------------------------------------------------------------
+
+class WriteTest : public testing::Test {
+protected:
+    std::string Refusal(const test::Bytes& disk) {
+        OpenOptions options;
+        options.access = Access::kWrite;
+        options.force = force_;
+        auto volume = ImageVolume::Open(test::DeviceOf(disk), options, nullptr, &problem_);
+        return volume ? "" : problem_.Text();
+    }
+    bool force_ = false;
+    Problem problem_;
+    test::DiskVolume shape_;
+};
+
+TEST_F(WriteTest, CleanVolumeMayBeWritten) {
+    EXPECT_EQ("", Refusal(shape_.Build()));
+}
+
+TEST_F(WriteTest, UncleanVolumeWantsForce) {
+    test::Bytes disk = shape_.Build();
+    test::Put32(&disk, 1024 + 4, 0);
+    EXPECT_EQ("the volume was not unmounted cleanly: run check, then --force", Refusal(disk));
+    test::Put32(&disk, 1024 + 4, 0x900);
+    EXPECT_EQ("the volume was not unmounted cleanly: run check, then --force", Refusal(disk));
+    force_ = true;
+    EXPECT_EQ("", Refusal(disk));
+}
+
+TEST_F(WriteTest, PendingJournalWantsForce) {
+    shape_.journalStart = 512;
+    shape_.journalEnd = 512 + 4096;
+    EXPECT_EQ(
+        "the journal holds transactions (4,096 B): writing would lose them; let the native "
+        "system replay it, or --force",
+        Refusal(shape_.Build()));
+    force_ = true;
+    EXPECT_EQ("", Refusal(shape_.Build()));
+}
+
+TEST_F(WriteTest, SoftwareLockHoldsAgainstForce) {
+    test::Bytes disk = shape_.Build();
+    test::Put32(&disk, 1024 + 4, 0x8100);
+    force_ = true;
+    EXPECT_EQ("the volume is locked against writing (attribute bit 15): it can only be read",
+              Refusal(disk));
+}
+
+TEST_F(WriteTest, OverlappingFilesAndTruncatedImagesCanOnlyBeRead) {
+    test::Bytes disk = shape_.Build();
+    test::Put32(&disk, 1024 + 192 + 16, test::Get32(disk, 1024 + 272 + 16));
+    EXPECT_EQ("extents file and catalog file claim the same blocks: the volume can only be read",
+              Refusal(disk));
+    disk = shape_.Build();
+    disk.resize(200000);
+    EXPECT_EQ("image ends at 200,000, the volume at 262,144: the volume can only be read",
+              Refusal(disk));
+}
+
+// Records what happens to the medium, in order.
+class Recorder : public MemoryDevice {
+public:
+    using MemoryDevice::MemoryDevice;
+    IoResult Write(u64 offset, const void* source, std::size_t bytes) override {
+        if (offset <= 1024 && offset + bytes >= 1536) {
+            const u8* header = static_cast<const u8*>(source) + (1024 - offset);
+            log += (header[6] & 1) != 0 ? "clean " : "unclean ";
+        } else {
+            log += "write ";
+        }
+        return MemoryDevice::Write(offset, source, bytes);
+    }
+    IoResult Sync() override {
+        log += "sync ";
+        return {};
+    }
+    std::string log;
+};
+
+TEST_F(WriteTest, CleanBitGoesFirstAndComesBackLast) {
+    const test::Bytes disk = shape_.Build();
+    auto device = std::make_unique<Recorder>(disk.size());
+    Recorder* recorder = device.get();
+    ASSERT_TRUE(device->Write(0, disk.data(), disk.size()).Ok());
+    recorder->log.clear();
+    OpenOptions options;
+    options.access = Access::kWrite;
+    auto volume = ImageVolume::Open(std::move(device), options, nullptr, &problem_);
+    ASSERT_NE(nullptr, volume) << problem_.Text();
+    EXPECT_EQ("", recorder->log);
+    CBTreeHfs* tree = volume->Tree(kCatalogFileId, &problem_);
+    ASSERT_NE(nullptr, tree);
+    const NumberKey key(900);
+    const u8 data[10] = {9, 0};
+    ASSERT_EQ(0, tree->InsertRecord(key.bytes, 900, data, sizeof data));
+    ASSERT_EQ(0, volume->Commit(0));
+    EXPECT_EQ("unclean sync write sync clean sync ", recorder->log);
+    EXPECT_EQ(1u, volume->Header().writeCount);
+}
+
+// Blocks in use that the allocation file calls free are never handed out.
+TEST_F(WriteTest, BlocksOfSpecialFilesAreNotHandedOutWhateverTheBitmapSays) {
+    test::Bytes disk = shape_.Build();
+    const std::size_t bitmap = std::size_t{test::Get32(disk, 1024 + 112 + 16)} * shape_.blockSize;
+    std::fill_n(disk.begin() + static_cast<std::ptrdiff_t>(bitmap), 8, u8{0});
+    OpenOptions options;
+    options.access = Access::kOverlay;
+    auto volume = ImageVolume::Open(test::DeviceOf(disk), options, nullptr, &problem_);
+    ASSERT_NE(nullptr, volume) << problem_.Text();
+    ASSERT_EQ(1u, volume->Notes().size());
+    EXPECT_EQ("V05", volume->Notes()[0].check);
+    CBTreeHfs* tree = volume->Tree(kCatalogFileId, &problem_);
+    ASSERT_NE(nullptr, tree);
+    const unsigned clump = 4096;
+    while (tree->ExtendBTree(tree->header.totalNodes + 1, nullptr, &clump) == 0) {
+    }
+    std::vector<bool> used(shape_.blocks);
+    used[0] = used[shape_.blocks - 1] = true;
+    for (const u32 fileId : {3u, 4u, 6u, 8u}) {
+        for (const HfsExtent& extent : volume->ForkExtents(fileId)) {
+            for (u32 i = 0; i < extent.blockCount; ++i) {
+                EXPECT_FALSE(used[extent.startBlock + i]) << extent.startBlock + i;
+                used[extent.startBlock + i] = true;
+            }
+        }
+    }
+    EXPECT_EQ(0u, volume->Fs()->bitmap->GetZeros());
 }
 
 // The cache falls back under its budget, and a path held by a caller stays good.

@@ -91,6 +91,24 @@ TEST(Devices, FileEqualsTheModel) {
     std::remove(path.c_str());
 }
 
+TEST(Devices, AFileOpenForWritingIsOursAlone) {
+    const std::string path = testing::TempDir() + "claimed_test.img";
+    Problem problem;
+    auto first = FileDevice::Open(path, FileDevice::Mode::kCreate, 4096, &problem);
+    ASSERT_NE(nullptr, first) << problem.Text();
+    ASSERT_TRUE(first->Write(0, "kept", 4).Ok());
+    EXPECT_EQ(nullptr, FileDevice::Open(path, FileDevice::Mode::kReadWrite, 0, &problem));
+    EXPECT_EQ("another process has it open for writing", problem.Text());
+    EXPECT_EQ(nullptr, FileDevice::Open(path, FileDevice::Mode::kCreate, 8192, &problem));
+    auto reader = FileDevice::Open(path, FileDevice::Mode::kRead, 0, &problem);
+    ASSERT_NE(nullptr, reader) << problem.Text();
+    u8 bytes[4];
+    ASSERT_TRUE(reader->Read(0, bytes, 4).Ok());
+    EXPECT_EQ('k', bytes[0]);
+    EXPECT_EQ(4096u, reader->Size());
+    std::remove(path.c_str());
+}
+
 // A file that is cut short while it is open gives an error, not a fault.
 TEST(Devices, ShrinkingFileIsAnError) {
     const std::string path = testing::TempDir() + "shrinking_test.img";

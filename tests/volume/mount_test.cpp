@@ -245,13 +245,12 @@ TEST_F(Mount, TailBehindTheLastBlockHoldsTheAlternateHeader) {
 TEST_F(Mount, DamagedHeaderIsNamedAndTheAlternateHelps) {
     Bytes disk = DiskVolume{}.Build();
     test::Put32(&disk, 1024 + 40, 3000);
-    EXPECT_EQ("volume header at 1,024: block size 3000 is not a power of two: try --backup-header",
+    EXPECT_EQ("volume header at 1024: block size 3000 is not a power of two: try --backup-header",
               Refusal(disk));
     EXPECT_EQ("V02", problem_.check);
     test::Put32(&disk, 1024, 0);
-    EXPECT_EQ(
-        "volume header at 1,024: signature 0000 is neither 482B nor 4858: try --backup-header",
-        Refusal(disk));
+    EXPECT_EQ("volume header at 1024: signature 0000 is neither 482B nor 4858: try --backup-header",
+              Refusal(disk));
     options_.backupHeader = true;
     ASSERT_TRUE(Open(disk)) << problem_.Text();
     EXPECT_TRUE(volume_->UsedBackupHeader());
@@ -262,11 +261,11 @@ TEST_F(Mount, VersionMustBelongToTheSignature) {
     Bytes disk = DiskVolume{}.Build();
     test::Put16(&disk, 1026, 5);
     EXPECT_EQ(
-        "volume header at 1,024: version 5 does not belong to signature 482B (HFS+ is 4): "
+        "volume header at 1024: version 5 does not belong to signature 482B (HFS+ is 4): "
         "try --backup-header",
         Refusal(disk));
     test::Put32(&disk, 1024, 0x48580006);
-    EXPECT_EQ("volume header at 1,024: version 6 of HFSX is not known (5 is): try --backup-header",
+    EXPECT_EQ("volume header at 1024: version 6 of HFSX is not known (5 is): try --backup-header",
               Refusal(disk));
 }
 
@@ -358,7 +357,7 @@ TEST_F(Mount, TruncatedImageIsReadAsFarAsItGoes) {
               volume_->LastIoProblem().Text());
     disk.resize(test::CatalogOffset(shape) + 10);
     ASSERT_TRUE(Open(disk)) << problem_.Text();
-    EXPECT_EQ("catalog tree: image ends at 8,202, catalog file (0x2000) lies behind that",
+    EXPECT_EQ("catalog tree: image ends at 8202, catalog file (0x2000) lies behind that",
               TreeRefusal(kCatalogFileId));
 }
 
@@ -391,7 +390,7 @@ TEST_F(Mount, OtherFileSystemsAreNamed) {
         Refusal(disk));
     test::Put32(&disk, 1024, 0x42440000);
     EXPECT_EQ(
-        "HFS volume without an HFS+ volume inside (signature 4244 at 1,024): only HFS+ and "
+        "HFS volume without an HFS+ volume inside (signature 4244 at 1024): only HFS+ and "
         "HFSX are supported",
         Refusal(disk));
     disk = Bytes(1 << 17);

@@ -124,7 +124,7 @@ IoResult SliceDevice::Zero(u64 offset, u64 bytes) {
     return result;
 }
 
-IoResult OverlayDevice::Read(u64 offset, void* target, std::size_t bytes) {
+IoResult OverlayDevice::Peek(u64 offset, void* target, std::size_t bytes) const {
     if (!Fits(offset, bytes, Size())) {
         return {kIoPastEnd, offset};
     }
@@ -148,7 +148,7 @@ IoResult OverlayDevice::Read(u64 offset, void* target, std::size_t bytes) {
 
 // A range inside one page: from the changes where a sector was changed, else from the base, as few
 // reads as there are stretches.
-IoResult OverlayDevice::ReadPage(u64 offset, u8* target, u32 bytes) {
+IoResult OverlayDevice::ReadPage(u64 offset, u8* target, u32 bytes) const {
     const auto found = pages_.find(offset / kPageSize);
     if (found == pages_.end()) {
         return base_->Read(offset, target, bytes);

@@ -133,7 +133,9 @@ public:
 
     u64 Size() const override { return base_->Size(); }
     bool IsWritable() const override { return true; }
-    IoResult Read(u64 offset, void* target, std::size_t bytes) override;
+    IoResult Read(u64 offset, void* target, std::size_t bytes) override {
+        return Peek(offset, target, bytes);
+    }
     IoResult Write(u64 offset, const void* source, std::size_t bytes) override;
     IoResult Sync() override { return {}; }
 
@@ -143,11 +145,13 @@ public:
     // Numbers of the changed pages, rising.
     std::vector<u64> ChangedPages() const;
     const Page* PageAt(u64 number) const;
+    // Reads as Read does; for those who hold the device constant.
+    IoResult Peek(u64 offset, void* target, std::size_t bytes) const;
     // Forgets every change.
     void Drop() { pages_.clear(); }
 
 private:
-    IoResult ReadPage(u64 offset, u8* target, u32 bytes);
+    IoResult ReadPage(u64 offset, u8* target, u32 bytes) const;
     IoResult WritePage(u64 offset, const u8* source, u32 bytes);
 
     BlockDevice* base_;

@@ -1,11 +1,13 @@
 // A file or block device of the host: positioned reads and writes of any length, repeated until
 // they are complete, interrupted calls taken up again.
 #include <fcntl.h>
+#include <sys/file.h>
 #include <sys/ioctl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
 
 #include "hfs/volume/block_device.h"
@@ -41,13 +43,14 @@ Problem CannotOpen(int error) {
 }
 
 // Size of an open file or device; false with `*problem` set when it is neither.
-bool SizeOf(int handle, u64* size, Problem* problem) {
+bool SizeOf(int handle, u64* size, bool* isFile, Problem* problem) {
     struct stat info;
     if (fstat(handle, &info) != 0) {
         *problem = CannotOpen(errno);
         return false;
     }
-    if (S_ISREG(info.st_mode)) {
+    *isFile = S_ISREG(info.st_mode);
+    if (*isFile) {
         *size = static_cast<u64>(info.st_size);
         return true;
     }
@@ -77,19 +80,65 @@ bool SizeOf(int handle, u64* size, Problem* problem) {
 
 }  // namespace
 
+namespace {
+
+// Where a block device is mounted, empty when nowhere (or when the host does not tell).
+std::string MountPoint(const std::string& path) {
+    struct stat device;
+    std::string found;
+    std::FILE* table = stat(path.c_str(), &device) == 0 && S_ISBLK(device.st_mode)
+                           ? std::fopen("/proc/self/mounts", "re")
+                           : nullptr;
+    if (table == nullptr) {
+        return found;
+    }
+    char source[512];
+    char target[512];
+    struct stat mounted;
+    while (found.empty() && std::fscanf(table, "%511s %511s%*[^\n]", source, target) == 2) {
+        if (stat(source, &mounted) == 0 && S_ISBLK(mounted.st_mode) &&
+            mounted.st_rdev == device.st_rdev) {
+            found = target;
+        }
+    }
+    std::fclose(table);
+    return found;
+}
+
+// A device that will be written must be ours alone.
+Problem Claim(int handle) {
+    if (flock(handle, LOCK_EX | LOCK_NB) == 0) {
+        return {};
+    }
+    if (errno == EWOULDBLOCK) {
+        return Failure("another process has it open for writing", "");
+    }
+    return errno == ENOLCK || errno == EOPNOTSUPP ? Problem{} : CannotOpen(errno);
+}
+
+// Empties a file and gives it `size` bytes of zeros.
+Problem SetFreshSize(int handle, u64 size) {
+    if (ftruncate(handle, 0) == 0 && ftruncate(handle, static_cast<off_t>(size)) == 0) {
+        return {};
+    }
+    return Failure(std::string("cannot set the size: ") + std::strerror(errno), "");
+}
+
+}  // namespace
+
 std::unique_ptr<FileDevice> FileDevice::Open(const std::string& path, Mode mode, u64 size,
                                              Problem* problem) {
-    int flags = O_CLOEXEC;
-    switch (mode) {
-        case Mode::kRead:
-            flags |= O_RDONLY | O_NONBLOCK;  // a FIFO must not hold us up before it is refused
-            break;
-        case Mode::kReadWrite:
-            flags |= O_RDWR | O_NONBLOCK;
-            break;
-        case Mode::kCreate:
-            flags |= O_RDWR | O_CREAT | O_TRUNC | O_NONBLOCK;
-            break;
+    // Non-blocking: a FIFO must not hold us up before it is refused.
+    int flags = O_CLOEXEC | O_NONBLOCK | (mode == Mode::kRead ? O_RDONLY : O_RDWR);
+    if (mode == Mode::kCreate) {
+        flags |= O_CREAT;
+    }
+    if (mode != Mode::kRead) {
+        const std::string mounted = MountPoint(path);
+        if (!mounted.empty()) {
+            *problem = Failure("mounted on " + mounted, "unmount it first");
+            return nullptr;
+        }
     }
     const int handle = open(path.c_str(), flags, 0666);
     if (handle < 0) {
@@ -97,20 +146,17 @@ std::unique_ptr<FileDevice> FileDevice::Open(const std::string& path, Mode mode,
                                    : CannotOpen(errno);
         return nullptr;
     }
-    u64 bytes = 0;
-    bool usable = SizeOf(handle, &bytes, problem);
-    if (usable && mode == Mode::kCreate && bytes < size) {
-        usable = ftruncate(handle, static_cast<off_t>(size)) == 0;
-        if (!usable) {
-            *problem = Failure(std::string("cannot set the size: ") + std::strerror(errno), "");
-        }
-        bytes = size;
-    }
-    if (!usable) {
-        close(handle);
+    std::unique_ptr<FileDevice> device(new FileDevice(handle, 0, mode != Mode::kRead));
+    bool isFile = false;
+    if (!SizeOf(handle, &device->size_, &isFile, problem)) {
         return nullptr;
     }
-    return std::unique_ptr<FileDevice>(new FileDevice(handle, bytes, mode != Mode::kRead));
+    *problem = mode != Mode::kRead ? Claim(handle) : Problem{};
+    if (!*problem && mode == Mode::kCreate && isFile) {
+        *problem = SetFreshSize(handle, size);
+        device->size_ = size;
+    }
+    return *problem ? nullptr : std::move(device);
 }
 
 FileDevice::~FileDevice() {

@@ -86,7 +86,7 @@ Content Identify(BlockDevice* image, u64 offset, std::string* name) {
     for (const Signature& signature : kFileSystems) {
         if (Matches(image, offset, signature)) {
             *name = std::string(signature.name) + " (" + signature.label + " at " +
-                    Grouped(offset + signature.offset) + ")";
+                    Position(offset + signature.offset) + ")";
             return Content::kOther;
         }
     }

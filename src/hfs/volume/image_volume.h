@@ -40,6 +40,7 @@ struct OpenOptions {
     std::optional<u64> offset;       // --offset
     u32 partition = 0;               // --partition; 0: whichever holds a volume
     bool backupHeader = false;       // start from the alternate header
+    bool force = false;              // --force: write past a full journal or an unclean unmount
     u32 mapBlockSize = 0;            // --map; 0: the smallest node size of the volume's trees
     u64 cacheBudget = u64{8} << 20;  // bytes of clean nodes that TrimCache leaves cached
 };

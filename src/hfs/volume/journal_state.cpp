@@ -73,7 +73,7 @@ JournalState ReadJournalState(BlockDevice* volume, const VolumeHeader& header, u
     }
     u8 bytes[kJournalHeaderSize];
     if (offset > volume->Size() || !volume->Read(offset, bytes, sizeof bytes).Ok()) {
-        state.text = "journal header at " + Grouped(state.offset) + " cannot be read";
+        state.text = "journal header at " + Position(state.offset) + " cannot be read";
         return state;
     }
     const Reader reader{bytes, Be32(bytes) != kJournalMagic};
@@ -82,14 +82,14 @@ JournalState ReadJournalState(BlockDevice* volume, const VolumeHeader& header, u
     const u64 size = reader.U64(kJournalSize);
     const u64 headerBytes = reader.U32(kJournalHeaderBytes);
     if (reader.U32(0) != kJournalMagic || reader.U32(4) != kJournalEndian) {
-        state.text = "journal header at " + Grouped(state.offset) + " has no signature";
+        state.text = "journal header at " + Position(state.offset) + " has no signature";
     } else if (reader.U32(kJournalChecksum) !=
                JournalChecksum(bytes, kJournalHeaderSize, kJournalChecksum)) {
-        state.text = "journal header at " + Grouped(state.offset) + " has a wrong checksum";
+        state.text = "journal header at " + Position(state.offset) + " has a wrong checksum";
     } else if (size != state.size || !IsPowerOfTwo(headerBytes) || headerBytes < kSectorSize ||
                headerBytes >= size || start < headerBytes || start > size || end < headerBytes ||
                end > size) {
-        state.text = "journal header at " + Grouped(state.offset) + " is out of range";
+        state.text = "journal header at " + Position(state.offset) + " is out of range";
     } else {
         state.readable = true;
         state.pendingBytes = end >= start ? end - start : end - start + (size - headerBytes);

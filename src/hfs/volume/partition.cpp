@@ -32,13 +32,13 @@ Problem EnterWrapper(BlockDevice* image, VolumePlace* place) {
     u8 mdb[kHeaderSize];
     const u64 at = place->offset + kHeaderOffset;
     if (!image->Read(at, mdb, sizeof mdb).Ok()) {
-        return FailureAt(at, "HFS wrapper at " + Grouped(place->offset) + " cannot be read", "");
+        return FailureAt(at, "HFS wrapper at " + Position(place->offset) + " cannot be read", "");
     }
     const u64 blockSize = Be32(mdb + 20);
     const u64 blockCount = Be16(mdb + 128);
     if (blockSize == 0 || blockSize % 512 != 0 || blockCount == 0) {
         return FailureAt(at,
-                         "HFS wrapper at " + Grouped(place->offset) + ": block size " +
+                         "HFS wrapper at " + Position(place->offset) + ": block size " +
                              Grouped(blockSize) + ", " + Grouped(blockCount) +
                              " blocks for the volume inside",
                          "if you know where the volume starts, give --offset");
@@ -55,7 +55,7 @@ Problem HeaderGone(BlockDevice* image, u64 offset) {
     image->Read(offset + kHeaderOffset, signature, sizeof signature);
     Problem problem =
         FailureAt(offset + kHeaderOffset,
-                  "volume header at " + Grouped(offset + kHeaderOffset) +
+                  "volume header at " + Position(offset + kHeaderOffset) +
                       Format(": signature %04X is neither 482B nor 4858", Be16(signature)),
                   "try --backup-header");
     problem.check = "V01";
@@ -81,7 +81,7 @@ Problem Accept(BlockDevice* image, Content content, bool lenient, VolumePlace* p
 
 std::string PlainHfsText(u64 offset) {
     return "HFS volume without an HFS+ volume inside (signature 4244 at " +
-           Grouped(offset + kHeaderOffset) + ")";
+           Position(offset + kHeaderOffset) + ")";
 }
 
 Problem PlainHfs(u64 offset) {

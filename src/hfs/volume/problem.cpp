@@ -38,6 +38,10 @@ std::string Grouped(u64 number) {
     return text;
 }
 
+std::string Position(u64 offset) {
+    return offset < 10000 ? std::to_string(offset) : Grouped(offset);
+}
+
 std::string HexOffset(u64 number) {
     return Format("0x%llx", static_cast<unsigned long long>(number));
 }

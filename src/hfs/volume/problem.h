@@ -40,6 +40,8 @@ Problem UsageProblem(std::string what, std::string advice);
 
 // Number with commas between groups of three digits, as in "209,735,712".
 std::string Grouped(u64 number);
+// A place in the image: "1024", "16,384", "209,735,712".
+std::string Position(u64 offset);
 // "0x15810".
 std::string HexOffset(u64 number);
 // printf into a string.

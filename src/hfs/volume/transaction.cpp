@@ -47,7 +47,8 @@ private:
 
 }  // namespace
 
-IoResult CommitSink::Carry(const OverlayDevice& staged, BlockDevice* home, u64* bytesWritten) {
+IoResult CommitSink::CarryExcept(const OverlayDevice& staged, BlockDevice* home, u64 skip,
+                                 u64 skipBytes, u64* bytesWritten) {
     Gatherer gatherer(home, bytesWritten);
     for (const u64 number : staged.ChangedPages()) {
         const OverlayDevice::Page* page = staged.PageAt(number);
@@ -58,13 +59,29 @@ IoResult CommitSink::Carry(const OverlayDevice& staged, BlockDevice* home, u64* 
             const u32 at = sector * kSectorSize;
             const u64 offset = number * OverlayDevice::kPageSize + at;
             const u32 size = static_cast<u32>(std::min<u64>(kSectorSize, home->Size() - offset));
-            const IoResult result = gatherer.Add(offset, page->bytes + at, size);
+            // The range to skip need not begin with a sector: what lies beside it is written.
+            const u64 skipFrom = std::clamp(skip, offset, offset + size);
+            const u64 skipTo = std::clamp(skip + skipBytes, offset, offset + size);
+            const u32 before =
+                static_cast<u32>((skipTo == skipFrom ? offset + size : skipFrom) - offset);
+            IoResult result;
+            if (before != 0) {
+                result = gatherer.Add(offset, page->bytes + at, before);
+            }
+            if (result.Ok() && skipTo != skipFrom && skipTo < offset + size) {
+                const u32 rest = static_cast<u32>(skipTo - offset);
+                result = gatherer.Add(skipTo, page->bytes + at + rest, size - rest);
+            }
             if (!result.Ok()) {
                 return result;
             }
         }
     }
-    const IoResult result = gatherer.Finish();
+    return gatherer.Finish();
+}
+
+IoResult CommitSink::Carry(const OverlayDevice& staged, BlockDevice* home, u64* bytesWritten) {
+    const IoResult result = CarryExcept(staged, home, 0, 0, bytesWritten);
     return result.Ok() ? home->Sync() : result;
 }
 

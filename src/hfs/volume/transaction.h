@@ -13,6 +13,11 @@ public:
     virtual ~CommitSink() = default;
     // On failure `home` may hold a part of the changes; the sink says what that means.
     virtual IoResult Carry(const OverlayDevice& staged, BlockDevice* home, u64* bytesWritten);
+
+protected:
+    // Writes the staged sectors in rising order, but none of [skip, skip + skipBytes). No sync.
+    static IoResult CarryExcept(const OverlayDevice& staged, BlockDevice* home, u64 skip,
+                                u64 skipBytes, u64* bytesWritten);
 };
 
 class Transaction {

@@ -193,7 +193,7 @@ HfsFork* VolumeHeader::ForkOf(u32 fileId) {
 }
 
 Problem CheckHeader(const VolumeHeader& header, u64 headerOffset) {
-    const std::string place = "volume header at " + Grouped(headerOffset) + ": ";
+    const std::string place = "volume header at " + Position(headerOffset) + ": ";
     std::string fault;
     std::string check = "V02";
     if (header.signature != kSignatureHfsPlus && header.signature != kSignatureHfsx) {

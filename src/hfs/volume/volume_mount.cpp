@@ -6,6 +6,7 @@
 #include "hfs/volume/journal_state.h"
 #include "hfs/volume/volume_state.h"
 #include "hfs/volume/wire.h"
+#include "hfs/volume/write_checks.h"
 
 namespace VELK {
 
@@ -59,7 +60,7 @@ std::string VolumeWords(const VolumePlace& place) {
 Problem TruncatedNote(u64 imageSize, const VolumePlace& place, u64 end) {
     Problem note = FailureAt(
         imageSize,
-        "image ends at " + Grouped(imageSize) + ", " + VolumeWords(place) + " at " + Grouped(end),
+        "image ends at " + Position(imageSize) + ", " + VolumeWords(place) + " at " + Position(end),
         "reading what is there; check and dump need --keep-going");
     note.status = kErrVolumeTruncated;
     note.check = "V02";
@@ -166,6 +167,10 @@ void StackDevices(ImageVolume::State* state) {
     BlockDevice* top = home;
     if (state->options.access != Access::kReadOnly) {
         state->transaction = std::make_unique<Transaction>(home);
+        if (state->options.access == Access::kWrite) {
+            state->sink = std::make_unique<HeaderLastSink>(state->place.offset + kHeaderOffset);
+            state->transaction->SetSink(state->sink.get());
+        }
         top = state->transaction->Staged();
     }
     state->volume = std::make_unique<SliceDevice>(top, state->place.offset, state->volumeBytes);
@@ -177,7 +182,7 @@ Problem ReadHeaders(ImageVolume::State* state) {
     const bool hasMain = ReadHeaderAt(state->image.get(), mainOffset, &state->header);
     const Problem mainProblem =
         hasMain ? CheckHeader(state->header, mainOffset)
-                : FailureAt(mainOffset, "volume header at " + Grouped(mainOffset) + ": unreadable",
+                : FailureAt(mainOffset, "volume header at " + Position(mainOffset) + ": unreadable",
                             "try --backup-header");
     state->alternateOffset = FindAlternate(
         state->image.get(), place, mainProblem ? nullptr : &state->header, &state->alternate);
@@ -187,7 +192,7 @@ Problem ReadHeaders(ImageVolume::State* state) {
     if (!state->alternateOffset) {
         return FailureAt(place.offset + place.size - kAltHeaderFromEnd,
                          "alternate volume header at " +
-                             Grouped(place.offset + place.size - kAltHeaderFromEnd) +
+                             Position(place.offset + place.size - kAltHeaderFromEnd) +
                              ": there is none",
                          "");
     }
@@ -229,7 +234,9 @@ Problem ImageVolume::State::Mount(VolumeScan* scan) {
         isTruncated = true;
         notes.push_back(TruncatedNote(image->Size(), place, place.offset + blocksBytes));
     }
+    const std::size_t notesBefore = notes.size();
     NoteOverlaps(header, &notes);
+    const bool overlapping = notes.size() != notesBefore;
     journal = ReadJournalState(volume.get(), header, place.offset);
     if (journal.present && !journal.empty) {
         notes.push_back(
@@ -238,6 +245,16 @@ Problem ImageVolume::State::Mount(VolumeScan* scan) {
                       "read as the volume stands without them"));
     }
     isWritable = options.access != Access::kReadOnly;
+    if (options.access == Access::kWrite) {
+        if (Problem problem = CheckMayWrite(header, journal, options.force)) {
+            return problem;
+        }
+        if (overlapping || isTruncated) {
+            Problem problem = notes.front();
+            problem.advice = "the volume can only be read";
+            return problem;
+        }
+    }
     if (isWritable) {
         if (Problem problem = LoadBitmap()) {
             return problem;

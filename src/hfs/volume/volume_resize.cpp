@@ -121,7 +121,36 @@ Problem ImageVolume::State::LoadBitmap() {
         return lastIo;
     }
     bitmap.Attach(bitmapBytes.data(), fs.totalBlocks);
+    const u64 end = volumeBytes - std::min<u64>(volumeBytes, kAltHeaderFromEnd);
+    MarkOwned(0, static_cast<u32>(CeilDiv(kHeaderOffset + kHeaderSize, fs.allocBlockSize)));
+    MarkOwned(static_cast<u32>(std::min<u64>(end / fs.allocBlockSize, fs.totalBlocks - 1)),
+              ~u32{0});
+    for (const u32 fileId : kSpecialFileIds) {
+        for (const HfsExtent& extent : fs.ForkOf(fileId)->extents) {
+            MarkOwned(extent.startBlock, extent.blockCount);
+        }
+    }
+    NoteUnmarked();
     return {};
+}
+
+// Blocks that headers and special files take are in use whatever the allocation file says: handing
+// them out again would destroy the volume. They are only kept from being handed out; the file is
+// not corrected, except where a sector of it changes anyway.
+void ImageVolume::State::MarkOwned(u32 first, u32 count) {
+    if (first < fs.totalBlocks) {
+        unmarkedBlocks += bitmap.SetRun(first, std::min(count, fs.totalBlocks - first));
+    }
+}
+
+void ImageVolume::State::NoteUnmarked() {
+    if (unmarkedBlocks != 0) {
+        Problem note = Failure("allocation file: " + Grouped(unmarkedBlocks) +
+                                   " blocks of headers and special files are marked free",
+                               "run check --full");
+        note.check = "V05";
+        notes.push_back(note);
+    }
 }
 
 int ImageVolume::State::Resize(HfsRuns* runs, u32 fileId, u64 newSize) {

@@ -56,7 +56,7 @@ int ImageVolume::State::IoStatus(const IoResult& result, u32 fileId, u64 forkOff
     }
     if (result.error == kIoPastEnd) {
         lastIo = FailureAt(at,
-                           "image ends at " + Grouped(image->Size()) + ", " + where + " (" +
+                           "image ends at " + Position(image->Size()) + ", " + where + " (" +
                                HexOffset(at) + ") lies behind that",
                            "");
         lastIo.status = kErrVolumeTruncated;

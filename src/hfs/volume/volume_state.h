@@ -71,6 +71,7 @@ struct ImageVolume::State {
     // --- image, from the host's file up to the volume's bytes ------------------------------------
     std::unique_ptr<BlockDevice> image;
     std::unique_ptr<OverlayDevice> overlay;    // Access::kOverlay
+    std::unique_ptr<CommitSink> sink;          // Access::kWrite
     std::unique_ptr<Transaction> transaction;  // unless read-only
     std::unique_ptr<SliceDevice> volume;       // what reads and writes go through
     OpenOptions options;
@@ -94,6 +95,7 @@ struct ImageVolume::State {
     std::array<SpecialFile, 5> files;
     u64 handedOver = 0;
     u64 trimFloor = 0;
+    u32 unmarkedBlocks = 0;  // in use, but free by the allocation file
 
     // --- changes since the last commit -----------------------------------------------------------
     std::vector<BitmapChange> bitmapChanges;
@@ -125,6 +127,8 @@ struct ImageVolume::State {
 
     // volume_resize.cpp
     Problem LoadBitmap();
+    void MarkOwned(u32 first, u32 count);
+    void NoteUnmarked();
     int Resize(HfsRuns* runs, u32 fileId, u64 newSize);
 
     // volume_commit.cpp

@@ -195,6 +195,11 @@ int ImageVolume::State::MapFork(u32 fileId) {
         sound =
             AppendExtents(file->runs, record.extents, fs.totalBlocks, fork->totalBlocks, &blocks);
         file->overflow.push_back(record);
+        if (bitmap.Size() != 0) {
+            for (const HfsExtent& extent : record.extents) {
+                MarkOwned(extent.startBlock, extent.blockCount);
+            }
+        }
     }
     if (!file->problem && (!sound || blocks != fork->totalBlocks)) {
         file->problem = ForkProblem(fileId, "extents for " + Grouped(blocks) + " of " +
