@@ -1,0 +1,82 @@
+// What the fuzz targets share: taking an input apart, checks that end the run, an engine that says
+// nothing and whose memory is counted.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <cstdlib>
+
+#include "heap_guard.h"
+#include "image_bytes.h"
+#include "platform/host/host.h"
+
+// A target: looks at one input. Ends the process when an answer is wrong.
+extern "C" int LLVMFuzzerTestOneInput(const VELK::u8* data, std::size_t size);
+
+#define FUZZ_CHECK(condition)                                                                   \
+    do {                                                                                        \
+        if (!(condition)) {                                                                     \
+            std::fprintf(stderr, "%s:%d: does not hold: %s\n", __FILE__, __LINE__, #condition); \
+            std::abort();                                                                       \
+        }                                                                                       \
+    } while (false)
+
+namespace VELK::fuzz {
+
+// The input from front to back; past its end everything is 0.
+class Input {
+public:
+    Input(const u8* data, std::size_t size) : data_(data), left_(size) {}
+
+    bool IsEmpty() const { return left_ == 0; }
+    u8 U8() {
+        if (left_ == 0) {
+            return 0;
+        }
+        left_ -= 1;
+        return *data_++;
+    }
+    u16 U16() {
+        const u16 high = U8();
+        return static_cast<u16>(high << 8 | U8());
+    }
+    test::Bytes Rest(std::size_t most) {
+        const std::size_t size = left_ < most ? left_ : most;
+        test::Bytes rest(data_, data_ + size);
+        data_ += size;
+        left_ -= size;
+        return rest;
+    }
+
+private:
+    const u8* data_;
+    std::size_t left_;
+};
+
+// No report, no trace; the heap of the engine is counted, and at the end nothing may be left and
+// no service of the volume may have been used against its contract.
+class Quiet {
+public:
+    Quiet() : before_(SetHostSinks(&kSilent)) {}
+    ~Quiet() { SetHostSinks(before_); }
+    Quiet(const Quiet&) = delete;
+    Quiet& operator=(const Quiet&) = delete;
+
+private:
+    static void NoText(void*, const char*) {}
+    static void NoLog(void*, void*, const char*) {}
+    static void NoDump(void*, const void*, unsigned) {}
+    static void NoError(void*, unsigned, const char*, int) {}
+
+    static constexpr HostSinks kSilent = {NoError, NoText, NoLog, NoDump, nullptr};
+    const HostSinks* before_;
+    test::HeapGuard heap_;
+};
+
+// To be called once everything of a run is gone.
+inline void CheckNothingFailed() {
+    FUZZ_CHECK(!::testing::Test::HasFailure());
+}
+
+}  // namespace VELK::fuzz

@@ -1,0 +1,98 @@
+// A whole image of any bytes: found, mounted, its trees opened and walked, changed in an overlay.
+// Whatever it holds there is an answer or a problem in words; nothing leaks and everything ends.
+//
+// Input: how to open it, what to do, then the image.
+#include <cstring>
+
+#include "fuzz.h"
+#include "hfs/volume/image_volume.h"
+#include "keys.h"
+
+namespace {
+
+using namespace VELK;
+
+constexpr std::size_t kMostBytes = 1u << 20;
+constexpr u32 kSteps = 300;
+constexpr u32 kTrees[] = {kExtentsFileId, kCatalogFileId, kAttributesFileId};
+
+struct alignas(8) Buffers {
+    u8 record[32768];
+    u8 key[kKeyLengthSize + kMaxKeyLength + 6];
+    unsigned recordSize;
+    unsigned keySize;
+};
+
+void Walk(ImageVolume* volume, CBTreeHfs* tree) {
+    Buffers at = {};
+    HfsFindData path;
+    const unsigned long long first = static_cast<u64>(tree->header.firstLeafNode)
+                                     << tree->nodeShift;
+    int status = tree->SetPos(first, at.record, sizeof at.record, &at.recordSize, at.key,
+                              sizeof at.key, &at.keySize, &path);
+    for (u32 i = 0; i < kSteps && status == kOk; ++i) {
+        status = tree->IncPos(1, at.record, sizeof at.record, &at.recordSize, at.key, sizeof at.key,
+                              &at.keySize, &path);
+        volume->TrimCache();
+    }
+    path.ClearPath();
+}
+
+void Change(ImageVolume* volume, CBTreeHfs* tree, u8 what) {
+    for (u32 n = 0; n < 12 && volume->IsWritable(); ++n) {
+        const test::HostKey key = test::NthHostKey(tree->fileId, n);
+        const test::Bytes record = test::Pattern(88, n);
+        const int status = (n + what) % 4 == 0
+                               ? tree->DeleteRecord(key.Get(), key.id, false)
+                               : tree->InsertRecord(key.Get(), key.id, record.data(), 88);
+        if (status != kOk && volume->RestoreAfter(status)) {
+            return;
+        }
+    }
+    volume->Commit(0);
+}
+
+void Run(fuzz::Input* input) {
+    const u8 how = input->U8();
+    const u8 what = input->U8();
+    const test::Bytes bytes = input->Rest(kMostBytes);
+    auto device = std::make_unique<MemoryDevice>(bytes.size());
+    FUZZ_CHECK(device->Write(0, bytes.data(), bytes.size()).Ok());
+    OpenOptions options;
+    options.access = (how & 1) != 0 ? Access::kOverlay : Access::kReadOnly;
+    options.backupHeader = (how & 2) != 0;
+    options.partition = how >> 4 & 3;
+    options.mapBlockSize = (how & 4) != 0 ? 512 : 0;
+    options.cacheBudget = 1u << 14;
+    VolumeScan scan;
+    Problem problem;
+    const std::unique_ptr<ImageVolume> volume =
+        ImageVolume::Open(std::move(device), options, &scan, &problem);
+    FUZZ_CHECK(volume != nullptr || !problem.Text().empty());
+    if (volume == nullptr) {
+        return;
+    }
+    for (const u32 fileId : kTrees) {
+        Problem trouble;
+        CBTreeHfs* tree = volume->Tree(fileId, &trouble);
+        FUZZ_CHECK(tree != nullptr || !trouble.Text().empty());
+        if (tree != nullptr) {
+            Walk(volume.get(), tree);
+            if ((how & 1) != 0 && fileId != kExtentsFileId) {
+                Change(volume.get(), tree, what);
+            }
+        }
+    }
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
+    fuzz::Input input(data, size);
+    {
+        const fuzz::Quiet quiet;
+        Run(&input);
+    }
+    fuzz::CheckNothingFailed();
+    return 0;
+}

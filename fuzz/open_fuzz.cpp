@@ -1,0 +1,122 @@
+// A whole tree file of any bytes: opened, walked both ways, searched, changed. Nothing may be read
+// or written outside it, every walk ends, nothing leaks, no service is used against its contract,
+// and after a change that failed the restored tree is the one before it.
+//
+// Input: tree kind, geometry, what to do, then the tree file.
+#include "fuzz.h"
+#include "keys.h"
+#include "mem_volume.h"
+
+namespace {
+
+using namespace VELK;
+
+constexpr std::size_t kMostBytes = 1u << 18;
+constexpr u32 kSteps = 400;
+constexpr u32 kKeys = 24;
+constexpr u32 kFiles[] = {kCatalogFileId, kExtentsFileId, kAttributesFileId};
+
+struct alignas(8) Buffers {
+    u8 record[32768];
+    u8 key[kKeyLengthSize + kMaxKeyLength + 6];
+    unsigned recordSize;
+    unsigned keySize;
+};
+
+void Walk(CBTreeHfs* tree, int step, u32 firstNode) {
+    Buffers at = {};
+    HfsFindData path;
+    const unsigned long long position = static_cast<u64>(firstNode) << tree->nodeShift;
+    int status = tree->SetPos(position, at.record, sizeof at.record, &at.recordSize, at.key,
+                              sizeof at.key, &at.keySize, &path);
+    for (u32 i = 0; i < kSteps && status == kOk; ++i) {
+        FUZZ_CHECK(at.recordSize <= sizeof at.record && at.keySize <= sizeof at.key);
+        status = tree->IncPos(step, at.record, sizeof at.record, &at.recordSize, at.key,
+                              sizeof at.key, &at.keySize, &path);
+    }
+    path.ClearPath();
+}
+
+void Search(CBTreeHfs* tree) {
+    Buffers at = {};
+    for (u32 n = 0; n < kKeys; ++n) {
+        const test::HostKey key = test::NthHostKey(tree->fileId, n * 3, n % 2 == 0);
+        HfsFindData path;
+        tree->FindRecord(key.Get(), key.id, at.record, sizeof at.record, &at.recordSize, &path);
+        path.ClearPath();
+    }
+}
+
+bool IsAnswer(int status) {
+    return status == kOk || status == kErrNotFound || status == kErrExists ||
+           status == kErrTooLarge;
+}
+
+// Changes until one fails, then restores, as a volume does. False: restored.
+bool Change(CBTreeHfs* tree, test::MemVolume* volume, u8 pattern) {
+    if (tree->Flush(0) != kOk) {
+        return false;
+    }
+    const test::MemVolume::Snapshot before = volume->Save();
+    for (u32 n = 0; n < kKeys; ++n) {
+        const test::HostKey key = test::NthHostKey(tree->fileId, n, (pattern & 2) != 0);
+        const test::Bytes record = test::Pattern(2 + 2 * (n * pattern % 120), n);
+        const int status = (n + pattern) % 3 == 0
+                               ? tree->DeleteRecord(key.Get(), key.id, false)
+                               : tree->InsertRecord(key.Get(), key.id, record.data(),
+                                                    static_cast<unsigned>(record.size()));
+        if (!IsAnswer(status)) {
+            tree->findData.ClearPath();
+            volume->Restore(before);
+            tree->RestoreModifiedNodes();
+            return false;
+        }
+    }
+    tree->Flush(0);
+    return true;
+}
+
+void Run(fuzz::Input* input) {
+    const u32 fileId = kFiles[input->U8() % 3];
+    const u8 geometry = input->U8();
+    const u8 pattern = input->U8();
+    test::MemVolumeOptions options;
+    options.mapBlockSize = 512u << (geometry & 3);
+    options.allocBlockSize = options.mapBlockSize;
+    options.totalBlocks = 4096;
+    options.hasJournal = (geometry & 4) != 0;
+    test::MemVolume volume(options);
+    volume.LoadFile(fileId, input->Rest(kMostBytes));
+    {
+        test::TestTree tree(&volume, fileId);
+        if (tree->Init() == kOk) {
+            Walk(&*tree, 1, tree->header.firstLeafNode);
+            Walk(&*tree, -1, tree->header.lastLeafNode);
+            Search(&*tree);
+            if (fileId == kExtentsFileId) {
+                HfsRuns runs;
+                tree->LoadBadBlocks(&runs);
+            }
+            if ((pattern & 1) != 0 && Change(&*tree, &volume, pattern)) {
+                Walk(&*tree, 1, tree->header.firstLeafNode);
+            }
+        }
+    }
+    FUZZ_CHECK(volume.Lent() == 0);
+    for (const std::string& breach : volume.breaches) {
+        std::fprintf(stderr, "%s\n", breach.c_str());
+    }
+    FUZZ_CHECK(volume.breaches.empty());
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
+    fuzz::Input input(data, size);
+    {
+        const fuzz::Quiet quiet;
+        Run(&input);
+    }
+    fuzz::CheckNothingFailed();
+    return 0;
+}

@@ -1,0 +1,170 @@
+// A sequence of operations on a sound tree, in any order, against a plain model. The tree on disk
+// is then read without the engine and compared record by record.
+//
+// Input: tree kind, geometry, then operations of three bytes: what, key, size.
+#include <map>
+
+#include "capture.h"
+#include "flat_tree.h"
+#include "fuzz.h"
+#include "keys.h"
+#include "ledger.h"
+#include "mem_volume.h"
+
+namespace {
+
+using namespace VELK;
+
+constexpr u32 kFiles[] = {kCatalogFileId, kExtentsFileId, kAttributesFileId};
+constexpr u32 kMostOperations = 2000;
+
+class Run {
+public:
+    explicit Run(fuzz::Input* input)
+        : fileId_(kFiles[input->U8() % 3]), geometry_(input->U8()), volume_(Options(geometry_)) {
+        test::TreeShape shape;
+        shape.fileId = fileId_;
+        shape.nodeSize = 512u << (geometry_ >> 4 & 3);
+        shape.nodeSize = shape.nodeSize < volume_.options.mapBlockSize
+                             ? volume_.options.mapBlockSize
+                             : shape.nodeSize;
+        shape.clumpSize = 4 * shape.nodeSize;
+        shape.freeNodes = 2;
+        mostData_ = shape.nodeSize / 4;
+        volume_.LoadTree(test::BuildTree(shape, {}));
+        test::TestTree tree(&volume_, fileId_);
+        tree_ = &*tree;
+        FUZZ_CHECK(tree_->Init() == kOk);
+        for (u32 i = 0; i < kMostOperations && !input->IsEmpty(); ++i) {
+            Operate(input);
+        }
+        Compare();
+    }
+
+private:
+    static test::MemVolumeOptions Options(u8 geometry) {
+        test::MemVolumeOptions options;
+        options.mapBlockSize = 512u << (geometry & 3);
+        options.allocBlockSize = options.mapBlockSize;
+        options.totalBlocks = 1u << 15;
+        options.hasJournal = (geometry & 4) != 0;
+        return options;
+    }
+
+    void Operate(fuzz::Input* input) {
+        const u8 what = input->U8();
+        const u32 n = input->U8() | (what & 0xF0u) << 4;
+        const u32 size = 2 + 2 * (input->U8() % (mostData_ / 2));
+        switch (what & 7) {
+            case 0:
+            case 1:
+            case 2:
+                return Insert(n, size);
+            case 3:
+                return Delete(n);
+            case 4:
+                return Find(n);
+            case 5:
+                return Update(n);
+            case 6:
+                FUZZ_CHECK(tree_->Flush(what >> 4 & 4) == kOk);
+                return;
+            default:
+                return Step(n, what);
+        }
+    }
+
+    void Insert(u32 n, u32 size) {
+        const test::HostKey key = test::NthHostKey(fileId_, n);
+        const test::Bytes data = test::Pattern(size, n + size);
+        const bool isNew = model_.try_emplace(n, data).second;
+        FUZZ_CHECK(tree_->InsertRecord(key.Get(), key.id, data.data(), size) ==
+                   (isNew ? kOk : kErrExists));
+    }
+
+    void Delete(u32 n) {
+        const test::HostKey key = test::NthHostKey(fileId_, n);
+        const bool isThere = model_.erase(n) != 0;
+        FUZZ_CHECK(tree_->DeleteRecord(key.Get(), key.id, false) == (isThere ? kOk : kErrNotFound));
+    }
+
+    // Leaves the record in `record_`. True: it is there, and is the model's.
+    bool Find(u32 n, HfsFindData* path) {
+        const test::HostKey key = test::NthHostKey(fileId_, n);
+        unsigned size = 0;
+        const int status =
+            tree_->FindRecord(key.Get(), key.id, record_, sizeof record_, &size, path);
+        const auto known = model_.find(n);
+        FUZZ_CHECK(status == (known == model_.end() ? kErrNotFound : kOk));
+        FUZZ_CHECK(status != kOk || test::Bytes(record_, record_ + size) == known->second);
+        return status == kOk;
+    }
+
+    void Find(u32 n) {
+        HfsFindData path;
+        Find(n, &path);
+        path.ClearPath();
+    }
+
+    void Update(u32 n) {
+        if (Find(n, nullptr)) {
+            test::Bytes& data = model_.at(n);
+            data = test::Pattern(data.size(), n * 7 + data[0]);
+            FUZZ_CHECK(tree_->UpdateKeyAndRecord(nullptr, data.data()) == kOk);
+        }
+    }
+
+    // A few steps forward from a key, compared with the model.
+    void Step(u32 n, u8 what) {
+        HfsFindData path;
+        if (Find(n, &path)) {
+            auto known = model_.find(n);
+            for (u32 i = 0; i < 1u + (what >> 4); ++i) {
+                unsigned size = 0;
+                const int status =
+                    tree_->IncPos(1, record_, sizeof record_, &size, nullptr, 0, nullptr, &path);
+                ++known;
+                FUZZ_CHECK(status == (known == model_.end() ? kErrNotFound : kOk));
+                if (status != kOk) {
+                    break;
+                }
+                FUZZ_CHECK(test::Bytes(record_, record_ + size) == known->second);
+            }
+        }
+        path.ClearPath();
+    }
+
+    void Compare() {
+        FUZZ_CHECK(tree_->Flush(0) == kOk);
+        FUZZ_CHECK(test::LedgerHolds(*tree_, test::References(tree_->findData)));
+        const test::FlatTree flat = test::ReadFlat(volume_.Disk(fileId_));
+        FUZZ_CHECK(test::IsSound(flat));
+        FUZZ_CHECK(flat.records.size() == model_.size());
+        std::size_t i = 0;
+        for (const auto& [n, data] : model_) {
+            FUZZ_CHECK(flat.records[i].key == test::NthDiskKey(fileId_, n));
+            FUZZ_CHECK(flat.records[i].data == data);
+            ++i;
+        }
+    }
+
+    u32 fileId_;
+    u8 geometry_;
+    u32 mostData_ = 0;
+    test::MemVolume volume_;
+    CBTreeHfs* tree_ = nullptr;
+    std::map<u32, test::Bytes> model_;
+    alignas(8) u8 record_[8192] = {};
+};
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
+    fuzz::Input input(data, size);
+    {
+        const fuzz::Quiet quiet;
+        Run run(&input);
+    }
+    fuzz::CheckNothingFailed();
+    return 0;
+}
