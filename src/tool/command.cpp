@@ -49,6 +49,10 @@ Invocation::Invocation(const Command& theCommand, std::vector<std::string> argum
 
 void Invocation::DeclareImage() {
     options.Argument("IMAGE", &image, "disk image, partition or device with the volume");
+    DeclarePlace();
+}
+
+void Invocation::DeclarePlace() {
     options.Count("--partition", &partitionNumber_, "N",
                   "partition as numbered by info --partitions");
     options.Size("--offset", &offset, "N",

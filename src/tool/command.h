@@ -42,6 +42,7 @@ public:
 
     // --- before Parse: which options the command takes. The general ones are always there. -------
     void DeclareImage();  // IMAGE and what says where the volume lies in it
+    void DeclarePlace();  // the latter alone
     void DeclareTrees(TreeDefault treeDefault);
     void DeclareRange();       // --range
     void DeclareLimits();      // --limit --offset-records

@@ -11,12 +11,23 @@
 
 namespace VELK::tool {
 
-// One row per command, one file per command.
-extern const Command kCompletionCommand, kHelpCommand, kLsCommand, kVersionCommand;
+// One row per command, one file per command, in the order of the help text.
+// clang-format off
+extern const Command kLsCommand;
+extern const Command kApplyCommand;
+extern const Command kCompletionCommand;
+extern const Command kHelpCommand;
+extern const Command kVersionCommand;
 
 const Command* const kCommands[] = {
-    &kLsCommand, &kCompletionCommand, &kHelpCommand, &kVersionCommand, nullptr,
+    &kLsCommand,
+    &kApplyCommand,
+    &kCompletionCommand,
+    &kHelpCommand,
+    &kVersionCommand,
+    nullptr,
 };
+// clang-format on
 
 const Command* FindCommand(const std::string& name) {
     for (const Command* const* command = kCommands; *command != nullptr; ++command) {

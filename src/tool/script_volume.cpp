@@ -1,0 +1,195 @@
+// Opening and finishing the volume of a script.
+#include "tool/script_volume.h"
+
+#include <fmt/format.h>
+#include <unistd.h>
+
+#include <cstdio>
+
+#include "hfs/volume/make_volume.h"
+#include "tool/errors.h"
+#include "tool/options.h"
+
+namespace VELK::tool {
+namespace {
+
+struct NamedNumber {
+    const char* name;
+    u32* target;
+};
+
+[[noreturn]] void ThrowNewVolume(const std::string& word, const std::string& what) {
+    ThrowUsage("", fmt::format("--new: '{}' {}", word, what),
+               "SIZE[,block=N][,map=N][,node=N][,clump=N][,case][,empty]");
+}
+
+// One item behind the size of --new.
+void ApplyItem(const std::string& item, FormatOptions* options) {
+    if (item == "case") {
+        options->caseSensitive = true;
+        return;
+    }
+    if (item == "empty") {
+        options->emptyTrees = true;
+        return;
+    }
+    u32 nodeSize = 0;
+    const NamedNumber numbers[] = {{"block", &options->blockSize},
+                                   {"map", &options->mapBlockSize},
+                                   {"node", &nodeSize},
+                                   {"clump", &options->clumpSize}};
+    const std::size_t equal = item.find('=');
+    for (const NamedNumber& number : numbers) {
+        u64 value = 0;
+        if (item.substr(0, equal) != number.name || equal == std::string::npos) {
+            continue;
+        }
+        if (!ParseSize(item.substr(equal + 1), &value) || value == 0 || value > 0xFFFFFFFF) {
+            ThrowNewVolume(item, "is no size in bytes");
+        }
+        *number.target = static_cast<u32>(value);
+        if (nodeSize != 0) {
+            options->catalogNodeSize = nodeSize;
+            options->extentsNodeSize = nodeSize;
+            options->attributesNodeSize = nodeSize;
+        }
+        return;
+    }
+    ThrowNewVolume(item,
+                   "is unknown" + DidYouMean(item.substr(0, equal),
+                                             {"block", "map", "node", "clump", "case", "empty"}));
+}
+
+std::unique_ptr<ImageVolume> OpenNew(const TargetOptions& target) {
+    FormatOptions options;
+    const std::string& text = target.newVolume;
+    std::size_t at = std::min(text.find(','), text.size());
+    u64 size = 0;
+    if (!ParseSize(text.substr(0, at), &size) || size == 0) {
+        ThrowNewVolume(text.substr(0, at), "is no size in bytes");
+    }
+    while (at < text.size()) {
+        const std::size_t end = std::min(text.find(',', at + 1), text.size());
+        ApplyItem(text.substr(at + 1, end - at - 1), &options);
+        at = end;
+    }
+    Problem problem;
+    std::unique_ptr<ImageVolume> volume = MakeMemoryVolume(size, options, &problem);
+    if (!volume) {
+        ThrowProblem("--new", problem);
+    }
+    return volume;
+}
+
+// Writing to a volume that something else may still have plans for loses data.
+void RefuseUnsafe(const Invocation& call, const ImageVolume& volume) {
+    const JournalState& journal = volume.Journal();
+    if (journal.present && !journal.empty) {
+        ThrowFailed(call.image,
+                    fmt::format("the journal holds transactions ({} B): writing would lose them; "
+                                "let the native system replay it, or --force",
+                                Grouped(journal.pendingBytes)),
+                    "");
+    }
+    const u32 attributes = volume.Header().attributes;
+    if ((attributes & kVolUnmounted) == 0 || (attributes & kVolBootInconsistent) != 0) {
+        ThrowFailed(call.image, "the volume was not unmounted cleanly",
+                    "let the native system repair it, or --force");
+    }
+}
+
+void Save(const TargetOptions& options, ImageVolume* volume) {
+    if (!options.force && access(options.saveFile.c_str(), F_OK) == 0) {
+        ThrowFailed("", options.saveFile + " exists", "--force replaces it");
+    }
+    const std::string part = options.saveFile + ".part";
+    std::FILE* file = std::fopen(part.c_str(), "wb");
+    if (file == nullptr) {
+        ThrowFailed(options.saveFile, "cannot be written", "");
+    }
+    Problem problem = volume->SaveTo(file);
+    if (std::fclose(file) != 0 && !problem) {
+        problem = Failure("cannot write the copy: disk full or not writable", "");
+    }
+    if (!problem && std::rename(part.c_str(), options.saveFile.c_str()) != 0) {
+        problem = Failure("cannot be written", "");
+    }
+    if (problem) {
+        std::remove(part.c_str());
+        ThrowProblem(options.saveFile, problem);
+    }
+}
+
+}  // namespace
+
+void TargetOptions::Declare(Invocation* call) {
+    call->DeclarePlace();
+    call->options.Text("--new", &newVolume, "SIZE[,...]",
+                       "a fresh volume in memory instead of an image: 64M, 1M,node=512, also "
+                       "block=N map=N clump=N case empty");
+    call->options.Text("--save", &saveFile, "FILE", "write the volume to FILE afterwards");
+    call->options.Flag("--write", &write, "let changes reach the image");
+    call->options.Flag("--force", &force,
+                       "write to a volume with a journal or not unmounted; replace FILE");
+}
+
+std::string TargetOptions::Subject(const Invocation& call) const {
+    return newVolume.empty() ? call.image : "new volume";
+}
+
+std::unique_ptr<ImageVolume> OpenTarget(const Invocation& call, const TargetOptions& options) {
+    if (!options.newVolume.empty()) {
+        if (options.write) {
+            ThrowUsage(call.command.name, "--new and --write do not go together",
+                       "--save FILE keeps a new volume");
+        }
+        return OpenNew(options);
+    }
+    OpenOptions open;
+    open.access = options.write ? Access::kWrite : Access::kOverlay;
+    open.offset = call.offset;
+    open.partition = call.partition;
+    open.backupHeader = call.backupHeader;
+    open.mapBlockSize = call.mapBlockSize;
+    Problem problem;
+    std::unique_ptr<ImageVolume> volume =
+        ImageVolume::OpenFile(call.image, open, nullptr, &problem);
+    if (!volume) {
+        ThrowProblem(call.image, problem);
+    }
+    if (options.write && !options.force) {
+        RefuseUnsafe(call, *volume);
+    }
+    return volume;
+}
+
+void FinishTarget(const Invocation& call, const TargetOptions& options, ImageVolume* volume,
+                  u64 handedOverBefore) {
+    const bool keeps = options.write || !options.saveFile.empty();
+    if (keeps && volume->IsWritable()) {
+        const int status = volume->Commit(0);
+        if (status != kOk) {
+            ThrowFailed(options.Subject(call),
+                        "the last changes could not be kept: " + StatusText(status), "");
+        }
+    }
+    if (!options.saveFile.empty()) {
+        Save(options, volume);
+    }
+    u64 changed = volume->HandedOverBlocks() - handedOverBefore;
+    for (const u32 fileId : {kCatalogFileId, kExtentsFileId, kAttributesFileId}) {
+        const CBTreeHfs* tree = volume->OpenTree(fileId);
+        for (const list_head* link = tree == nullptr ? nullptr : tree->modifiedList.next;
+             link != nullptr && link != &tree->modifiedList; link = link->next) {
+            ++changed;
+        }
+    }
+    if (!keeps && changed != 0 && options.newVolume.empty() && !call.quiet) {
+        std::fprintf(stderr,
+                     "nothing was written: %s %s changed in memory; add --write to keep %s\n",
+                     Grouped(changed).c_str(), changed == 1 ? "block" : "blocks",
+                     changed == 1 ? "it" : "them");
+    }
+}
+
+}  // namespace VELK::tool
