@@ -199,7 +199,8 @@ void ImageVolume::State::Restore() {
             if (committed.validNodes[i] != 0) {
                 tree->validNodes = committed.validNodes[i];
             }
-            isWritable = isWritable && !tree->IsDirty();
+            // The header node stays cached when its record could be read again.
+            isWritable = isWritable && !tree->IsDirty() && tree->nodeRoot != nullptr;
         }
     }
 }
