@@ -3,6 +3,7 @@ add_executable(change_tests
   balance_test.cpp
   churn_test.cpp
   flat_tree.cpp
+  insert_test.cpp
   record_delete_test.cpp
   record_insert_test.cpp
 )

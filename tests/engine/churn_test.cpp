@@ -142,7 +142,7 @@ TEST_P(ChurnTest, TreeEqualsTheModelAfterEveryFewSteps) {
         }
         ASSERT_TRUE(LedgerHolds(*tree, References(tree->findData)))
             << "step " << step << " seed " << seed_;
-        if (step % 20 == 0 || step + 1 == GetParam().steps) {
+        if (step % 50 == 0 || step + 1 == GetParam().steps) {
             Compare(&tree);
         }
     }

@@ -19,6 +19,7 @@ public:
     TreeOnVolume(const TreeImage& image, u32 mapBlock, bool hasJournal = true)
         : volume_(Options(mapBlock, hasJournal)) {
         volume_.LoadTree(image);
+        volume_.fs.ForkOf(image.shape.fileId)->clumpSize = image.shape.clumpSize;
         tree_ = std::make_unique<TestTree>(&volume_, image.shape.fileId);
         EXPECT_EQ((*tree_)->Init(), kOk);
     }
@@ -31,6 +32,7 @@ public:
     CBTreeHfs* operator->() { return &tree_->tree; }
     CBTreeHfs& operator*() { return tree_->tree; }
     MemVolume& Volume() { return volume_; }
+    HeapGuard& Heap() { return heap_; }
 
     int Insert(const HostKey& key, const Bytes& data) {
         return tree_->tree.InsertRecord(key.Get(), key.id, data.data(),

@@ -60,18 +60,13 @@ int Unlink(CBTreeHfs* tree, HfsNode* node) {
 }
 
 // Puts the present first key of `node` into its parent in place of the one that was deleted.
+// REQUIRES: the levels above lead to `node`.
 int ReplaceParentKey(CBTreeHfs* tree, HfsFindData* path, HfsNode* node, int level) {
-    if (static_cast<u32>(level) >= kMaxPathDepth || path->path[level + 1].node == nullptr) {
-        return Fail(kErrCorrupt, kReasonTree, 9262);
-    }
     HfsNode* parent = path->path[level + 1].node;
     const int index = path->path[level + 1].index;
     unsigned child = 0;
     HFS_TRY(parent->GetChildNodeNum(&tree->header, index, &child), 9263);
     HFS_ASSERT(child == node->nodeNum, 4960);
-    if (child != node->nodeNum || index < 0) {
-        return Fail(kErrCorrupt, kReasonTree, 9264);
-    }
     HFS_TRY(tree->_DeleteRecord(parent, index), 4964);
     const BTreeKey* key = nullptr;
     HFS_TRY(FirstKey(tree, node, &key), 4970);
