@@ -388,6 +388,45 @@ TEST_P(CacheTest, AMissingHandleIsAssertedAndReleasedAllTheSame) {
     bench_.volume.fs.cache.Release(handle, 0);
 }
 
+// A volume that breaks its contract: its Map asks the tree for the very node being mapped.
+class ReentrantVolume {
+public:
+    explicit ReentrantVolume(Bench* bench) : bench_(bench), next_(bench->volume.fs.service) {
+        bench->volume.fs.service = {};
+        bench->volume.fs.service.ops = &kOps;
+        bench->volume.fs.service.self = this;
+    }
+    ~ReentrantVolume() { bench_->volume.fs.service = next_; }
+
+    HfsNode* inner = nullptr;
+
+private:
+    static int Map(void* self, CFileSystemHfs* fs, HfsRuns* runs, HfsFork* fork, u8 forkType,
+                   u32 fileId, u64 byteOffset, u32 bytes, bool noRead, HfsBcbBuf* bufs) {
+        auto* volume = static_cast<ReentrantVolume*>(self);
+        CBTreeHfs& tree = *volume->bench_->tree;
+        fs->service = volume->next_;
+        tree.GetINode(static_cast<u32>(byteOffset >> tree.nodeShift), &volume->inner, false);
+        return fs->Map(runs, fork, forkType, fileId, byteOffset, bytes, noRead, bufs);
+    }
+    static constexpr HfsVolumeOps kOps = {Map, nullptr, nullptr, nullptr};
+
+    Bench* bench_;
+    HfsService<HfsVolumeOps> next_;
+};
+
+TEST_P(CacheTest, ANumberThatIsThereAlreadyIsAssertedAndNotLinked) {
+    ReentrantVolume volume(&bench_);
+    HfsNode* outer = Get(2);
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(2706)});
+    EXPECT_NE(outer, volume.inner);
+    EXPECT_EQ(CachedNode(*bench_.tree, 2), volume.inner);
+    EXPECT_TRUE(LedgerHolds(*bench_.tree, 1));
+    bench_->PutINode(outer, false);
+    EXPECT_TRUE(LedgerHolds(*bench_.tree, 1));
+    EXPECT_EQ(bench_.volume.Lent(), GetParam().Blocks());
+}
+
 INSTANTIATE_GEOMETRIES(CacheTest, FewGeometries);
 
 }  // namespace

@@ -444,6 +444,9 @@ TEST(OpenAlignment, AMisalignedBlockIsAsserted) {
     bench.Load(SmallTree(512));
     EXPECT_EQ(bench->Init(), kOk);
     EXPECT_EQ(bench.capture.Take(), Events{Asserted(2156)});
+    bench->isDirty = true;
+    EXPECT_EQ(bench->Flush(0), kOk);
+    EXPECT_EQ(bench.capture.Take(), Events{Asserted(2186)});
 }
 
 }  // namespace

@@ -1,7 +1,10 @@
 // See capture.h.
 #include "capture.h"
 
+#include <unistd.h>
+
 #include <cstdlib>
+#include <fstream>
 #include <ostream>
 #include <string_view>
 #include <utility>
@@ -14,9 +17,26 @@ namespace {
 
 constexpr std::string_view kAssertionText = "***** velk_assert src/hfs/treehfs, ";
 
+// Where to leave the tally of this process, one file each, when the environment names a directory.
+constexpr char kTallyVariable[] = "TREEHFS_SITES_DIR";
+
+struct Tally {
+    std::set<int> sites;
+
+    ~Tally() {
+        const char* directory = std::getenv(kTallyVariable);
+        if (directory != nullptr) {
+            std::ofstream file(std::string(directory) + "/" + std::to_string(getpid()));
+            for (const int site : sites) {
+                file << site << '\n';
+            }
+        }
+    }
+};
+
 std::set<int>& MutableSites() {
-    static std::set<int> sites;
-    return sites;
+    static Tally tally;
+    return tally.sites;
 }
 
 // The number in an assertion line that is exactly "<text><number>\n", or kAnySite.
