@@ -22,7 +22,6 @@ enum StageIndex : u32 {
 constexpr const char* kTitles[kCheckStages] = {"volume header",  "extents tree",
                                                "catalog tree",   "attributes tree",
                                                "bad-block list", "trees against each other"};
-constexpr u32 kFirstUserId = 16;
 constexpr u8 kCompareBinaryHfsx = kKeyCompareBinary;
 
 // Leaf records of the extents tree: those of special files extend their forks, the others are kept

@@ -76,8 +76,10 @@ bool NodeKeyIsSound(const CBTreeHfs* tree, const BTreeKey* key, u32 keySize) {
     if (keyLength > kMaxKeyLength || keyLength < shape.fixed) {
         return false;
     }
+    // The whole key, not the two bytes of its length field.
+    const u8* bytes = reinterpret_cast<const u8*>(key);
     return shape.nameLength == 0 ||
-           shape.fixed + 2u * GetBe16(key->length + shape.nameLength) <= keyLength;
+           shape.fixed + 2u * GetBe16(bytes + shape.nameLength) <= keyLength;
 }
 
 }  // namespace VELK
