@@ -2,10 +2,13 @@
 add_executable(change_tests
   balance_test.cpp
   churn_test.cpp
+  delete_test.cpp
   flat_tree.cpp
+  insert_refusal_test.cpp
   insert_test.cpp
   record_delete_test.cpp
   record_insert_test.cpp
+  update_test.cpp
 )
 target_link_libraries(change_tests PRIVATE test_support treehfs velk_host GTest::gtest_main)
 add_test(NAME change_tests COMMAND change_tests)
