@@ -64,6 +64,15 @@ struct NodePtr {
     u8* next2;  // always null
 };
 
+// Shortcut from an index node to a cached child: the child, and where its first block lies. Beside
+// the red-black tree of cached nodes, never instead of it.
+struct HfsNode;
+
+struct HfsNodeHint {
+    HfsNode* node;  // null: none
+    const u8* data;
+};
+
 // A cached node. Its bytes are the blocks of `bufs` one after the other; they are not contiguous in
 // memory. Allocated with room for blocksPerNode blocks and one zero entry behind them.
 struct HfsNode {
@@ -71,6 +80,9 @@ struct HfsNode {
     u32 nodeNum;
     list_head modifiedLink;  // linked to itself when no block is dirty
     s32 refCount;            // -1: discarded by Clear
+    u32 hintMask;            // entries of `hints` less one
+    HfsNodeHint* hints;      // of an index node, in the node's own heap block; null: none
+    HfsNodeHint* hintedBy;   // the one hint that leads to this node; null: none
     HfsBcbBuf bufs[1];
 
     // Accessors (node_access.cpp). They change nothing and return 0 or kErrCorrupt, reported with
@@ -108,6 +120,7 @@ struct HfsFindData {
     u32 searchCount = 0;  // raised each time the path is positioned
     bool valid = false;
     HfsFindLevel path[kMaxPathDepth + 1] = {};
+    u64 leadsAsOf = 0;  // the tree's pathVersion when a lookup filled the path; 0: moved since
 
     // Releases every node the path holds; leaves the other fields as they are.
     // REQUIRES: the tree the nodes belong to was neither torn down nor restored meanwhile.
@@ -274,6 +287,7 @@ public:
     u32 reservationUsed = 0;
     bool reservationOpen = false;
     bool isDirty = false;  // header or map changed since the last flush
+    u64 pathVersion = 1;  // raised when records move so that a stored path may no longer lead right
 };
 
 }  // namespace VELK

@@ -118,7 +118,7 @@ struct CheckSink {
 };
 
 enum class CheckVerdict : u8 {
-    kOk,        // looked at; there may be remarks of severity info
+    kSound,     // looked at; there may be remarks of severity info
     kFindings,  // errors or warnings
     kNone,      // the volume has no such tree
     kNotRun,    // not asked for, or in vain because of earlier findings

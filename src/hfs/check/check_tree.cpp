@@ -59,7 +59,7 @@ void CloseStage(CheckRun* run, CheckStage* stage) {
                 : "interrupted";
     } else if (stage->verdict != CheckVerdict::kStopped) {
         stage->verdict =
-            stage->errors + stage->warnings != 0 ? CheckVerdict::kFindings : CheckVerdict::kOk;
+            stage->errors + stage->warnings != 0 ? CheckVerdict::kFindings : CheckVerdict::kSound;
     }
 }
 

@@ -33,16 +33,54 @@ bool HasWholeBlocks(const BTHeaderMem& header) {
     return static_cast<u64>(header.blocksPerNode) << header.blockShift == header.nodeSize;
 }
 
-HfsNode* NewNode(const BTHeaderMem& header, u32 nodeNum) {
-    const std::size_t size = sizeof(HfsNode) + header.blocksPerNode * sizeof(HfsBcbBuf);
-    HfsNode* node = static_cast<HfsNode*>(velk_heap_alloc(size));
-    if (node != nullptr) {
-        std::memset(static_cast<void*>(node), 0, size);
-        node->nodeNum = nodeNum;
-        node->modifiedLink.Init();
-        node->link.MarkUnlinked();
+// Hints an index node has room for: several times the children it is likely to have, so that few
+// of them share a place.
+u32 HintCount(const CBTreeHfs* tree) {
+    return (1u << tree->nodeShift) / static_cast<u32>(sizeof(HfsNodeHint));
+}
+
+HfsNode* NewNode(const CBTreeHfs* tree, u32 nodeNum, bool withHints) {
+    const std::size_t ownSize = sizeof(HfsNode) + tree->header.blocksPerNode * sizeof(HfsBcbBuf);
+    const std::size_t hintSize = withHints ? HintCount(tree) * sizeof(HfsNodeHint) : 0;
+    HfsNode* node = static_cast<HfsNode*>(velk_heap_alloc(ownSize + hintSize));
+    if (node == nullptr) {
+        return nullptr;
+    }
+    std::memset(static_cast<void*>(node), 0, ownSize + hintSize);
+    node->nodeNum = nodeNum;
+    node->modifiedLink.Init();
+    node->link.MarkUnlinked();
+    if (withHints) {
+        node->hints = reinterpret_cast<HfsNodeHint*>(reinterpret_cast<u8*>(node) + ownSize);
+        node->hintMask = HintCount(tree) - 1;
     }
     return node;
+}
+
+void SetHint(HfsNodeHint* hint, HfsNode* child) {
+    if (hint->node != nullptr) {
+        hint->node->hintedBy = nullptr;
+    }
+    if (child->hintedBy != nullptr) {
+        child->hintedBy->node = nullptr;
+    }
+    *hint = {child, child->bufs[0].data};
+    child->hintedBy = hint;
+}
+
+// No hint outlives the node it leads to or the node it belongs to.
+void ForgetHints(HfsNode* node) {
+    if (node->hintedBy != nullptr) {
+        node->hintedBy->node = nullptr;
+    }
+    if (node->hints == nullptr) {
+        return;
+    }
+    for (u32 i = 0; i <= node->hintMask; ++i) {
+        if (node->hints[i].node != nullptr) {
+            node->hints[i].node->hintedBy = nullptr;
+        }
+    }
 }
 
 void FreeNodeMemory(CBTreeHfs* tree, HfsNode* node) {
@@ -138,6 +176,10 @@ void EmptyExisting(CBTreeHfs* tree, HfsNode* node) {
     }
 }
 
+bool WantsEmpty(NodeUse use) {
+    return use == NodeUse::kEmpty || use == NodeUse::kEmptyIndex;
+}
+
 // A node past the initialised part of the file is to be requested empty only.
 void AssertRequest(bool expected) {
     HFS_ASSERT(expected, 2638);
@@ -149,8 +191,10 @@ void LinkOnce(CBTreeHfs* tree, HfsNode* node) {
 }
 
 // Maps a node that is not cached and links it, unreferenced.
-int LoadNode(CBTreeHfs* tree, u32 nodeNum, bool makeEmpty, HfsNode** out) {
-    HfsNode* node = NewNode(tree->header, nodeNum);
+int LoadNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
+    const bool makeEmpty = WantsEmpty(use);
+    HfsNode* node =
+        NewNode(tree, nodeNum, use == NodeUse::kReadIndex || use == NodeUse::kEmptyIndex);
     if (node == nullptr) {
         return kErrNoMemory;
     }
@@ -216,6 +260,7 @@ void DiscardNode(CBTreeHfs* tree, HfsNode* node) {
         node->link.remove(&tree->nodeRoot);
     }
     node->modifiedLink.Unlink();
+    ForgetHints(node);
     FreeNodeMemory(tree, node);
 }
 
@@ -236,31 +281,55 @@ bool HasDirtyBlock(const BTHeaderMem* hdr, const HfsNode* node) {
     return false;
 }
 
-int CBTreeHfs::GetINode(unsigned nodeNum, HfsNode** out, bool makeEmpty) {
+int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
     *out = nullptr;
-    HfsNode* node = FindCached(this, nodeNum);
+    HfsNode* node = FindCached(tree, nodeNum);
     if (node != nullptr) {
-        hitCount += 1;
-        HFS_ASSERT(node->refCount <= 2, 2610);
-        if (makeEmpty) {
-            EmptyExisting(this, node);
+        CountHit(tree, node);
+        if (WantsEmpty(use)) {
+            EmptyExisting(tree, node);
         }
     } else {
-        if (!HasWholeBlocks(header)) {
+        if (!HasWholeBlocks(tree->header)) {
             return Fail(kErrCorrupt, kReasonNode, 2615);
         }
-        if (nodeNum != 0 && nodeNum >= header.totalNodes && !makeEmpty) {
+        if (nodeNum != 0 && nodeNum >= tree->header.totalNodes && !WantsEmpty(use)) {
             AssertRequest(false);
             return kErrCorrupt;
         }
-        const int status = LoadNode(this, nodeNum, makeEmpty, &node);
+        const int status = LoadNode(tree, nodeNum, use, &node);
         if (status != kOk) {
             return status;
         }
     }
-    node->refCount = node->refCount > 0 ? node->refCount + 1 : 1;
+    TakeReference(node);
     *out = node;
     return kOk;
+}
+
+int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNode** out) {
+    HfsNodeHint* hint =
+        parent->hints != nullptr ? &parent->hints[nodeNum & parent->hintMask] : nullptr;
+    if (hint != nullptr && hint->node != nullptr) {
+        // Asked for before the node itself is known to be the right one: both may be cold.
+        __builtin_prefetch(hint->data);
+        __builtin_prefetch(hint->data + tree->header.blockSize - 64);
+        if (hint->node->nodeNum == nodeNum) {
+            CountHit(tree, hint->node);
+            TakeReference(hint->node);
+            *out = hint->node;
+            return kOk;
+        }
+    }
+    const int status = FetchNode(tree, nodeNum, use, out);
+    if (status == kOk && hint != nullptr) {
+        SetHint(hint, *out);
+    }
+    return status;
+}
+
+int CBTreeHfs::GetINode(unsigned nodeNum, HfsNode** out, bool makeEmpty) {
+    return FetchNode(this, nodeNum, makeEmpty ? NodeUse::kEmpty : NodeUse::kRead, out);
 }
 
 void CBTreeHfs::PutINode(HfsNode* node, bool) {

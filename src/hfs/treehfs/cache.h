@@ -2,6 +2,7 @@
 #pragma once
 
 #include "hfs/treehfs.h"
+#include "hfs/treehfs/report.h"
 
 namespace VELK {
 
@@ -13,6 +14,28 @@ inline HfsNode* NodeOfModified(list_head* link) {
     return reinterpret_cast<HfsNode*>(reinterpret_cast<u8*>(link) -
                                       offsetof(HfsNode, modifiedLink));
 }
+
+// Takes one more reference on a cached node that a request met.
+inline void CountHit(CBTreeHfs* tree, HfsNode* node) {
+    tree->hitCount += 1;
+    HFS_ASSERT(node->refCount <= 2, 2610);
+}
+inline void TakeReference(HfsNode* node) {
+    node->refCount = node->refCount > 0 ? node->refCount + 1 : 1;
+}
+
+// What a node is requested for. An index node gets room for hints in its heap block, which has to
+// be known before the node is read.
+enum class NodeUse {
+    kRead,
+    kReadIndex,
+    kEmpty,  // to be built from scratch
+    kEmptyIndex,
+};
+int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out);
+
+// GetINode of a child of `parent`, by its hint when there is one.
+int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNode** out);
 
 // Links `node` into the tree of cached nodes by its number. False: the number is there already.
 bool LinkNode(CBTreeHfs* tree, HfsNode* node);

@@ -180,6 +180,9 @@ int CBTreeHfs::DeleteTree(int level, HfsFindData* path) {
     }
     HfsFindLevel* entry = &path->path[level];
     HfsNode* node = entry->node;
+    if (entry->index == 0) {
+        pathVersion += 1;  // a first key goes: separators or whole nodes follow
+    }
     HFS_TRY(_DeleteRecord(node, entry->index), 4831);
     const bool isRoot = level == header.treeDepth;
     if (NumRecords(node) != 0) {

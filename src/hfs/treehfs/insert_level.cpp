@@ -150,6 +150,7 @@ int CBTreeHfs::InsertLevel(HfsFindData* path, InsertKey* first, const InsertKey*
     }
     HFS_ASSERT(level != 1 || IsLeaf(node), 4631);
 
+    pathVersion += 1;
     LevelChange change;
     const int status = PutRecords(this, path, first, second, node, index, level, &change);
     if (status != 0 || (!change.firstKeyChanged && !change.enterNewNode)) {

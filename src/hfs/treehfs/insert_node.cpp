@@ -1,6 +1,7 @@
 // Puts one record into one node or, when it is full, shares with its left sibling, else splits it
 // into a new right sibling. A full root is split the same way and gets a new root above. What the
 // parent has to learn of it is told, not done: see insert_level.cpp.
+#include "hfs/treehfs/map_walk.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/report.h"
@@ -114,7 +115,7 @@ int SplitRight(CBTreeHfs* tree, const InsertKey& key, HfsNode* node, int index,
         return Fail(kErrCorrupt, kReasonDepth, 9231);  // no path could hold the new root
     }
     NodeRef fresh;
-    HFS_TRY(tree->AllocateNode(fresh.Out()), 4402);
+    HFS_TRY(TakeFreeNode(tree, !IsLeaf(node), fresh.Out()), 4402);
     HFS_ASSERT(fresh->refCount == 1, 4404);
     if (fresh.Get() == node || WasEmptied(&tree->header, fresh.Get(), key.key)) {
         return Fail(kErrCorrupt, kReasonTree, 9232);  // the map calls a node free that is in use
@@ -136,7 +137,7 @@ int SplitRight(CBTreeHfs* tree, const InsertKey& key, HfsNode* node, int index,
 int GrowRoot(CBTreeHfs* tree, HfsNode* node, HfsNode* right, HfsNode** newRoot) {
     BTHeaderMem* hdr = &tree->header;
     NodeRef root;
-    HFS_TRY(tree->AllocateNode(root.Out()), 4474);
+    HFS_TRY(TakeFreeNode(tree, true, root.Out()), 4474);
     HFS_TRY(tree->SetDirty(root.Get(), 0), 9233);
     SetKind(hdr, root.Get(), kBTIndexNode);
     hdr->treeDepth = static_cast<u16>(hdr->treeDepth + 1);

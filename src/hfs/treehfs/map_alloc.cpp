@@ -1,6 +1,7 @@
 // Taking a node from the allocation map and giving it back: one bit, the counter of free nodes, and
 // the header record when the bit lies beside it in node 0. The node itself is fetched empty when
 // taken and left as it is when freed.
+#include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/map_walk.h"
 #include "hfs/treehfs/report.h"
 
@@ -45,33 +46,39 @@ int FindNodeBit(MapWalk* walk, u32 nodeNum) {
 
 // Takes the lowest free node number and hands out its node, empty, in `*node` (null on failure).
 // A failure after the bit was set leaves it set: the volume restores.
-int CBTreeHfs::AllocateNode(HfsNode** node) {
+int TakeFreeNode(CBTreeHfs* tree, bool forIndex, HfsNode** node) {
+    BTHeaderMem* header = &tree->header;
     *node = nullptr;
-    MapWalk walk(this);
+    MapWalk walk(tree);
     u64 nodeNum = 0;
     const int status = FindFreeNode(&walk, &nodeNum);
     if (status != kOk) {
         return status;
     }
-    if (nodeNum >= header.totalNodes) {
+    if (nodeNum >= header->totalNodes) {
         return kErrNoSpace;
     }
     // Node 0 and the root are in use whatever the map says; emptying them would lose the tree.
-    if (nodeNum == 0 || nodeNum == header.rootNode) {
+    if (nodeNum == 0 || nodeNum == header->rootNode) {
         return Fail(kErrCorrupt, kReasonTree, 9403);
     }
-    if (header.freeNodes == 0) {
+    if (header->freeNodes == 0) {
         return Fail(kErrCorrupt, kReasonTree, 9404);
     }
-    HFS_TRY(SetDirty(walk.Node(), walk.PieceOffset()), 3721);
+    HFS_TRY(tree->SetDirty(walk.Node(), walk.PieceOffset()), 3721);
     walk.SetBit(nodeNum);
-    header.freeNodes -= 1;
-    isDirty = true;
+    header->freeNodes -= 1;
+    tree->isDirty = true;
     if (walk.AtHeaderNode()) {
-        HFS_TRY(StoreHeader(this, walk.Node()), 3730);
+        HFS_TRY(StoreHeader(tree, walk.Node()), 3730);
     }
-    HFS_TRY(GetINode(static_cast<u32>(nodeNum), node, true), 3743);
+    const NodeUse use = forIndex ? NodeUse::kEmptyIndex : NodeUse::kEmpty;
+    HFS_TRY(FetchNode(tree, static_cast<u32>(nodeNum), use, node), 3743);
     return kOk;
+}
+
+int CBTreeHfs::AllocateNode(HfsNode** node) {
+    return TakeFreeNode(this, false, node);
 }
 
 // Marks a node free. Its content is neither read nor changed.

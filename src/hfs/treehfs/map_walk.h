@@ -72,6 +72,9 @@ private:
     const u8* bits_ = nullptr;
 };
 
+// AllocateNode, told whether the node is to be an index node.
+int TakeFreeNode(CBTreeHfs* tree, bool forIndex, HfsNode** node);
+
 // Writes the in-memory header into node 0 at once, so that the counters on disk never stay behind
 // a map that lies in the same node. REQUIRES: `node0` is node 0.
 int StoreHeader(CBTreeHfs* tree, HfsNode* node0);

@@ -2,6 +2,7 @@
 #include "hfs/treehfs/bytes.h"
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/node_search.h"
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/path_deliver.h"
 #include "hfs/treehfs/path_level.h"
@@ -38,44 +39,6 @@ int CheckPlace(const HfsNode* node, int level) {
     return kOk;
 }
 
-// What a search in one node came to.
-struct SearchResult {
-    bool found;
-    s32 index;  // the equal record, or the first greater one
-    NodeKey record;
-    const BTreeKey* key;  // of the equal record
-};
-
-int SearchNode(CBTreeHfs* tree, const HfsNode* node, const BTreeKey* key, unsigned keyArg,
-               SearchResult* result) {
-    s32 low = 0;
-    s32 high = static_cast<s32>(NumRecords(node)) - 1;
-    while (low <= high) {
-        const s32 middle = (low + high) >> 1;
-        const int status = FetchKey(tree, node, middle, &result->record, &result->key);
-        if (HFS_UNLIKELY(status != kOk)) {
-            if (status != kErrNoMemory) {
-                Report(status, 3005);
-            }
-            return status;
-        }
-        const int order = tree->compareKeys(key, keyArg, result->key);
-        if (order == 0) {
-            result->found = true;
-            result->index = middle;
-            return kOk;
-        }
-        if (order < 0) {
-            high = middle - 1;
-        } else {
-            low = middle + 1;
-        }
-    }
-    result->found = false;
-    result->index = low;
-    return kOk;
-}
-
 void DeliverFoundKey(const CBTreeHfs* tree, const SearchResult& found, void* keyOut,
                      unsigned* keyOutSize) {
     const u32 size = found.record.keySize;
@@ -96,6 +59,57 @@ int DeliverFoundRecord(CBTreeHfs* tree, const HfsNode* node, const SearchResult&
         *recordSize = size;
     }
     return status;
+}
+
+// Goes from the root to a leaf and searches each node on the way. `*found` tells of the node
+// searched last.
+int Descend(CBTreeHfs* tree, const SearchKey& key, HfsFindData* path, bool* found,
+            SearchResult* result) {
+    u32 nodeNum = tree->header.rootNode;
+    int level = tree->header.treeDepth;
+    HfsNode* parent = nullptr;
+    for (;;) {
+        if (HFS_UNLIKELY(nodeNum == 0)) {
+            return BadTree(2980);
+        }
+        int status = CheckLevel(level);
+        if (status == kOk) {
+            status = LoadLevel(tree, level, nodeNum, parent, path);
+        }
+        HFS_TRY(status, 2982);
+        HfsFindLevel* entry = &path->path[level];
+        status = SearchNode(tree, entry->node, key, result);
+        if (HFS_UNLIKELY(status != kOk)) {
+            return status;
+        }
+        *found = result->found;
+        entry->index = result->index;
+        if (IsLeaf(entry->node)) {
+            return kOk;
+        }
+        if (!result->found && result->index > 0) {
+            entry->index = result->index - 1;
+        }
+        HFS_TRY(ChildOf(tree, entry->node, entry->index, &nodeNum), 3095);
+        parent = entry->node;
+        level -= 1;
+    }
+}
+
+// Lookups often come in key order. When the tree's own path still leads where it did, and the key
+// lies between the first and the last key of its leaf, or past the last one of the last leaf, the
+// way down is the one the path holds. Counters move as they would on the way down.
+bool FindOnSameLeaf(CBTreeHfs* tree, const SearchKey& key, SearchResult* result) {
+    HfsFindData* path = &tree->findData;
+    const HfsNode* leaf = path->path[1].node;
+    if (path->leadsAsOf != tree->pathVersion || leaf == nullptr ||
+        !SearchInside(tree, leaf, key, result)) {
+        return false;
+    }
+    path->searchCount += 1;
+    path->valid = true;
+    tree->hitCount += tree->header.treeDepth;
+    return true;
 }
 
 }  // namespace
@@ -121,13 +135,16 @@ int CheckLevel(int level) {
     return kOk;
 }
 
-int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, HfsFindData* path) {
+int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, HfsNode* parent, HfsFindData* path) {
     HfsFindLevel* entry = &path->path[level];
     entry->index = 0;
     ReleaseNode(entry->node);
     entry->node = nullptr;
     const u32 readBefore = tree->readCount;
-    HFS_TRY(tree->GetINode(nodeNum, &entry->node, false), 2909);
+    const NodeUse use = level > 1 ? NodeUse::kReadIndex : NodeUse::kRead;
+    HFS_TRY(parent != nullptr ? FetchChild(tree, parent, nodeNum, use, &entry->node)
+                              : FetchNode(tree, nodeNum, use, &entry->node),
+            2909);
     const int status = CheckPlace(entry->node, level);
     if (HFS_UNLIKELY(status != kOk && nodeNum >= tree->validNodes &&
                      tree->readCount != readBefore)) {
@@ -148,8 +165,9 @@ bool StandsOnLeaf(const HfsFindData* path, u32 slack) {
 
 int CBTreeHfs::ReadLevel(int level, unsigned nodeNum, HfsFindData* fd) {
     HfsFindData* path = fd != nullptr ? fd : &findData;
+    path->leadsAsOf = 0;
     const int status = CheckLevel(level);
-    return status != kOk ? status : LoadLevel(this, level, nodeNum, path);
+    return status != kOk ? status : LoadLevel(this, level, nodeNum, nullptr, path);
 }
 
 int CBTreeHfs::FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, bool* found,
@@ -160,48 +178,34 @@ int CBTreeHfs::FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, 
     if (header.treeDepth == 0) {
         return kOk;
     }
-    path->ClearPath();
-    path->searchCount += 1;
-    path->valid = true;
-
-    u32 nodeNum = header.rootNode;
-    int level = header.treeDepth;
+    const SearchKey searchKey(this, key, keyArg);
     SearchResult result;
-    for (;;) {
-        if (HFS_UNLIKELY(nodeNum == 0)) {
-            return BadTree(2980);
-        }
-        int status = CheckLevel(level);
-        if (status == kOk) {
-            status = LoadLevel(this, level, nodeNum, path);
-        }
-        HFS_TRY(status, 2982);
-        HfsFindLevel* entry = &path->path[level];
-        status = SearchNode(this, entry->node, key, keyArg, &result);
+    if (path == &findData && FindOnSameLeaf(this, searchKey, &result)) {
+        *found = result.found;
+    } else {
+        path->leadsAsOf = 0;
+        path->ClearPath();
+        path->searchCount += 1;
+        path->valid = true;
+        const int status = Descend(this, searchKey, path, found, &result);
         if (HFS_UNLIKELY(status != kOk)) {
             return status;
         }
-        *found = result.found;
-        entry->index = result.index;
-        if (IsLeaf(entry->node)) {
-            break;
-        }
-        if (!result.found && result.index > 0) {
-            entry->index = result.index - 1;
-        }
-        HFS_TRY(entry->node->GetChildNodeNum(&header, entry->index, &nodeNum), 3095);
-        level -= 1;
+        path->leadsAsOf = pathVersion;
     }
-    path->level = static_cast<u32>(level);
-    if (!result.found) {
+    path->level = 1;
+    path->path[1].index = result.index;
+    if (!result.found || (record == nullptr && keyOut == nullptr)) {
         return kOk;
+    }
+    const HfsNode* leaf = path->path[1].node;
+    if (!result.isLocated) {
+        HFS_TRY(leaf->GetKey(&header, result.index, &result.record), 9031);
     }
     if (keyOut != nullptr) {
         DeliverFoundKey(this, result, keyOut, keyOutSize);
     }
-    return record == nullptr
-               ? kOk
-               : DeliverFoundRecord(this, path->path[level].node, result, record, recordSize);
+    return record == nullptr ? kOk : DeliverFoundRecord(this, leaf, result, record, recordSize);
 }
 
 int CBTreeHfs::FindRecord(const void* key, unsigned keyArg, void* record, unsigned recordCapacity,

@@ -29,7 +29,8 @@ void LeaveLeaf(CBTreeHfs* tree, HfsFindData* path) {
 // Steps from the current leaf to node `sibling`; the index becomes 0.
 int EnterLeaf(CBTreeHfs* tree, u32 sibling, HfsFindData* path) {
     LeaveLeaf(tree, path);
-    return LoadLevel(tree, 1, sibling, path);
+    path->leadsAsOf = 0;
+    return LoadLevel(tree, 1, sibling, nullptr, path);
 }
 
 // A chain of leaves cannot be longer than the tree has nodes: a longer one is a ring.
@@ -186,7 +187,8 @@ int CBTreeHfs::SetPos(const unsigned long long& pos, void* record, unsigned reco
     path->searchCount += 1;
     path->valid = false;
     path->level = 1;
-    HFS_TRY(LoadLevel(this, 1, nodeNum, path), 3197);
+    path->leadsAsOf = 0;
+    HFS_TRY(LoadLevel(this, 1, nodeNum, nullptr, path), 3197);
     path->valid = true;
     const int index = static_cast<int>(pos & ((1u << nodeShift) - 1));
     HFS_TRY(IncPos(index, record, recordCapacity, recordSize, keyOut, keyCapacity, keySize, path),

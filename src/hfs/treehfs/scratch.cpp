@@ -8,14 +8,6 @@
 
 namespace VELK {
 
-namespace {
-
-// Fixed part of the keys this comparator reads, and where their name length stands (0: no name).
-struct KeyShape {
-    u32 fixed;
-    u32 nameLength;
-};
-
 bool ShapeOf(CompareKeysFn compare, KeyShape* shape) {
     if (compare == CompareCatKeysCaseIns || compare == CompareCatKeysCaseBin) {
         *shape = {kCatKeyFixed, kCatKeyNameLength};
@@ -28,8 +20,6 @@ bool ShapeOf(CompareKeysFn compare, KeyShape* shape) {
     }
     return true;
 }
-
-}  // namespace
 
 int EnsureScratch(CBTreeHfs* tree) {
     if (tree->scratch == nullptr) {

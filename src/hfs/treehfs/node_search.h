@@ -1,0 +1,53 @@
+// Binary search for a key inside one node.
+#pragma once
+
+#include "hfs/treehfs.h"
+
+namespace VELK {
+
+// A search key with what the search needs to know of its tree, worked out once per lookup.
+class SearchKey {
+public:
+    SearchKey(const CBTreeHfs* tree, const BTreeKey* key, unsigned id);
+
+    // Order of the search key against a key of a node, as the tree's comparator has it.
+    // REQUIRES: the node key is sound (see scratch.h).
+    int Compare(const BTreeKey* nodeKey) const;
+
+    // Fewest bytes of a sound node key, and where its name length stands (0: it has no name).
+    u32 Fixed() const { return fixed_; }
+    u32 NameLengthAt() const { return nameLengthAt_; }
+
+private:
+    int CompareFirstUnits(const u8* nodeKey) const;
+
+    const BTreeKey* key_;
+    CompareKeysFn compare_;
+    unsigned id_;
+    u32 fixed_ = 0;
+    u32 nameLengthAt_ = 0;
+    u16 firstUnit_ = 0;  // folded; 0: the comparator has to decide
+    bool byParentFirst_ = false;
+};
+
+// What a search in one node came to.
+struct SearchResult {
+    bool found;
+    bool isLocated;       // `record` describes the equal record
+    s32 index;            // the equal record, or the first greater one
+    const BTreeKey* key;  // of the equal record, in one piece
+    NodeKey record;
+};
+
+// Reports a key that cannot be read at 3005, kErrNoMemory nowhere.
+int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result);
+
+// The same for a key known to lie between the first and the last key of `leaf`, or behind the last
+// key of the tree's last leaf. False, nothing reported: it does not, or the node is not so plain
+// that this can be told at once.
+bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, SearchResult* result);
+
+// GetChildNodeNum without the way round for plain records.
+int ChildOf(const CBTreeHfs* tree, const HfsNode* node, s32 index, u32* child);
+
+}  // namespace VELK
