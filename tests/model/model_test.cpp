@@ -1,0 +1,89 @@
+// Millions of random calls of all public operations against the model, in every geometry and tree
+// kind. TREEHFS_SEED repeats a run, TREEHFS_MODEL_CALLS sets how many calls there are in all.
+#include <gtest/gtest.h>
+
+#include <cstdlib>
+
+#include "runner.h"
+
+namespace VELK::test {
+
+namespace {
+
+constexpr u32 kDefaultCalls = 300000;
+
+u64 NumberFromEnvironment(const char* name, u64 otherwise) {
+    const char* text = std::getenv(name);
+    return text != nullptr ? std::strtoull(text, nullptr, 0) : otherwise;
+}
+
+std::vector<RunSetup> Setups() {
+    std::vector<RunSetup> setups;
+    for (const Geometry& geometry : AllGeometries()) {
+        if (geometry.nodeSize <= 8192 || geometry.mapBlock >= 4096) {
+            for (const u32 fileId : {kExtentsFileId, kCatalogFileId, kAttributesFileId}) {
+                setups.push_back({fileId, geometry});
+            }
+        }
+    }
+    return setups;
+}
+
+std::optional<std::string> RunOnce(const RunSetup& setup,
+                                   const std::vector<Operation>& operations) {
+    return Runner(setup).Run(operations);
+}
+
+// Takes stretches of operations out as long as the run still fails.
+std::vector<Operation> Shrink(const RunSetup& setup, std::vector<Operation> operations) {
+    for (std::size_t stretch = operations.size() / 2; stretch > 0; stretch /= 2) {
+        for (std::size_t from = 0; from + stretch <= operations.size();) {
+            std::vector<Operation> fewer = operations;
+            fewer.erase(fewer.begin() + static_cast<std::ptrdiff_t>(from),
+                        fewer.begin() + static_cast<std::ptrdiff_t>(from + stretch));
+            if (RunOnce(setup, fewer)) {
+                operations = std::move(fewer);
+            } else {
+                from += stretch;
+            }
+        }
+    }
+    return operations;
+}
+
+class ModelTest : public ::testing::TestWithParam<RunSetup> {};
+
+void RunAndShrink(const RunSetup& setup, u64 seed, bool withFaults) {
+    const u64 calls = NumberFromEnvironment("TREEHFS_MODEL_CALLS", kDefaultCalls);
+    const u32 share = static_cast<u32>(calls / (2 * Setups().size()) + 1);
+    const std::vector<Operation> operations = MakeOperations(seed, share, withFaults);
+    const auto failure = RunOnce(setup, operations);
+    if (!failure) {
+        return;
+    }
+    std::string few;
+    for (const Operation& operation : Shrink(setup, operations)) {
+        few += "  " + Text(operation) + "\n";
+    }
+    ADD_FAILURE() << "TREEHFS_SEED=" << seed << ": " << *failure << "\nfewest operations:\n" << few;
+}
+
+}  // namespace
+
+TEST_P(ModelTest, TreeAndModelAgree) {
+    RunAndShrink(GetParam(), NumberFromEnvironment("TREEHFS_SEED", 20261121), false);
+}
+
+TEST_P(ModelTest, TreeAndModelAgreeWhenServicesFail) {
+    RunAndShrink(GetParam(), NumberFromEnvironment("TREEHFS_SEED", 20261122), true);
+}
+
+INSTANTIATE_TEST_SUITE_P(Setups, ModelTest, ::testing::ValuesIn(Setups()), [](const auto& param) {
+    return std::string(param.param.fileId == kExtentsFileId   ? "Extents"
+                       : param.param.fileId == kCatalogFileId ? "Catalog"
+                                                              : "Attributes") +
+           std::to_string(param.param.geometry.nodeSize) + "by" +
+           std::to_string(param.param.geometry.mapBlock);
+});
+
+}  // namespace VELK::test
