@@ -1,6 +1,7 @@
 # Changes to trees: insertion, sharing, splits, update, deletion.
 add_executable(change_tests
   balance_test.cpp
+  change_fault_test.cpp
   churn_test.cpp
   delete_test.cpp
   flat_tree.cpp
