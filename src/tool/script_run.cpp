@@ -165,9 +165,13 @@ ScriptRunner::Outcome ScriptRunner::Execute(ScriptOp op, const std::string_view*
         default:
             break;
     }
-    if (Tree() == nullptr) {
-        return {kErrInvalid, " absent=yes"};
-    }
+    return Tree() == nullptr ? Outcome{kErrInvalid, " absent=yes"}
+                             : ExecuteOnTree(op, words, count);
+}
+
+// REQUIRES: the tree in use is there and open.
+ScriptRunner::Outcome ScriptRunner::ExecuteOnTree(ScriptOp op, const std::string_view* words,
+                                                  u32 count) {
     switch (op) {
         case ScriptOp::kInsert:
             return Insert(words);

@@ -59,6 +59,7 @@ private:
     // script_run.cpp
     bool RunLine(const Script& script, const ScriptLine& line);
     Outcome Execute(ScriptOp op, const std::string_view* words, u32 count);
+    Outcome ExecuteOnTree(ScriptOp op, const std::string_view* words, u32 count);
     bool Control(ScriptOp op, const std::string_view* words, u32 count);
     void Expect(const ScriptLine& line, const std::string_view* words, u32 count);
     void Print(const ScriptLine& line, const std::string& file, int status, const char* name,
