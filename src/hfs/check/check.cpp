@@ -22,7 +22,6 @@ enum StageIndex : u32 {
 constexpr const char* kTitles[kCheckStages] = {"volume header",  "extents tree",
                                                "catalog tree",   "attributes tree",
                                                "bad-block list", "trees against each other"};
-constexpr u8 kCompareBinaryHfsx = kKeyCompareBinary;
 
 // Leaf records of the extents tree: those of special files extend their forks, the others are kept
 // for later.
@@ -79,7 +78,7 @@ CheckNameOrder NameOrderOf(const CheckVolumeState& state, const CheckFile& file)
     u8 compare = 0;
     const bool isBinary = state.header.IsHfsx() &&
                           file.Read(kHeadKeyCompareType, &compare, 1) == 0 &&
-                          compare == kCompareBinaryHfsx;
+                          compare == kKeyCompareBinary;
     return isBinary ? CheckNameOrder::kBinary : CheckNameOrder::kFolding;
 }
 
@@ -154,9 +153,8 @@ void RunTreeStages(CheckVolumeState* state) {
     if (run->IsStopped()) {
         return;
     }
-    run->UseStage(kStageHeader);
+    CheckStage* header = run->UseStage(kStageHeader);
     CheckSpecialForks(state);
-    CheckStage* header = run->StageAt(kStageHeader);
     CloseStage(run, header);
     if (IsTreeWanted(*run, kCatalogFileId) && !run->IsStopped()) {
         run->UseStage(kStageCatalog);
@@ -197,7 +195,7 @@ void RunCross(CheckVolumeState* state) {
     const CheckTree* trees[] = {state->extents.get(), state->catalog.get(),
                                 state->attributes.get()};
     for (const CheckTree* tree : trees) {
-        if (tree != nullptr && !tree->isWhole) {
+        if (tree != nullptr && (!tree->isWhole || tree->hasLostRecords)) {
             stage->why = "a tree is damaged";
             return;
         }
@@ -261,14 +259,17 @@ CheckSummary CheckVolume(const CheckSource& source, const CheckOptions& options,
     NameStages(run.Summary());
     CheckVolumeState state(&run);
     CheckStage* header = run.UseStage(kStageHeader);
-    if (!CheckVolumeHeaders(&state)) {
-        CloseStage(&run, header);
+    const bool goesOn = CheckVolumeHeaders(&state);
+    CloseStage(&run, header);
+    if (!goesOn) {
         for (u32 i = kStageExtents; i < kCheckStages; ++i) {
             run.StageAt(i)->why = "the volume header is damaged";
         }
         return *run.Summary();
     }
-    RunTreeStages(&state);
+    if (!run.IsStopped()) {
+        RunTreeStages(&state);
+    }
     RunBadBlocks(&state);
     RunCross(&state);
     return *run.Summary();

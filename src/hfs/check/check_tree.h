@@ -88,9 +88,10 @@ struct CheckTree {
     std::vector<u32> mapNodes;  // in the order of their chain
     u64 mapBits = 0;            // bits the chain holds
     bool isMapWhole = false;
-    u64 leafRecords = 0;    // counted
-    bool isWhole = true;    // every node that should be there was visited
-    bool isUsable = false;  // header and root allow walks
+    u64 leafRecords = 0;          // counted
+    bool isWhole = true;          // every node that should be there was visited
+    bool hasLostRecords = false;  // leaf records nobody can make use of
+    bool isUsable = false;        // header and root allow walks
     std::vector<u32> leaves;
 
     u32 FileId() const { return kind.fileId; }

@@ -156,12 +156,17 @@ void Walk::CheckData(const CheckNode& node, u32 index, u32 level, bool isTaken,
         return;
     }
     if (!isTaken) {
+        tree_.hasLostRecords = true;
         return;
     }
-    if (!tree_.anyData) {
-        CheckLeafData(tree_, node, index, record);
+    if (tree_.anyData) {
+        return;
     }
-    if (tree_.visitor.record != nullptr && IsDataUsable(tree_, record)) {
+    CheckLeafData(tree_, node, index, record);
+    if (!IsDataUsable(tree_, record)) {
+        // Attributes of unknown types are nobody's loss.
+        tree_.hasLostRecords = tree_.hasLostRecords || tree_.FileId() != kAttributesFileId;
+    } else if (tree_.visitor.record != nullptr) {
         tree_.visitor.record(tree_.visitor.self, tree_, node, index, record);
     }
 }
