@@ -45,7 +45,7 @@ u32 TreeIdFromText(const std::string& text) {
 }
 
 Invocation::Invocation(const Command& theCommand, std::vector<std::string> arguments)
-    : command(theCommand), options(theCommand, std::move(arguments)) {}
+    : command(theCommand), words(arguments), options(theCommand, std::move(arguments)) {}
 
 void Invocation::DeclareImage() {
     options.Argument("IMAGE", &image, "disk image, partition or device with the volume");

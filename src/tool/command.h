@@ -53,6 +53,7 @@ public:
     void Parse();
 
     const Command& command;
+    const std::vector<std::string> words;  // the command line behind the command's name
     OptionSet options;
     Output out;
 

@@ -12,28 +12,6 @@ namespace VELK::tool {
 
 namespace {
 
-// Puts the pieces of a range of a node together: `first` bytes at `piece0`, a block at `piece1`,
-// the rest at `piece2`. False: it needs more pieces than there are.
-bool Gather(u8* target, u32 size, const u8* piece0, u32 first, const u8* piece1, const u8* piece2,
-            u32 blockSize) {
-    const u32 head = size < first ? size : first;
-    std::memcpy(target, piece0, head);
-    const u32 rest = size - head;
-    const u32 middle = rest < blockSize ? rest : blockSize;
-    const u32 tail = rest - middle;
-    if (tail > blockSize || (middle != 0 && piece1 == nullptr) ||
-        (tail != 0 && piece2 == nullptr)) {
-        return false;
-    }
-    if (middle != 0) {
-        std::memcpy(target + head, piece1, middle);
-    }
-    if (tail != 0) {
-        std::memcpy(target + head + middle, piece2, tail);
-    }
-    return true;
-}
-
 const u8* NodeStart(const HfsNode* node) {
     return node->bufs[0].data;
 }
@@ -41,9 +19,11 @@ const u8* NodeStart(const HfsNode* node) {
 }  // namespace
 
 LeafCursor::LeafCursor(Session* session, u32 fileId, bool keepGoing)
-    : session_(session), tree_(session->Tree(fileId)), fileId_(fileId), keepGoing_(keepGoing) {
-    keyBytes_.resize(tree_->header.nodeSize);
-    dataBytes_.resize(tree_->header.nodeSize);
+    : session_(session),
+      tree_(session->Tree(fileId)),
+      fileId_(fileId),
+      keepGoing_(keepGoing),
+      reader_(tree_) {
     record_.resize(std::size_t{tree_->header.nodeSize} + tree_->convert.minDataBuffer);
 }
 
@@ -204,39 +184,6 @@ bool LeafCursor::EnterNextLeaf() {
     return true;
 }
 
-int LeafCursor::Describe(LeafRecord* record) {
-    const HfsNode* node = path_.path[1].node;
-    NodeKey at;
-    const int status = node->GetKey(&tree_->header, static_cast<int>(index_), &at);
-    if (status != 0) {
-        return status;
-    }
-    const u32 blockSize = tree_->header.blockSize;
-    record->key = at.ptr;
-    record->keySize = at.keySize;
-    if (at.keySize > at.firstBytes) {
-        if (at.keySize > keyBytes_.size() ||
-            !Gather(keyBytes_.data(), at.keySize, at.ptr, at.firstBytes, at.next1, at.next2,
-                    blockSize)) {
-            return kErrCorrupt;
-        }
-        record->key = keyBytes_.data();
-    }
-    record->data = at.data;
-    record->dataSize = at.dataSize;
-    if (at.dataSize > at.dataFirstBytes) {
-        if (at.dataSize > dataBytes_.size() ||
-            !Gather(dataBytes_.data(), at.dataSize, at.data, at.dataFirstBytes, at.dataNext1,
-                    at.dataNext2, blockSize)) {
-            return kErrCorrupt;
-        }
-        record->data = dataBytes_.data();
-    }
-    record->node = node->nodeNum;
-    record->index = index_;
-    return 0;
-}
-
 // Takes the record's key as the last one if it is sound and greater than that.
 LeafCursor::KeyState LeafCursor::TakeKey(const LeafRecord& record) {
     SearchKey& key = keys_[1 - last_];
@@ -259,7 +206,7 @@ bool LeafCursor::Next(LeafRecord* record) {
             continue;
         }
         const u32 node = path_.path[1].node->nodeNum;
-        const int status = Describe(record);
+        const int status = reader_.Describe(path_.path[1].node, index_, record);
         const KeyState state = status == 0 ? TakeKey(*record) : KeyState::kUnsound;
         index_ += 1;
         if (status == 0 && state == KeyState::kSound) {

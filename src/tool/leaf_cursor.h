@@ -9,19 +9,12 @@
 #include <vector>
 
 #include "tool/key_text.h"
+#include "tool/node_reader.h"
 #include "tool/session.h"
 
 namespace VELK::tool {
 
-// A record as it lies in its leaf; valid until the next step.
-struct LeafRecord {
-    const u8* key = nullptr;  // length field first
-    u32 keySize = 0;          // length field included
-    const u8* data = nullptr;
-    u32 dataSize = 0;
-    u32 node = 0;
-    u32 index = 0;
-};
+using LeafRecord = NodeRecord;
 
 class LeafCursor {
 public:
@@ -49,7 +42,6 @@ private:
     u32 DamagedChild() const;
     u32 SiblingInIndex(u32 damaged);
     bool PassOver(u32 damaged);
-    int Describe(LeafRecord* record);
     KeyState TakeKey(const LeafRecord& record);
     void Damaged(u32 node, int status, const std::string& detail);
     SearchKey& Last() { return keys_[last_]; }
@@ -65,9 +57,8 @@ private:
     u32 index_ = 0;  // next one to deliver
     u64 leaves_ = 0;
     HfsFindData path_;
-    SearchKey keys_[2];         // the last one, and the next one while it is compared
-    std::vector<u8> keyBytes_;  // pieces put together
-    std::vector<u8> dataBytes_;
+    SearchKey keys_[2];  // the last one, and the next one while it is compared
+    RecordReader reader_;
     std::vector<u8> record_;  // iteration delivers a record whenever it enters a leaf
 };
 

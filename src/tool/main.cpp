@@ -13,14 +13,22 @@ namespace VELK::tool {
 
 // One row per command, one file per command, in the order of the help text.
 // clang-format off
+extern const Command kInfoCommand;
+extern const Command kCheckCommand;
 extern const Command kLsCommand;
+extern const Command kStatsCommand;
+extern const Command kBadBlocksCommand;
 extern const Command kApplyCommand;
 extern const Command kCompletionCommand;
 extern const Command kHelpCommand;
 extern const Command kVersionCommand;
 
 const Command* const kCommands[] = {
+    &kInfoCommand,
+    &kCheckCommand,
     &kLsCommand,
+    &kStatsCommand,
+    &kBadBlocksCommand,
     &kApplyCommand,
     &kCompletionCommand,
     &kHelpCommand,

@@ -27,7 +27,13 @@ public:
             Look();
         }
     }
+    // The same for callers that call seldom.
+    void Show(u64 done) {
+        done_ = done;
+        Look();
+    }
     void Restart(std::string what, u64 total);
+    void Erase();
     // Looks at the clock at once.
     void Look();
 
@@ -36,7 +42,6 @@ private:
     using Clock = std::chrono::steady_clock;
 
     void Draw(double seconds);
-    void Erase();
 
     std::string what_;
     std::string unit_;

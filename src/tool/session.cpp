@@ -1,8 +1,11 @@
 // Opening the image of a command.
 #include "tool/session.h"
 
+#include <fcntl.h>
 #include <fmt/format.h>
+#include <unistd.h>
 
+#include <algorithm>
 #include <cstdio>
 
 #include "tool/engine_trace.h"
@@ -71,6 +74,19 @@ CBTreeHfs* Session::Tree(u32 fileId) {
         ThrowProblem(image_, problem);
     }
     return tree;
+}
+
+u64 Session::ReadableBytes() const {
+    u64 imageBytes = 0;
+    const int fd = open(image_.c_str(), O_RDONLY | O_CLOEXEC);
+    if (fd >= 0) {
+        const off_t end = lseek(fd, 0, SEEK_END);  // a device has no size in its status
+        imageBytes = end > 0 ? static_cast<u64>(end) : 0;
+        close(fd);
+    }
+    const u64 start = volume_->Place().offset;
+    const u64 behind = imageBytes > start ? imageBytes - start : 0;
+    return volume_->Place().size != 0 ? std::min(behind, volume_->Place().size) : behind;
 }
 
 std::string Session::OffsetText(u32 fileId, u64 forkOffset) {

@@ -32,6 +32,9 @@ public:
     // The same, with null instead of a throw.
     CBTreeHfs* TryTree(u32 fileId, Problem* problem) { return volume_->Tree(fileId, problem); }
 
+    // Bytes from the volume's start to its end, or to the image's if that comes first.
+    u64 ReadableBytes() const;
+
     // What a failed operation on a node means: "catalog node 14: corrupt (A000011C): ...".
     Problem ProblemOf(u32 fileId, u32 node, int status, const std::string& detail);
     // "image offset 0x2380e" of a byte of a node; empty when it lies nowhere.
