@@ -45,7 +45,7 @@ TEST(CheckTreeSound, VisitsEveryNodeOnceAndCountsRecords) {
     const Outcome outcome = CheckImage(tree);
     EXPECT_EQ(outcome.summary.nodes, tree.totalNodes - tree.freeNodes);
     EXPECT_EQ(outcome.summary.stages[0].records, tree.leafRecords);
-    EXPECT_EQ(outcome.summary.stages[0].verdict, CheckVerdict::kOk);
+    EXPECT_EQ(outcome.summary.stages[0].verdict, CheckVerdict::kSound);
 }
 
 TEST(CheckTreeSound, EmptyTreeOfAnyDataIsCleanWithoutLookingAtIt) {

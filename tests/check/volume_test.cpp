@@ -71,9 +71,9 @@ TEST(CheckVolumeSound, StagesHaveTheirTitlesAndVerdicts) {
     ASSERT_EQ(outcome.summary.stageCount, 6u);
     EXPECT_STREQ(stages[0].title, "volume header");
     EXPECT_STREQ(stages[2].title, "catalog tree");
-    EXPECT_EQ(stages[2].verdict, CheckVerdict::kOk);
+    EXPECT_EQ(stages[2].verdict, CheckVerdict::kSound);
     EXPECT_EQ(stages[2].records, 8u);
-    EXPECT_EQ(stages[4].verdict, CheckVerdict::kOk);
+    EXPECT_EQ(stages[4].verdict, CheckVerdict::kSound);
     EXPECT_EQ(stages[5].verdict, CheckVerdict::kNotRun);
     EXPECT_STREQ(stages[5].why, "needs --full");
 }
@@ -183,7 +183,7 @@ TEST(CheckVolumeHeader, V08UncleanAndJournalNotEmpty) {
     EXPECT_EQ(outcome.findings[1].text,
               "the journal holds transactions (1536 bytes) that are not in their places yet");
     EXPECT_EQ(outcome.summary.errors + outcome.summary.warnings, 0u);
-    EXPECT_EQ(outcome.summary.stages[0].verdict, CheckVerdict::kOk);
+    EXPECT_EQ(outcome.summary.stages[0].verdict, CheckVerdict::kSound);
     volume.Patch32(journal + 20, 512);
     EXPECT_EQ(CheckBytes(volume.bytes).findings.size(), 1u);
     volume.Patch32(journal, 0);
