@@ -313,6 +313,15 @@ TEST_P(CacheTest, EmptyingADirtyNodeAsksTheJournalNoMore) {
     EXPECT_EQ(bench_.volume.Count(Call::kWriteAccess), asked);
 }
 
+TEST_P(CacheTest, EmptyingANodeAllDirtyLeavesItsPlaceInTheList) {
+    HfsNode* node = Get(1, true);
+    bench_->SetDirty(node, 0, NodeSize());
+    Get(2, true);
+    node->bufs[0].data[20] = 9;
+    Get(1, true);
+    EXPECT_EQ(ModifiedNodes(*bench_.tree), (std::vector<u32>{1, 2}));
+}
+
 TEST_P(CacheTest, EmptyingANodeThatWasNeverWrittenIsTraced) {
     MakeNew(5);
     HfsNode* node = Get(5, true);
