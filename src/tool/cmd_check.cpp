@@ -179,7 +179,7 @@ int ReadVolumeBytes(void* self, u64 offset, void* target, std::size_t size) {
 std::string VerdictText(const CheckStage& stage, bool color) {
     std::string text;
     switch (stage.verdict) {
-        case CheckVerdict::kOk:
+        case CheckVerdict::kSound:
             return "ok";
         case CheckVerdict::kNone:
             return "none";
@@ -223,6 +223,10 @@ void PrintStages(const Run& run, const CheckSummary& summary) {
         const CheckStage& stage = summary.stages[i];
         std::string title = fmt::format("{}/{} {} ", i + 1, summary.stageCount, stage.title);
         title.resize(std::max(title.size(), kTitleWidth), '.');
+        std::string verdict = VerdictText(stage, call->color);
+        if (StageIsUnread(run, stage)) {
+            verdict = (verdict == "ok" ? "" : verdict + ", ") + "not all could be read";
+        }
         std::string line = title + " " + fmt::format("{:<{}}", verdict, kVerdictWidth);
         if (stage.nodes != 0) {
             line += "   " + Counted(stage.nodes, "node", "nodes");
@@ -230,7 +234,7 @@ void PrintStages(const Run& run, const CheckSummary& summary) {
                 line += ", " + Counted(stage.records, "record", "records");
             }
         } else if (std::string(stage.title).find("bad-block") != std::string::npos &&
-                   stage.verdict == CheckVerdict::kOk) {
+                   stage.verdict == CheckVerdict::kSound) {
             line += "   " + Counted(stage.runs, "run", "runs");
         }
         line.erase(line.find_last_not_of(' ') + 1);
