@@ -178,7 +178,9 @@ void CheckDescents(CheckTree* tree) {
     }
     CheckNodeWindow window(tree->file, tree->nodeSize);
     Lookups lookups(tree);
+    u64 done = 0;
     for (u32 nodeNum : tree->leaves) {
+        tree->run->Step("lookups", ++done, tree->leaves.size());
         int status = 0;
         CheckNode node;
         node.bytes = window.Get(nodeNum, &status);

@@ -55,7 +55,10 @@ int CheckFile::Read(u64 offset, void* target, u64 size) const {
 
 u64 CheckFile::SourceOffset(u64 offset) const {
     const Run* run = RunAt(offset);
-    return run == nullptr ? kCheckNoOffset : run->sourceOffset + (offset - run->fileOffset);
+    if (run == nullptr || run->sourceOffset >= kCheckNowhere) {
+        return kCheckNoOffset;
+    }
+    return run->sourceOffset + (offset - run->fileOffset);
 }
 
 CheckNodeWindow::CheckNodeWindow(const CheckFile* file, u32 nodeSize)

@@ -8,6 +8,9 @@
 
 namespace VELK {
 
+// A place no source has, for runs that lie outside the volume.
+constexpr u64 kCheckNowhere = u64{1} << 62;
+
 // Blocks of the volume that belong together.
 struct CheckExtent {
     u32 start = 0;

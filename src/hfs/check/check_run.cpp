@@ -10,7 +10,7 @@
 namespace VELK {
 namespace {
 
-constexpr u32 kNodesBetweenProgress = 256;
+constexpr u32 kStepsBetweenProgress = 256;
 
 // An invariant that is asked for by name is looked at, however shallow the run.
 CheckScope ScopeOf(const CheckOptions& options) {
@@ -199,8 +199,12 @@ void CheckRun::Unreadable(const CheckPlace& place, u64 size, int status) {
 void CheckRun::CountNode(const char* stage, u64 total) {
     ++summary_.nodes;
     ++stage_->nodes;
-    if (sink_.progress != nullptr && stage_->nodes % kNodesBetweenProgress == 0 &&
-        !sink_.progress(sink_.self, {stage, stage_->nodes, total, summary_.bytes})) {
+    Step(stage, stage_->nodes, total);
+}
+
+void CheckRun::Step(const char* stage, u64 done, u64 total) {
+    if (sink_.progress != nullptr && done % kStepsBetweenProgress == 0 &&
+        !sink_.progress(sink_.self, {stage, done, total, summary_.bytes})) {
         summary_.isStopped = true;
     }
 }

@@ -68,6 +68,8 @@ public:
 
     // One more node of `stage` visited.
     void CountNode(const char* stage, u64 total);
+    // `done` steps of `total`, which count no nodes of their own; tells every few hundred.
+    void Step(const char* stage, u64 done, u64 total);
 
     CheckSummary* Summary() { return &summary_; }
 

@@ -65,7 +65,9 @@ void CloseStage(CheckRun* run, CheckStage* stage) {
 
 bool ForEachLeafRecord(CheckTree* tree, const CheckLeafVisitor& visitor) {
     CheckNodeWindow window(tree->file, tree->nodeSize);
+    u64 done = 0;
     for (u32 nodeNum : tree->leaves) {
+        tree->run->Step("cross", ++done, tree->leaves.size());
         int status = 0;
         CheckNode node;
         node.bytes = window.Get(nodeNum, &status);

@@ -12,7 +12,6 @@ namespace {
 constexpr u32 kSpecialIds[kSpecialForks] = {kAllocationFileId, kExtentsFileId, kCatalogFileId,
                                             kAttributesFileId, kStartupFileId};
 constexpr u32 kLeastBlockSize = 512;
-constexpr u64 kNowhere = u64{1} << 62;  // a place no source has
 
 using Wide = unsigned long long;
 
@@ -166,7 +165,7 @@ std::string RunText(const CheckExtent& run) {
 }
 
 // One special fork by itself.
-void CheckFork80(CheckVolumeState* state, const CheckFork& fork) {
+void CheckSpecialFork(CheckVolumeState* state, const CheckFork& fork) {
     const u32 total = state->header.totalBlocks;
     const CheckPlace place = {fork.fileId, -1, -1, fork.place, "file"};
     for (const CheckExtent& run : fork.runs) {
@@ -238,7 +237,7 @@ std::unique_ptr<CheckFile> CheckVolumeState::MakeFile(const CheckFork& fork) con
         const bool isInside =
             extent.start < header.totalBlocks && extent.count <= header.totalBlocks - extent.start;
         const u64 place = static_cast<u64>(extent.start) * header.blockSize;
-        file->AddRun(isInside ? place : kNowhere,
+        file->AddRun(isInside ? place : kCheckNowhere,
                      static_cast<u64>(extent.count) * header.blockSize);
     }
     return file;
@@ -268,7 +267,7 @@ bool CheckVolumeHeaders(CheckVolumeState* state) {
         const u32 offset = kVolForks + i * kForkSize;
         state->forks[i] =
             TakeFork(state->header.bytes + offset, kSpecialIds[i], state->header.offset + offset);
-        CheckFork80(state, state->forks[i]);
+        CheckSpecialFork(state, state->forks[i]);
     }
     for (u32 fileId : {kExtentsFileId, kCatalogFileId}) {
         if (state->ForkOf(fileId)->runs.empty()) {
