@@ -16,6 +16,7 @@ namespace VELK::tool {
 extern const Command kInfoCommand;
 extern const Command kCheckCommand;
 extern const Command kLsCommand;
+extern const Command kFindCommand;
 extern const Command kStatsCommand;
 extern const Command kBadBlocksCommand;
 extern const Command kApplyCommand;
@@ -27,6 +28,7 @@ const Command* const kCommands[] = {
     &kInfoCommand,
     &kCheckCommand,
     &kLsCommand,
+    &kFindCommand,
     &kStatsCommand,
     &kBadBlocksCommand,
     &kApplyCommand,
