@@ -16,9 +16,12 @@ namespace VELK::tool {
 extern const Command kInfoCommand;
 extern const Command kCheckCommand;
 extern const Command kLsCommand;
-extern const Command kFindCommand;
 extern const Command kStatsCommand;
+extern const Command kPlotCommand;
 extern const Command kBadBlocksCommand;
+extern const Command kFormatCommand;
+extern const Command kCreateTreeCommand;
+extern const Command kDemoCommand;
 extern const Command kApplyCommand;
 extern const Command kCompletionCommand;
 extern const Command kHelpCommand;
@@ -28,9 +31,12 @@ const Command* const kCommands[] = {
     &kInfoCommand,
     &kCheckCommand,
     &kLsCommand,
-    &kFindCommand,
     &kStatsCommand,
+    &kPlotCommand,
     &kBadBlocksCommand,
+    &kFormatCommand,
+    &kCreateTreeCommand,
+    &kDemoCommand,
     &kApplyCommand,
     &kCompletionCommand,
     &kHelpCommand,
