@@ -34,7 +34,7 @@ constexpr Field kFileFields[] = {
     {"owner", 32, 4, kNumber},       {"group", 36, 4, kNumber},
     {"adminflags", 40, 1, kHex},     {"ownerflags", 41, 1, kHex},
     {"mode", 42, 2, kOctal},         {"special", 44, 4, kNumber},
-    {"type", 48, 4, kCode},          {"creator", 52, 4, kCode},
+    {"filetype", 48, 4, kCode},      {"creator", 52, 4, kCode},
     {"finderflags", 56, 2, kHex},    {"location", 58, 4, kHex},
     {"finderreserved", 62, 2, kHex}, {"finderxreserved", 64, 4, kHex},
     {"added", 68, 4, kNumber},       {"xflags", 72, 2, kHex},

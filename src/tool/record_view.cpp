@@ -104,11 +104,16 @@ void UnitsMember(const char* name, const u8* stored, u32 units, JsonWriter* json
 
 void FieldMember(const u8* stored, const Field& field, bool isFirst, JsonWriter* json) {
     if (field.kind == FieldKind::kExtents) {
-        ExtentsMember(field.name, stored + field.offset, json);
+        if (isFirst || UsedExtents(stored + field.offset) != 0) {
+            ExtentsMember(field.name, stored + field.offset, json);
+        }
         return;
     }
     const u64 value = GetField(stored, field);
-    if (value == 0 && !isFirst) {
+    // A block count is left out only when its reader would fill in the same.
+    const bool isImplied = value == 0 && (field.kind != FieldKind::kBlocks ||
+                                          SumOfExtents(stored + field.offset + field.width) == 0);
+    if (isImplied && !isFirst) {
         return;
     }
     json->Key(field.name);

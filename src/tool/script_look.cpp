@@ -126,6 +126,32 @@ int FlatTree(ImageVolume* volume, CBTreeHfs* tree, std::vector<u8>* bytes) {
     return kOk;
 }
 
+int DigestTree(CBTreeHfs* tree, RecordDigest* digest) {
+    int status = kOk;
+    u32 number = tree->header.firstLeafNode;
+    for (u32 hops = 0; number != 0 && hops < tree->header.totalNodes && status == kOk; ++hops) {
+        const HeldNode node(tree, number);
+        status = node.Status();
+        if (status != kOk) {
+            break;
+        }
+        const NodeBytes bytes(&tree->header, node.Get());
+        std::vector<u8> copy;
+        for (u32 i = 0; i < bytes.U16(kDescNumRecords) && status == kOk; ++i) {
+            NodeKey record{};
+            status = node.Get()->GetKey(&tree->header, static_cast<int>(i), &record);
+            if (status == kOk) {
+                copy.resize(record.size);
+                bytes.CopyOut(copy.data(), record.offset, record.size);
+                digest->Add(copy.data(), record.keySize,
+                            copy.data() + record.size - record.dataSize, record.dataSize);
+            }
+        }
+        number = bytes.U32(kDescFLink);
+    }
+    return status;
+}
+
 ScriptRunner::Outcome ScriptRunner::State() {
     return {kOk, StateFields(Tree())};
 }
@@ -222,31 +248,8 @@ ScriptRunner::Outcome ScriptRunner::Stats() {
 }
 
 ScriptRunner::Outcome ScriptRunner::Digest() {
-    // A path of its own: the position stays where it is.
-    CBTreeHfs* tree = Tree();
     RecordDigest digest;
-    int status = kOk;
-    u32 number = tree->header.firstLeafNode;
-    for (u32 hops = 0; number != 0 && hops < tree->header.totalNodes && status == kOk; ++hops) {
-        const HeldNode node(tree, number);
-        status = node.Status();
-        if (status != kOk) {
-            break;
-        }
-        const NodeBytes bytes(&tree->header, node.Get());
-        std::vector<u8> copy;
-        for (u32 i = 0; i < bytes.U16(kDescNumRecords) && status == kOk; ++i) {
-            NodeKey record{};
-            status = node.Get()->GetKey(&tree->header, static_cast<int>(i), &record);
-            if (status == kOk) {
-                copy.resize(record.size);
-                bytes.CopyOut(copy.data(), record.offset, record.size);
-                digest.Add(copy.data(), record.keySize, copy.data() + record.size - record.dataSize,
-                           record.dataSize);
-            }
-        }
-        number = bytes.U32(kDescFLink);
-    }
+    const int status = DigestTree(Tree(), &digest);
     return {status, fmt::format(" digest={} records={}", digest.Text(), digest.Records())};
 }
 

@@ -16,6 +16,7 @@
 #include "tool/fault_shim.h"
 #include "tool/key_text.h"
 #include "tool/output.h"
+#include "tool/record_digest.h"
 #include "tool/record_text.h"
 #include "tool/script.h"
 
@@ -157,5 +158,8 @@ void CountRecord(ImageVolume* volume, const u8* stored, u32 size, int change);
 // A tree file as it stands in memory, changes that no flush has seen included: what a checker
 // reads. 0, or the status of a failed read.
 int FlatTree(ImageVolume* volume, CBTreeHfs* tree, std::vector<u8>* bytes);
+
+// Digests the records along the chain of leaves; no path is moved. 0 or the status that ended it.
+int DigestTree(CBTreeHfs* tree, RecordDigest* digest);
 
 }  // namespace VELK::tool

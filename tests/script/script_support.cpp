@@ -11,8 +11,8 @@
 
 namespace VELK::tool {
 // The table of the program, as far as these tests need it.
-extern const Command kApplyCommand;
-const Command* const kCommands[] = {&kApplyCommand, nullptr};
+extern const Command kApplyCommand, kExportCommand, kImportCommand;
+const Command* const kCommands[] = {&kApplyCommand, &kExportCommand, &kImportCommand, nullptr};
 
 const Command* FindCommand(const std::string& name) {
     for (const Command* const* command = kCommands; *command != nullptr; ++command) {

@@ -108,7 +108,7 @@ TEST(DataText, FileRecordWithEverything) {
     const std::string text =
         "file{id:18,rsize:5,rsrc:[[9,1]],rclump:4096,flags:0x82,link:3,"
         "created:2026-11-21T01:18:16Z,owner:501,group:20,adminflags:0x1,ownerflags:0x2,"
-        "mode:0120755,special:1,type:\"slnk\",creator:0x00000001,finderflags:0x4000,"
+        "mode:0120755,special:1,filetype:\"slnk\",creator:0x00000001,finderflags:0x4000,"
         "location:0x40004000,putaway:7,encoding:126,reserved:0x9}";
     EXPECT_EQ(Text(kCatalogFileId, Stored(text, kCatalogFileId)), text);
 }
@@ -210,7 +210,7 @@ TEST(DataComplaint, EachKindOfMistake) {
     Complaint("extents{[[1,2],[1,2],[1,2],[1,2],[1,2],[1,2],[1,2],[1,2],[1,2]]}", kExtentsFileId);
     Complaint("extents{[[1]]}", kExtentsFileId);
     Complaint("inline{abc}", kAttributesFileId);
-    Complaint("file{type:\"toolong\"}", kCatalogFileId);
+    Complaint("file{filetype:\"toolong\"}", kCatalogFileId);
     Complaint("file{mode:0999}", kCatalogFileId);
     Complaint("file{created:2026-13-01}", kCatalogFileId);
     Complaint("", kCatalogFileId);
