@@ -70,7 +70,7 @@ TEST(CheckCross, V05MarksWithoutOwnerAndBehindTheEnd) {
     volume.owned.push_back(kData + 50);
     Outcome outcome = CheckParts(&volume);
     EXPECT_IDS(outcome, "");
-    EXPECT_EQ(outcome.First(CheckId::V05).text, "1 blocks are marked used but belong to nothing");
+    EXPECT_EQ(outcome.First(CheckId::V05).text, "1 block is marked used but belongs to nothing");
     EXPECT_EQ(outcome.First(CheckId::V05).severity, CheckSeverity::kInfo);
     volume.bytes[3 * kBlock + VolumeImage::kTotalBlocks / 8] = 0x40;
     EXPECT_IDS(CheckBytes(volume.bytes, Full()), "V05");
@@ -87,7 +87,7 @@ TEST(CheckCross, V06CountsOfFilesFoldersAndFreeBlocks) {
     ASSERT_EQ(outcome.findings.size(), 3u);
     EXPECT_EQ(outcome.findings[0].text, "fileCount is 5, the catalog has 2 files");
     EXPECT_EQ(outcome.findings[1].text,
-              "folderCount is 6, the catalog has 1 folders below the root");
+              "folderCount is 6, the catalog has 1 folder below the root");
     EXPECT_EQ(outcome.summary.errors, 0u);
 }
 
@@ -191,7 +191,7 @@ TEST(CheckCross, R06BlocksOutsideTheVolumeOrOwnedTwice) {
     outcome = CheckParts(&volume);
     EXPECT_IDS(outcome, "R06");
     EXPECT_EQ(outcome.findings[0].text,
-              "blocks 999..4294968293 of file 30 lie outside the volume of 1000 blocks");
+              "outside the volume of 1000 blocks: blocks 999..4294968293 of file 30");
 }
 
 TEST(CheckCross, R06SizeThatDoesNotFitItsBlocks) {
@@ -300,7 +300,7 @@ TEST(CheckCross, D01KeysThatALookupMisses) {
     outcome = CheckImage(tree, options);
     EXPECT_EQ(outcome.findings[0].text,
               "looking up 120:data:8 from the root ends at node 1 and does not find it; so for 1 "
-              "more records of this node");
+              "more record of this node");
 }
 
 TEST(CheckCross, NothingIsComparedWithADamagedTree) {

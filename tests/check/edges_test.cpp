@@ -177,7 +177,7 @@ TEST(CheckEdges, RunsBehindAnEmptyOne) {
     volume.PatchHeaders32(kForks + 16 + 20, 1);
     const Outcome outcome = CheckBytes(volume.bytes);
     EXPECT_IDS(outcome, "V04");
-    EXPECT_EQ(outcome.findings[0].text, "run 2 of 1 blocks stands behind an empty one");
+    EXPECT_EQ(outcome.findings[0].text, "run 2 of 1 block stands behind an empty one");
     EXPECT_EQ(outcome.findings[0].where, "allocation file");
 }
 

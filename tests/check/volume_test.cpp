@@ -136,7 +136,7 @@ TEST(CheckVolumeHeader, V04RunsOutsideTheVolumeOverlappingOrTooFew) {
     volume.PatchHeaders32(kForks + 4 * kForkSize + 12, 20);
     Outcome outcome = CheckBytes(volume.bytes);
     EXPECT_IDS(outcome, "V04");
-    EXPECT_EQ(outcome.findings[0].text, "blocks 990..1009 lie outside the volume of 1000 blocks");
+    EXPECT_EQ(outcome.findings[0].text, "outside the volume of 1000 blocks: blocks 990..1009");
     EXPECT_EQ(outcome.findings[0].where, "startup file");
 
     volume = Sound();
@@ -145,13 +145,13 @@ TEST(CheckVolumeHeader, V04RunsOutsideTheVolumeOverlappingOrTooFew) {
     volume.PatchHeaders32(kForks + 4 * kForkSize + 12, 1);
     outcome = CheckBytes(volume.bytes);
     EXPECT_IDS(outcome, "V04");
-    EXPECT_EQ(outcome.findings[0].text, "blocks 1..1 overlap blocks 0..2 of the volume header");
+    EXPECT_EQ(outcome.findings[0].text, "overlap: block 1 with blocks 0..2 of the volume header");
 
     volume = Sound();
     volume.PatchHeaders32(kForks + 12, 5);
     outcome = CheckBytes(volume.bytes);
     EXPECT_IDS(outcome, "V04");
-    EXPECT_EQ(outcome.findings[0].text, "its extents hold 1 blocks, the fork says 5");
+    EXPECT_EQ(outcome.findings[0].text, "its extents hold 1 block, the fork says 5");
     EXPECT_EQ(outcome.summary.stages[0].errors, 1u);
 }
 

@@ -151,8 +151,7 @@ std::string CheckClaimText(const CheckClaim& claim) {
 CheckPlace CheckBlocksPlace(const CheckVolumeState& state, u32 start, u32 count) {
     CheckPlace place;
     place.offset = static_cast<u64>(start) * state.header.blockSize;
-    place.part = count == 1 ? CheckPrint("block %u", start)
-                            : CheckPrint("blocks %u..%llu", start, Wide{start} + count - 1);
+    place.part = CheckBlocksText(start, count);
     return place;
 }
 
@@ -192,8 +191,9 @@ void CheckBitmap(CheckVolumeState* state, const std::vector<CheckClaim>& claims)
     }
     if (bitmap.Used() > bitmap.Owned()) {
         state->run->Info(CheckId::V05, {kAllocationFileId, -1, -1, kCheckNoOffset, "file"},
-                         CheckPrint("%llu blocks are marked used but belong to nothing",
-                                    Wide{bitmap.Used() - bitmap.Owned()}));
+                         CheckCounted(bitmap.Used() - bitmap.Owned(),
+                                      "block is marked used but belongs to nothing",
+                                      "blocks are marked used but belong to nothing"));
     }
     CheckTail(state, *file);
 }

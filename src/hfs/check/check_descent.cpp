@@ -162,7 +162,8 @@ void Lookups::Take(const CheckNode& node, u32 index, const u8* key) {
 
 void Lookups::Finish() {
     if (failures_ > 1) {
-        text_ += CheckPrint("; so for %u more records of this node", failures_ - 1);
+        text_ += "; so for " + CheckCounted(failures_ - 1, "more record", "more records") +
+                 " of this node";
     }
     if (failures_ > 0) {
         tree_.run->Error(CheckId::D01, place_, text_);

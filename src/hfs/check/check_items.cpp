@@ -219,8 +219,9 @@ void Items::CheckParents() {
     for (const Item& item : items_) {
         if ((item.flags & kIsFolder) != 0 && item.valence != item.children) {
             run_.Warn(CheckId::R05, Place(item),
-                      CheckPrint("valence of folder %s (ID %u) is %u, it has %u items",
-                                 KeyText(item).c_str(), item.id, item.valence, item.children),
+                      CheckPrint("valence of folder %s (ID %u) is %u, it has %s",
+                                 KeyText(item).c_str(), item.id, item.valence,
+                                 CheckCounted(item.children, "item", "items").c_str()),
                       item.children, item.valence);
         }
     }
@@ -255,15 +256,16 @@ void Items::CheckCounts() const {
     const u64 folders = folders_ == 0 ? 0 : folders_ - 1;
     if (files != header.fileCount) {
         run_.Warn(CheckId::V06, state_.HeaderPlace(kVolFileCount),
-                  CheckPrint("fileCount is %u, the catalog has %llu files", header.fileCount,
-                             static_cast<unsigned long long>(files)),
+                  CheckPrint("fileCount is %u, the catalog has %s", header.fileCount,
+                             CheckCounted(files, "file", "files").c_str()),
                   files, header.fileCount);
     }
     if (folders != header.folderCount) {
-        run_.Warn(CheckId::V06, state_.HeaderPlace(kVolFolderCount),
-                  CheckPrint("folderCount is %u, the catalog has %llu folders below the root",
-                             header.folderCount, static_cast<unsigned long long>(folders)),
-                  folders, header.folderCount);
+        run_.Warn(
+            CheckId::V06, state_.HeaderPlace(kVolFolderCount),
+            CheckPrint("folderCount is %u, the catalog has %s below the root", header.folderCount,
+                       CheckCounted(folders, "folder", "folders").c_str()),
+            folders, header.folderCount);
     }
 }
 

@@ -166,11 +166,10 @@ bool CheckMap(CheckTree* tree) {
                                     static_cast<unsigned long long>(tree->mapBits), total),
                          total, tree->mapBits);
     } else if (total - used != tree->header.freeNodes) {
-        tree->run->Warn(
-            CheckId::H13, tree->HeaderPlace(kHeadFreeNodes),
-            CheckPrint("freeNodes is %u, the map has %llu clear bits", tree->header.freeNodes,
-                       static_cast<unsigned long long>(total - used)),
-            total - used, tree->header.freeNodes);
+        tree->run->Warn(CheckId::H13, tree->HeaderPlace(kHeadFreeNodes),
+                        CheckPrint("freeNodes is %u, the map has %s", tree->header.freeNodes,
+                                   CheckCounted(total - used, "clear bit", "clear bits").c_str()),
+                        total - used, tree->header.freeNodes);
     }
     return true;
 }

@@ -43,6 +43,16 @@ std::string CheckPrint(const char* format, ...) {
     return text;
 }
 
+std::string CheckCounted(u64 count, const char* one, const char* many) {
+    return std::to_string(count) + " " + (count == 1 ? one : many);
+}
+
+std::string CheckBlocksText(u32 start, u32 count) {
+    return count == 1 ? CheckPrint("block %u", start)
+                      : CheckPrint("blocks %u..%llu", start,
+                                   static_cast<unsigned long long>(start) + count - 1);
+}
+
 const char* CheckFileName(u32 fileId) {
     switch (fileId) {
         case 0:

@@ -24,6 +24,12 @@ __attribute__((format(printf, 1, 2)))
 std::string
 CheckPrint(const char* format, ...);
 
+// "1 block", "7 blocks".
+std::string CheckCounted(u64 count, const char* one, const char* many);
+
+// "block 7", "blocks 7..9".
+std::string CheckBlocksText(u32 start, u32 count);
+
 // "catalog", "extents", "attributes", "allocation", "startup", "bad-block", "volume" (0).
 const char* CheckFileName(u32 fileId);
 

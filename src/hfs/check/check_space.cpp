@@ -95,9 +95,9 @@ u64 Space::TakeRuns(const Source& source, const u8* runs, u32 owner, ClaimKind k
             claims_.push_back({start, count, owner, kind});
         } else {
             run_.Error(CheckId::R06, source.At(bytes),
-                       CheckPrint("blocks %u..%llu of %s lie outside the volume of %u blocks",
-                                  start, Wide{start} + count - 1,
-                                  CheckClaimText({start, count, owner, kind}).c_str(), total));
+                       CheckPrint("outside the volume of %u blocks: %s of %s", total,
+                                  CheckBlocksText(start, count).c_str(),
+                                  CheckClaimText({start, count, owner, kind}).c_str()));
         }
     }
     return blocks;
@@ -163,15 +163,15 @@ void Space::TakeFileFork(const Source& source, const u8* fork, u32 owner, u8 for
     }
     if (blocks != total) {
         run_.Error(CheckId::R08, source.At(fork + kForkTotalBlocks),
-                   CheckPrint("the %s fork of file %u has %u blocks, its extents hold %llu", name,
-                              owner, total, Wide{blocks}),
+                   CheckPrint("the %s fork of file %u has %s, its extents hold %llu", name, owner,
+                              CheckCounted(total, "block", "blocks").c_str(), Wide{blocks}),
                    total, blocks);
     }
     const u64 size = Load64(fork + kForkLogicalSize);
     if (size > static_cast<u64>(total) * state_.header.blockSize) {
         run_.Error(CheckId::R06, source.At(fork),
-                   CheckPrint("the %s fork of file %u: size %llu does not fit %u blocks", name,
-                              owner, Wide{size}, total));
+                   CheckPrint("the %s fork of file %u: size %llu does not fit %s", name, owner,
+                              Wide{size}, CheckCounted(total, "block", "blocks").c_str()));
     }
 }
 
@@ -194,10 +194,12 @@ void Space::GatherFiles() {
 // The attribute fork gathered so far has to be complete.
 void Space::CloseAttribute() {
     if (attributeBlocks_ != attributeTotal_) {
-        run_.Error(CheckId::R08, attributePlace_,
-                   CheckPrint("an attribute fork of ID %u has %llu blocks, its extents hold %llu",
-                              attributeId_, Wide{attributeTotal_}, Wide{attributeBlocks_}),
-                   attributeTotal_, attributeBlocks_);
+        run_.Error(
+            CheckId::R08, attributePlace_,
+            CheckPrint("an attribute fork of ID %u has %s, its extents hold %llu", attributeId_,
+                       CheckCounted(attributeTotal_, "block", "blocks").c_str(),
+                       Wide{attributeBlocks_}),
+            attributeTotal_, attributeBlocks_);
     }
     attributeBlocks_ = attributeTotal_ = 0;
 }

@@ -161,7 +161,7 @@ void CheckAlternate(CheckVolumeState* state) {
 }
 
 std::string RunText(const CheckExtent& run) {
-    return CheckPrint("blocks %u..%llu", run.start, Wide{run.start} + run.count - 1);
+    return CheckBlocksText(run.start, run.count);
 }
 
 // One special fork by itself.
@@ -172,7 +172,7 @@ void CheckSpecialFork(CheckVolumeState* state, const CheckFork& fork) {
         if (run.start >= total || run.count > total - run.start) {
             state->run->Error(
                 CheckId::V04, place,
-                CheckPrint("%s lie outside the volume of %u blocks", RunText(run).c_str(), total));
+                CheckPrint("outside the volume of %u blocks: %s", total, RunText(run).c_str()));
         }
     }
     bool isOver = false;
@@ -181,9 +181,9 @@ void CheckSpecialFork(CheckVolumeState* state, const CheckFork& fork) {
             static_cast<u32>(fork.place - state->header.offset) + kForkExtents + i * kExtentSize;
         const u32 count = Load32(state->header.bytes + at + 4);
         if (isOver && count != 0) {
-            state->run->Error(
-                CheckId::V04, place,
-                CheckPrint("run %u of %u blocks stands behind an empty one", i, count));
+            state->run->Error(CheckId::V04, place,
+                              CheckPrint("run %u of %s stands behind an empty one", i,
+                                         CheckCounted(count, "block", "blocks").c_str()));
             break;
         }
         isOver = isOver || count == 0;
@@ -292,10 +292,11 @@ void CheckSpecialForks(CheckVolumeState* state) {
     for (const CheckFork& fork : state->forks) {
         const CheckPlace place = {fork.fileId, -1, -1, fork.place, "file"};
         if (fork.blocks != fork.totalBlocks) {
-            state->run->Error(CheckId::V04, place,
-                              CheckPrint("its extents hold %llu blocks, the fork says %u",
-                                         Wide{fork.blocks}, fork.totalBlocks),
-                              fork.totalBlocks, fork.blocks);
+            state->run->Error(
+                CheckId::V04, place,
+                CheckPrint("its extents hold %s, the fork says %u",
+                           CheckCounted(fork.blocks, "block", "blocks").c_str(), fork.totalBlocks),
+                fork.totalBlocks, fork.blocks);
         }
         for (const CheckExtent& run : fork.runs) {
             owned.push_back({run, CheckPrint("the %s file", CheckFileName(fork.fileId)), place});
@@ -310,7 +311,7 @@ void CheckSpecialForks(CheckVolumeState* state) {
         const u64 reach = u64{before.run.start} + before.run.count;
         if (reach > owned[i].run.start) {
             state->run->Error(CheckId::V04, owned[i].place,
-                              CheckPrint("%s overlap %s of %s", RunText(owned[i].run).c_str(),
+                              CheckPrint("overlap: %s with %s of %s", RunText(owned[i].run).c_str(),
                                          RunText(before.run).c_str(), before.owner.c_str()));
         }
         if (u64{owned[i].run.start} + owned[i].run.count > reach) {
