@@ -17,7 +17,11 @@ extern const Command kInfoCommand;
 extern const Command kCheckCommand;
 extern const Command kLsCommand;
 extern const Command kStatsCommand;
+extern const Command kPlotCommand;
 extern const Command kBadBlocksCommand;
+extern const Command kFormatCommand;
+extern const Command kCreateTreeCommand;
+extern const Command kDemoCommand;
 extern const Command kApplyCommand;
 extern const Command kExportCommand;
 extern const Command kImportCommand;
@@ -30,7 +34,11 @@ const Command* const kCommands[] = {
     &kCheckCommand,
     &kLsCommand,
     &kStatsCommand,
+    &kPlotCommand,
     &kBadBlocksCommand,
+    &kFormatCommand,
+    &kCreateTreeCommand,
+    &kDemoCommand,
     &kApplyCommand,
     &kExportCommand,
     &kImportCommand,

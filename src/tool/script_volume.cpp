@@ -123,10 +123,14 @@ void Save(const TargetOptions& options, ImageVolume* volume) {
 }  // namespace
 
 void TargetOptions::Declare(Invocation* call) {
-    call->DeclarePlace();
     call->options.Text("--new", &newVolume, "SIZE[,...]",
                        "a fresh volume in memory instead of an image: 64M, 1M,node=512, also "
                        "block=N map=N clump=N case empty");
+    DeclareForImage(call);
+}
+
+void TargetOptions::DeclareForImage(Invocation* call) {
+    call->DeclarePlace();
     call->options.Text("--save", &saveFile, "FILE", "write the volume to FILE afterwards");
     call->options.Flag("--write", &write, "let changes reach the image");
     call->options.Flag("--force", &force,

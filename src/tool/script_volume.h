@@ -18,6 +18,8 @@ struct TargetOptions {
     bool force = false;
 
     void Declare(Invocation* call);
+    // The same without --new, for commands that want an image.
+    void DeclareForImage(Invocation* call);
     // What errors name: the image, or "new volume".
     std::string Subject(const Invocation& call) const;
 };

@@ -15,7 +15,6 @@ constexpr u32 kData = 24;
 
 struct Scenario {
     const char* name;
-    u32 mapBlock;
     TreeImage (*image)(u32 nodeSize);
     int (*change)(TreeOnVolume* tree);
 };
@@ -48,35 +47,78 @@ TreeImage GrowingImage(u32 nodeSize) {
     return BuildTree(shape, records);
 }
 
+// A full leaf behind one with room.
+TreeImage LeftRoomImage(u32 nodeSize) {
+    const u32 fit = (nodeSize - 16) / 46;
+    TreeImage image = Image(nodeSize, fit + 3, fit);
+    const std::vector<TreeRecord> records = NthRecords(kCatalogFileId, fit + 3, kData);
+    NodeImage leaf;
+    leaf.fLink = 2;
+    for (u32 n = 0; n < fit + 3; ++n) {
+        if (n == 3) {
+            image.SetNode(1, leaf.Build(nodeSize));
+            leaf = NodeImage{};
+            leaf.bLink = 1;
+        }
+        leaf.records.push_back(Record(records[n].key, records[n].data));
+    }
+    image.SetNode(2, leaf.Build(nodeSize));
+    NodeImage root;
+    root.kind = kBTIndexNode;
+    root.height = 2;
+    root.records = {Record(records[0].key, 1), Record(records[3].key, 2)};
+    image.SetNode(3, root.Build(nodeSize));
+    return image;
+}
+
+// One full leaf of keys that lie over block ends.
+TreeImage LongKeyImage(u32 nodeSize) {
+    TreeShape shape;
+    shape.nodeSize = nodeSize;
+    std::vector<TreeRecord> records;
+    const u32 nameLength = nodeSize < 4096 ? 30 : 250;
+    for (u32 n = 0; n < nodeSize / (nameLength * 2 + 8 + kData + 2); ++n) {
+        records.push_back(
+            {DiskCatKey(16 + n, std::u16string(nameLength, u'k')), Pattern(kData, n)});
+    }
+    return BuildTree(shape, records);
+}
+
 const Scenario kScenarios[] = {
-    {"FirstRecord", 512, [](u32 nodeSize) { return Image(nodeSize, 0, 0); },
+    {"FirstRecord", [](u32 nodeSize) { return Image(nodeSize, 0, 0); },
      [](TreeOnVolume* tree) { return tree->InsertNth(1, 20); }},
-    {"FirstRecordWithGrowth", 512, [](u32 nodeSize) { return Image(nodeSize, 0, 0, 0); },
+    {"FirstRecordWithGrowth", [](u32 nodeSize) { return Image(nodeSize, 0, 0, 0); },
      [](TreeOnVolume* tree) { return tree->InsertNth(1, 20); }},
-    {"RoomInTheLeaf", 512, [](u32 nodeSize) { return Image(nodeSize, 9, 3); },
+    {"RoomInTheLeaf", [](u32 nodeSize) { return Image(nodeSize, 9, 3); },
      [](TreeOnVolume* tree) { return tree->InsertNth(4, 20, true); }},
-    {"KeyBeforeAll", 512, [](u32 nodeSize) { return Image(nodeSize, 9, 3); },
+    {"KeyBeforeAll", [](u32 nodeSize) { return Image(nodeSize, 9, 3); },
      [](TreeOnVolume* tree) { return tree->Insert(HostCatKey(1, u"a"), Pattern(20, 1)); }},
-    {"LeafSplit", 512, FullImage, [](TreeOnVolume* tree) { return tree->InsertNth(25, 24, true); }},
-    {"RootSplit", 512, [](u32 nodeSize) { return Image(nodeSize, (nodeSize - 16) / 46, 0); },
+    {"LeafSplit", FullImage, [](TreeOnVolume* tree) { return tree->InsertNth(25, 24, true); }},
+    {"RootSplit", [](u32 nodeSize) { return Image(nodeSize, (nodeSize - 16) / 46, 0); },
      [](TreeOnVolume* tree) { return tree->InsertNth(3, 24, true); }},
-    {"BothSeparators", 512, FullImage,
+    {"BothSeparators", FullImage,
      [](TreeOnVolume* tree) {
          return tree->Insert(HostCatKey(1, std::u16string(60, u'a')), Pattern(90, 1));
      }},
-    {"SplitWithGrowth", 512, [](u32 nodeSize) { return Image(nodeSize, nodeSize / 4, 0, 0); },
+    {"SplitWithGrowth", [](u32 nodeSize) { return Image(nodeSize, nodeSize / 4, 0, 0); },
      [](TreeOnVolume* tree) { return tree->InsertNth(25, 24, true); }},
-    {"PlainDeletion", 512, [](u32 nodeSize) { return Image(nodeSize, 9, 3); },
+    {"LeftSiblingTakesRecords", LeftRoomImage,
+     [](TreeOnVolume* tree) { return tree->InsertNth(8, 24, true); }},
+    {"RootSplitOfLongKeys", LongKeyImage,
+     [](TreeOnVolume* tree) {
+         return tree->Insert(HostCatKey(17, std::u16string(80, u'x')), Pattern(100, 1));
+     }},
+    {"PlainDeletion", [](u32 nodeSize) { return Image(nodeSize, 9, 3); },
      [](TreeOnVolume* tree) { return tree->DeleteNth(4); }},
-    {"DeletionOfAFirstRecord", 512, [](u32 nodeSize) { return Image(nodeSize, 9, 3); },
+    {"DeletionOfAFirstRecord", [](u32 nodeSize) { return Image(nodeSize, 9, 3); },
      [](TreeOnVolume* tree) { return tree->DeleteNth(3); }},
-    {"DeletionOfALeaf", 512, [](u32 nodeSize) { return Image(nodeSize, 9, 1); },
+    {"DeletionOfALeaf", [](u32 nodeSize) { return Image(nodeSize, 9, 1); },
      [](TreeOnVolume* tree) { return tree->DeleteNth(3); }},
-    {"DeletionWithCollapse", 512, [](u32 nodeSize) { return Image(nodeSize, 2, 1); },
+    {"DeletionWithCollapse", [](u32 nodeSize) { return Image(nodeSize, 2, 1); },
      [](TreeOnVolume* tree) { return tree->DeleteNth(0); }},
-    {"LastDeletion", 512, [](u32 nodeSize) { return Image(nodeSize, 1, 0); },
+    {"LastDeletion", [](u32 nodeSize) { return Image(nodeSize, 1, 0); },
      [](TreeOnVolume* tree) { return tree->DeleteNth(0); }},
-    {"DeletionThatSplitsParents", 512, GrowingImage,
+    {"DeletionThatSplitsParents", GrowingImage,
      [](TreeOnVolume* tree) { return tree->Delete(HostCatKey(16 + 60, u"aa")); }},
 };
 
@@ -212,7 +254,8 @@ TEST_P(ChangeFault, EveryAllocationFailsOnce) {
 std::vector<FaultCase> FaultCases() {
     std::vector<FaultCase> cases;
     for (const Scenario& scenario : kScenarios) {
-        for (const Geometry& geometry : {Geometry{512, 512}, Geometry{1024, 512}}) {
+        for (const Geometry geometry :
+             {Geometry{512, 512}, Geometry{1024, 512}, Geometry{4096, 512}}) {
             cases.push_back({&scenario, geometry});
         }
     }

@@ -2,6 +2,7 @@
 add_executable(change_tests
   balance_test.cpp
   change_fault_test.cpp
+  change_hostile_test.cpp
   churn_test.cpp
   delete_test.cpp
   flat_tree.cpp

@@ -221,6 +221,28 @@ TEST_F(InsertRefusal, MapThatCallsTheNodeOfASeparatorFree) {
     EXPECT_TRUE(LedgerHolds(Tree(), References(Tree().findData)));
 }
 
+TEST_F(InsertRefusal, FirstKeyOfASplitRootThatCannotBeRead) {
+    TreeImage image = Image(kFit);
+    image.Patch16(1, 14, 0x7000);  // key length of record 0, which the search does not look at
+    Open(image);
+    ExpectInsert(
+        kFit - 1, kErrCorrupt,
+        Upwards({Reported(kReasonNode, kAnySite), Reported(kErrCorrupt, 4488)}, kErrCorrupt));
+}
+
+// Two separators above half a node have no room in one root.
+TEST_F(InsertRefusal, SeparatorsTooLongForARoot) {
+    TreeShape shape;
+    Open(BuildTree(shape, {{DiskCatKey(2, std::u16string(124, u'a')), Pattern(100, 1)}}));
+    EXPECT_EQ(tree_->Insert(HostCatKey(3, std::u16string(124, u'b')), Pattern(100, 1)),
+              kErrInvalid);
+    EXPECT_EQ(tree_->capture.Take(),
+              Upwards({Reported(kReasonInvalid, 1183), Reported(kErrInvalid, 1370),
+                       Reported(kErrInvalid, 4516)},
+                      kErrInvalid));
+    EXPECT_TRUE(LedgerHolds(Tree(), References(Tree().findData)));
+}
+
 // Separators above a quarter of a node: the first splits the parent, the second finds no room.
 TEST_F(InsertRefusal, SecondSeparatorWithoutRoom) {
     const HostKey keyF = HostCatKey(1, std::u16string(124, u'f'));

@@ -21,7 +21,7 @@ public:
         volume_.LoadTree(image);
         volume_.fs.ForkOf(image.shape.fileId)->clumpSize = image.shape.clumpSize;
         tree_ = std::make_unique<TestTree>(&volume_, image.shape.fileId);
-        EXPECT_EQ((*tree_)->Init(), kOk);
+        status_ = (*tree_)->Init();
     }
     // A refused change leaves dirty nodes behind; they are dropped, not written.
     ~TreeOnVolume() {
@@ -29,6 +29,7 @@ public:
         capture.Take();
     }
 
+    int OpenStatus() const { return status_; }
     CBTreeHfs* operator->() { return &tree_->tree; }
     CBTreeHfs& operator*() { return tree_->tree; }
     MemVolume& Volume() { return volume_; }
@@ -85,6 +86,7 @@ public:
 
 private:
     std::unique_ptr<TestTree> tree_;
+    int status_ = kOk;
 };
 
 }  // namespace VELK::test

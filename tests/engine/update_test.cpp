@@ -2,6 +2,7 @@
 // nothing else changes.
 #include <memory>
 
+#include "fault_service.h"
 #include "geometry.h"
 #include "node_bench.h"
 #include "tree_test.h"
@@ -170,6 +171,19 @@ TEST_P(Update, MissingScratchBufferIsReported) {
     EXPECT_EQ((*tree_)->UpdateKeyAndRecord(nullptr, data.data()), kErrNoMemory);
     EXPECT_EQ(tree_->capture.Take(), Events{Reported(kErrNoMemory, 9216)});
     EXPECT_TRUE(ModifiedNodes(**tree_).empty());
+}
+
+TEST_P(Update, RefusedAccessIsReportedAndNothingWritten) {
+    Open(5, 24);
+    Find(2);
+    const Bytes before = tree_->Node(1);
+    const Bytes data = Pattern(24, 1);
+    FaultService faults(&tree_->Volume().fs);
+    faults.Fail(Call::kWriteAccess, 1);
+    EXPECT_EQ((*tree_)->UpdateKeyAndRecord(nullptr, data.data()), kFaultStatus);
+    EXPECT_EQ(tree_->capture.Take(),
+              (Events{Reported(kFaultStatus, kAnySite), Reported(kFaultStatus, 3586)}));
+    EXPECT_EQ(tree_->Node(1), before);
 }
 
 INSTANTIATE_GEOMETRIES(Update, ChangeGeometries);

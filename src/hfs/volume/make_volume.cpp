@@ -230,6 +230,9 @@ Problem MakeTrees(BlockDevice* device, ImageVolume* volume, const FormatOptions&
             return problem;
         }
     }
+    if (!options.withRoot) {
+        return {};
+    }
     const int status = InsertRootFolder(volume->OpenTree(kCatalogFileId), options);
     if (status == kErrTooLarge || status == kErrInvalid) {
         return UsageProblem("catalog nodes of " + Grouped(options.catalogNodeSize) +

@@ -1,0 +1,138 @@
+// format: a new volume in a file, its trees made by the engine.
+#include <unistd.h>
+
+#include "hfs/volume/make_volume.h"
+#include "tool/command.h"
+#include "tool/errors.h"
+#include "tool/format_args.h"
+#include "tool/text_format.h"
+
+namespace VELK::tool {
+
+namespace {
+
+constexpr u64 kSmallestVolume = 64u << 10;
+
+struct FormatArguments {
+    std::optional<u64> size;
+    std::optional<u64> blockSize;
+    std::optional<u64> catalogSize;
+    std::optional<u64> clump;
+    std::string nodeSizes;
+    std::string name;
+    std::string date;
+    std::string uuid;
+    bool caseSensitive = false;
+    bool withAttributes = false;
+    bool empty = false;
+
+    void Declare(Invocation* call) {
+        OptionSet& options = call->options;
+        options.Size("--size", &size, "BYTES", "of the volume: 64M; needed unless the file exists");
+        options.Text("--name", &name, "NAME", "of the volume (Untitled)");
+        options.Size("--block-size", &blockSize, "BYTES", "allocation block, 512 to 65536 (4096)");
+        options.Text("--node-size", &nodeSizes, "BYTES",
+                     "of all trees, or by tree: c=8192,e=4096,a=8192");
+        options.Size("--catalog-size", &catalogSize, "BYTES", "first size of the catalog file");
+        options.Size("--clump", &clump, "BYTES", "growth step of the tree files");
+        options.Flag("--case-sensitive", &caseSensitive, "HFSX, names compared binary");
+        options.Flag("--with-attributes", &withAttributes, "make the attributes tree as well");
+        options.Flag("--empty", &empty, "no records at all: for import");
+        options.Text("--date", &date, "ISO", "written to every date: 2026-11-21T00:00:00Z (now)");
+        options.Text("--uuid", &uuid, "HEX", "volume identifier of 16 digits (random)");
+        options.Flag("--force", &call->force, "replace a file that exists");
+    }
+};
+
+u32 Size32(const char* option, const std::optional<u64>& value, u32 otherwise) {
+    if (!value) {
+        return otherwise;
+    }
+    if (*value > 0xFFFFFFFF) {
+        ThrowUsage("format", fmt::format("{} {} is too large", option, Grouped(*value)), "");
+    }
+    return static_cast<u32>(*value);
+}
+
+FormatOptions OptionsOf(const FormatArguments& arguments) {
+    FormatOptions options;
+    options.caseSensitive = arguments.caseSensitive;
+    options.blockSize = Size32("--block-size", arguments.blockSize, options.blockSize);
+    options.clumpSize = Size32("--clump", arguments.clump, 0);
+    options.catalogSize = arguments.catalogSize.value_or(0);
+    options.withAttributes = arguments.withAttributes;
+    options.withRoot = !arguments.empty;
+    options.deviceIsZero = true;
+    ReadNodeSizes(arguments.nodeSizes, &options);
+    options.date = arguments.date.empty() ? HfsNow() : ReadDate(arguments.date);
+    options.uuid = arguments.uuid.empty() ? RandomUuid() : ReadUuid(arguments.uuid);
+    if (!arguments.name.empty()) {
+        options.name = StoredName(arguments.name);
+    }
+    return options;
+}
+
+std::string TreeSentence(ImageVolume* volume, u32 fileId) {
+    if (!volume->HasTree(fileId)) {
+        return fmt::format("{} none", ForkName(fileId));
+    }
+    CBTreeHfs* tree = volume->Tree(fileId, nullptr);
+    return fmt::format("{} {} ({} of {} B)", ForkName(fileId),
+                       BinarySize(volume->Fs()->ForkOf(fileId)->logicalSize),
+                       Counted(tree->header.totalNodes, "node", "nodes"),
+                       Grouped(tree->header.nodeSize));
+}
+
+int RunFormat(Invocation* call) {
+    FormatArguments arguments;
+    call->options.Argument("IMAGE", &call->image, "file to make");
+    arguments.Declare(call);
+    call->Parse();
+    const bool exists = access(call->image.c_str(), F_OK) == 0;
+    if (exists && !call->force) {
+        ThrowFailed("", call->image + " exists", "--force replaces it");
+    }
+    if (!arguments.size) {
+        ThrowUsage("format", "how large is the volume to be?", "give --size, for example 64M");
+    }
+    if (*arguments.size < kSmallestVolume) {
+        ThrowUsage("format", fmt::format("--size {} is too small", Grouped(*arguments.size)),
+                   "a volume takes 64K at least");
+    }
+    const FormatOptions options = OptionsOf(arguments);
+    Problem problem;
+    std::unique_ptr<BlockDevice> device =
+        FileDevice::Open(call->image, FileDevice::Mode::kCreate, *arguments.size, &problem);
+    if (!device) {
+        ThrowProblem(call->image, problem);
+    }
+    const std::unique_ptr<ImageVolume> volume = MakeVolume(std::move(device), options, &problem);
+    if (!volume) {
+        if (!exists) {
+            std::remove(call->image.c_str());
+        }
+        ThrowProblem(call->image, problem);
+    }
+    call->out.Print("{}: {}, {} blocks of {} B; {}, {}, {}\n", call->image,
+                    options.caseSensitive ? "HFSX" : "HFS Plus", Grouped(volume->Fs()->totalBlocks),
+                    Grouped(options.blockSize), TreeSentence(volume.get(), kCatalogFileId),
+                    TreeSentence(volume.get(), kExtentsFileId),
+                    TreeSentence(volume.get(), kAttributesFileId));
+    return kExitDone;
+}
+
+}  // namespace
+
+extern const Command kFormatCommand;
+const Command kFormatCommand = {
+    "format",
+    "IMAGE --size BYTES",
+    "a new volume whose trees the engine makes",
+    "With --date and --uuid two runs give identical bytes.",
+    {"format new.img --size 64M --name Test",
+     "format new.img --size 1G --node-size c=8192,e=4096,a=8192 --with-attributes",
+     "format new.img --size 16M --case-sensitive --date 2026-11-21T00:00:00Z --uuid 1"},
+    RunFormat,
+};
+
+}  // namespace VELK::tool
