@@ -8,8 +8,8 @@ Text goes to standard output, all figures to build/bench/results.json."""
 
 import argparse
 import json
-import os
 import pathlib
+import resource
 import shutil
 import statistics
 import subprocess
@@ -56,19 +56,23 @@ def hfs_sector(image):
 
 
 def run_once(command):
-    """Wall time, processor time and peak memory (KiB) of one run, and the lines it printed."""
-    output = WORK / "output.txt"
+    """Wall time, processor time and peak memory (KiB) of one run, and the lines it printed. The
+    memory comes from GNU time: a child of this process would start with its peak."""
+    output, usage = WORK / "output.txt", WORK / "usage.txt"
+    spent = resource.getrusage(resource.RUSAGE_CHILDREN)
+    before = spent.ru_utime + spent.ru_stime
     with open(output, "wb") as sink:
         start = time.perf_counter()
-        child = subprocess.Popen(command, stdout=sink, stderr=subprocess.DEVNULL,
-                                 stdin=subprocess.DEVNULL)
-        _, status, usage = os.wait4(child.pid, 0)
-        child.returncode = os.waitstatus_to_exitcode(status)
+        done = subprocess.run(["/usr/bin/time", "-q", "-o", str(usage), "-f", "%M", *command],
+                              stdout=sink, stderr=subprocess.DEVNULL, stdin=subprocess.DEVNULL,
+                              check=False)
         wall = time.perf_counter() - start
+    spent = resource.getrusage(resource.RUSAGE_CHILDREN)
+    cpu = spent.ru_utime + spent.ru_stime
     with open(output, "rb") as file:
         lines = sum(block.count(b"\n") for block in iter(lambda: file.read(1 << 20), b""))
-    return {"wall": wall, "cpu": usage.ru_utime + usage.ru_stime, "kib": usage.ru_maxrss,
-            "lines": lines, "status": child.returncode}
+    return {"wall": wall, "cpu": cpu - before, "kib": int(usage.read_text().split()[0]),
+            "lines": lines, "status": done.returncode}
 
 
 def measure(contestants, rounds):
