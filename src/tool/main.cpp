@@ -16,6 +16,7 @@ namespace VELK::tool {
 extern const Command kInfoCommand;
 extern const Command kCheckCommand;
 extern const Command kLsCommand;
+extern const Command kFindCommand;
 extern const Command kStatsCommand;
 extern const Command kPlotCommand;
 extern const Command kBadBlocksCommand;
@@ -33,6 +34,7 @@ const Command* const kCommands[] = {
     &kInfoCommand,
     &kCheckCommand,
     &kLsCommand,
+    &kFindCommand,
     &kStatsCommand,
     &kPlotCommand,
     &kBadBlocksCommand,
