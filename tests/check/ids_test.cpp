@@ -1,6 +1,8 @@
 // The table of invariants, and that each has a test that provokes it.
 #include <gtest/gtest.h>
 
+#include <fstream>
+
 #include "check_support.h"
 
 namespace VELK::test {
@@ -19,6 +21,27 @@ TEST(CheckIds, ThereAreFiftyOneWithATextEach) {
     for (u32 i = 0; i < kCheckIdCount; ++i) {
         EXPECT_EQ(static_cast<u32>(CheckIdTable()[i].id), i);
         EXPECT_GT(std::string(CheckIdTable()[i].text).size(), 10u);
+    }
+}
+
+TEST(CheckIds, DocumentTellsTheSame) {
+    std::ifstream file(TREEHFS_CHECK_DOCUMENT);
+    ASSERT_TRUE(file.is_open());
+    const char* scopes[] = {"quick", "default", "full"};
+    const char* severities[] = {"info", "warning", "error"};
+    std::vector<std::string> rows;
+    for (std::string line; std::getline(file, line);) {
+        if (line.size() > 6 && line[0] == '|' && line[5] == ' ' && line[3] != 'D') {
+            rows.push_back(line);
+        }
+    }
+    ASSERT_EQ(rows.size(), kCheckIdCount);
+    for (u32 i = 0; i < kCheckIdCount; ++i) {
+        const CheckIdInfo& info = CheckIdTable()[i];
+        EXPECT_EQ(rows[i], std::string("| ") + info.name + " | " +
+                               scopes[static_cast<u32>(info.scope)] + " | " +
+                               severities[static_cast<u32>(info.severity)] + " | " + info.text +
+                               " |");
     }
 }
 

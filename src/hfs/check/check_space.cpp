@@ -131,9 +131,14 @@ u64 Space::ClaimOverflow(u32 owner, u8 forkType, u64 blocks) {
     };
     const CheckOverflow wanted = {owner, 0, 0, 0, 0, forkType, 0, false};
     auto record = std::lower_bound(state_.overflow.begin(), state_.overflow.end(), wanted, before);
-    for (;
-         record != state_.overflow.end() && record->fileId == owner && record->forkType == forkType;
-         ++record) {
+    const auto isOwners = [&] {
+        return record != state_.overflow.end() && record->fileId == owner &&
+               record->forkType == forkType;
+    };
+    if (isOwners() && record->isClaimed) {
+        return blocks;  // by another file of the same ID: each record is passed once
+    }
+    for (; isOwners(); ++record) {
         if (record->startBlock != blocks) {
             run_.Error(CheckId::R08,
                        state_.extents->Place(record->nodeNum, kDescSize, record->record),
