@@ -19,6 +19,7 @@ namespace VELK {
 constexpr int kIoPastEnd = -1;    // the range leaves the device
 constexpr int kIoReadOnly = -2;   // the device takes no writes
 constexpr int kIoNoMemory = -3;   // out of memory
+constexpr int kIoTooLarge = -4;   // more changes than the journal holds; nothing was written
 constexpr u32 kSectorSize = 512;  // smallest unit anything on a volume is changed in
 
 // Result of one transfer. A failed one may have moved some of the bytes.

@@ -3,6 +3,7 @@
 
 #include <algorithm>
 
+#include "hfs/volume/journal_sink.h"
 #include "hfs/volume/volume_state.h"
 #include "hfs/volume/wire.h"
 
@@ -159,12 +160,21 @@ u64 ImageVolume::HandedOverBlocks() const {
     return state_->handedOver;
 }
 
+bool ImageVolume::IsCommitDue() const {
+    return state_->journalSink != nullptr &&
+           state_->grantedBytes >= state_->journalSink->Largest() / 2;
+}
+
 u64 ImageVolume::CommittedBytes() const {
     return state_->transaction ? state_->transaction->BytesWritten() : 0;
 }
 
 int ImageVolume::Commit(unsigned long mode) {
     return state_->Commit(mode);
+}
+
+int ImageVolume::Close() {
+    return state_->Close();
 }
 
 void ImageVolume::Restore() {

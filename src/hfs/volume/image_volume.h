@@ -28,6 +28,7 @@ constexpr int kErrVolumeIo = static_cast<int>(0xA0000201u);         // the devic
 constexpr int kErrVolumeTruncated = static_cast<int>(0xA0000202u);  // past the end of the image
 constexpr int kErrVolumeReadOnly = static_cast<int>(0xA0000203u);   // takes no changes
 constexpr int kErrVolumeUnmapped = static_cast<int>(0xA0000204u);   // past the fork's extents
+constexpr int kErrVolumeJournal = static_cast<int>(0xA0000205u);    // more than the journal holds
 
 enum class Access {
     kReadOnly,  // changes are refused
@@ -37,10 +38,13 @@ enum class Access {
 
 struct OpenOptions {
     Access access = Access::kReadOnly;
-    std::optional<u64> offset;       // --offset
-    u32 partition = 0;               // --partition; 0: whichever holds a volume
-    bool backupHeader = false;       // start from the alternate header
-    bool force = false;              // --force: write past a full journal or an unclean unmount
+    std::optional<u64> offset;  // --offset
+    u32 partition = 0;          // --partition; 0: whichever holds a volume
+    bool backupHeader = false;  // start from the alternate header
+    bool force = false;         // --force: write past a full journal or an unclean unmount
+    // Carry out the transactions that wait in the journal before anything else is read: on the
+    // image with Access::kWrite, else in memory only.
+    bool replay = false;
     u32 mapBlockSize = 0;            // --map; 0: the smallest node size of the volume's trees
     u64 cacheBudget = u64{8} << 20;  // bytes of clean nodes that TrimCache leaves cached
 };
@@ -50,8 +54,10 @@ struct JournalState {
     bool present = false;
     bool readable = false;  // info block and header are there and sound
     bool empty = true;
-    u64 pendingBytes = 0;  // bytes of transactions that were not carried out
-    u64 offset = 0;        // of the journal header, bytes of the image
+    u64 pendingBytes = 0;       // bytes of transactions that were not carried out
+    u32 replayed = 0;           // transactions that this mount has carried out
+    bool isConsistent = false;  // it was kept, and nothing waits in it any more
+    u64 offset = 0;             // of the journal header, bytes of the image
     u64 size = 0;
     std::string text;  // what is wrong with it, when not readable
 };
@@ -69,7 +75,7 @@ public:
                                                  Problem* problem);
     ImageVolume(const ImageVolume&) = delete;
     ImageVolume& operator=(const ImageVolume&) = delete;
-    ~ImageVolume();  // tears the trees down; what was not committed is gone
+    ~ImageVolume();  // closes, tears the trees down; what was not committed is gone
 
     CFileSystemHfs* Fs();
     const VolumeHeader& Header() const;  // with the changes made since mount
@@ -115,11 +121,16 @@ public:
     // the default clump. Catalog and extents constants are set here. 0 or a status.
     int CreateTree(u32 fileId, u32 nodeShift, const u64* initialSize);
     // Flushes every tree with `mode`, brings overflow records, bitmap and header up to date and
-    // commits. On failure restores and returns the status.
+    // commits. On failure restores and returns the status. When the medium failed, the volume takes
+    // no more changes, and whether this commit stands shows when it is mounted the next time.
+    // kErrVolumeJournal: too much for one transaction; nothing was written.
     int Commit(unsigned long mode);
     // Back to the last commit: drops staged changes, forks, bitmap and header, restores the trees.
     // Paths the caller holds must be cleared before.
     void Restore();
+    // Ends writing: empties the journal and marks the volume as unmounted. The volume can be read
+    // further. 0 or a status; what was committed stands in either case.
+    int Close();
     // To be called with the status of every changing operation. When it is a failure that may have
     // left a change half done, restores and returns true.
     bool RestoreAfter(int status);
@@ -128,6 +139,9 @@ public:
     void SetModifyDate(u32 date);  // seconds since 1904; written with the next commit
     u64 HandedOverBlocks() const;  // map blocks the trees have handed over since mount
     u64 CommittedBytes() const;    // bytes that commits have written since mount
+    // Whether the changes since the last commit take half of what the journal holds, or more: time
+    // to commit. Never without a journal.
+    bool IsCommitDue() const;
 
     // Writes the whole image as it stands after the last commit.
     Problem SaveTo(std::FILE* file);

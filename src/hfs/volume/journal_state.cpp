@@ -2,100 +2,127 @@
 // far enough to tell whether transactions wait.
 #include "hfs/volume/journal_state.h"
 
+#include <algorithm>
+
 #include "hfs/volume/wire.h"
 
 namespace VELK {
 
 namespace {
 
-// Journal info block, big-endian.
-constexpr u32 kInfoSize = 52;
-constexpr u32 kInfoFlags = 0;
-constexpr u32 kInfoOffset = 36;
-constexpr u32 kInfoJournalSize = 44;
-constexpr u32 kInfoInVolume = 1;
-constexpr u32 kInfoElsewhere = 2;
-constexpr u32 kInfoNeedsInit = 4;
+constexpr u32 kSpecialForks[] = {kExtentsFileId, kCatalogFileId, kAttributesFileId,
+                                 kAllocationFileId, kStartupFileId};
 
-// Journal header, in the byte order of the machine that wrote it.
-constexpr u32 kJournalHeaderSize = 44;
-constexpr u32 kJournalMagic = 0x4A4E4C78;
-constexpr u32 kJournalEndian = 0x12345678;
-constexpr u32 kJournalStart = 8;
-constexpr u32 kJournalEnd = 16;
-constexpr u32 kJournalSize = 24;
-constexpr u32 kJournalChecksum = 36;
-constexpr u32 kJournalHeaderBytes = 40;
-
-struct Reader {
-    const u8* bytes;
-    bool little;
-
-    u32 U32(u32 at) const { return little ? Le32(bytes + at) : Be32(bytes + at); }
-    u64 U64(u32 at) const { return little ? Le64(bytes + at) : Be64(bytes + at); }
-};
+// Why the stretch cannot be a journal's own; empty when it can.
+std::string StretchProblem(const JournalPlace& place, const VolumeHeader& header, u64 volumeBytes) {
+    if (place.offset % kJournalSector != 0 || place.size < 4 * kJournalSector ||
+        place.offset > volumeBytes || place.size > volumeBytes - place.offset) {
+        return "leaves the volume";
+    }
+    if (place.Touches(kHeaderOffset, kHeaderSize) ||
+        place.Touches(volumeBytes - kAltHeaderFromEnd, kHeaderSize) ||
+        place.Touches(place.infoOffset, kJournalInfoSize)) {
+        return "covers a header";
+    }
+    for (const u32 fileId : kSpecialForks) {
+        for (const HfsExtent& extent : header.ForkOf(fileId)->extents) {
+            if (extent.blockCount != 0 &&
+                place.Touches(u64{extent.startBlock} * header.blockSize,
+                              u64{extent.blockCount} * header.blockSize)) {
+                return std::string("covers the ") + ForkName(fileId) + " file";
+            }
+        }
+    }
+    return {};
+}
 
 }  // namespace
 
-u32 JournalChecksum(const u8* bytes, u32 size, u32 checksumAt) {
-    u32 sum = 0;
-    for (u32 i = 0; i < size; ++i) {
-        const u32 byte = i >= checksumAt && i < checksumAt + 4 ? 0 : bytes[i];
-        sum = (sum << 8) ^ (sum + byte);
-    }
-    return ~sum;
-}
-
-JournalState ReadJournalState(BlockDevice* volume, const VolumeHeader& header, u64 imageOffset) {
+JournalState ReadJournalState(BlockDevice* volume, const VolumeHeader& header, u64 imageOffset,
+                              JournalPlace* place) {
     JournalState state;
+    *place = JournalPlace{};
     if ((header.attributes & kVolJournaled) == 0) {
         return state;
     }
     state.present = true;
-    u8 info[kInfoSize];
-    const u64 infoAt = u64{header.journalInfoBlock} * header.blockSize;
-    if (header.journalInfoBlock >= header.totalBlocks ||
-        !volume->Read(infoAt, info, sizeof info).Ok()) {
+    u8 infoBytes[kJournalInfoSize];
+    place->infoOffset = u64{header.journalInfoBlock} * header.blockSize;
+    if (header.journalInfoBlock == 0 || header.journalInfoBlock >= header.totalBlocks ||
+        !volume->Read(place->infoOffset, infoBytes, sizeof infoBytes).Ok()) {
         state.text = "journal info block " + Grouped(header.journalInfoBlock) + " cannot be read";
         return state;
     }
-    const u32 flags = Be32(info + kInfoFlags);
-    const u64 offset = Be64(info + kInfoOffset);
-    state.offset = imageOffset + offset;
-    state.size = Be64(info + kInfoJournalSize);
-    if ((flags & kInfoElsewhere) != 0 || (flags & kInfoInVolume) == 0) {
+    const JournalInfo info = DecodeJournalInfo(infoBytes);
+    place->offset = info.offset;
+    place->size = info.size;
+    state.offset = imageOffset + info.offset;
+    state.size = info.size;
+    if ((info.flags & kJournalElsewhere) != 0 || (info.flags & kJournalInVolume) == 0) {
         state.text = "the journal lies on another device";
         return state;
     }
-    if ((flags & kInfoNeedsInit) != 0) {
-        state.readable = true;  // announced, never written: nothing waits in it
-        return state;
-    }
+    const std::string name = "journal header at " + Position(state.offset);
     u8 bytes[kJournalHeaderSize];
-    if (offset > volume->Size() || !volume->Read(offset, bytes, sizeof bytes).Ok()) {
-        state.text = "journal header at " + Position(state.offset) + " cannot be read";
+    if (info.offset > volume->Size() || !volume->Read(info.offset, bytes, sizeof bytes).Ok()) {
+        state.text = name + " cannot be read";
         return state;
     }
-    const Reader reader{bytes, Be32(bytes) != kJournalMagic};
-    const u64 start = reader.U64(kJournalStart);
-    const u64 end = reader.U64(kJournalEnd);
-    const u64 size = reader.U64(kJournalSize);
-    const u64 headerBytes = reader.U32(kJournalHeaderBytes);
-    if (reader.U32(0) != kJournalMagic || reader.U32(4) != kJournalEndian) {
-        state.text = "journal header at " + Position(state.offset) + " has no signature";
-    } else if (reader.U32(kJournalChecksum) !=
-               JournalChecksum(bytes, kJournalHeaderSize, kJournalChecksum)) {
-        state.text = "journal header at " + Position(state.offset) + " has a wrong checksum";
-    } else if (size != state.size || !IsPowerOfTwo(headerBytes) || headerBytes < kSectorSize ||
-               headerBytes >= size || start < headerBytes || start > size || end < headerBytes ||
-               end > size) {
-        state.text = "journal header at " + Position(state.offset) + " is out of range";
-    } else {
-        state.readable = true;
-        state.pendingBytes = end >= start ? end - start : end - start + (size - headerBytes);
-        state.empty = state.pendingBytes == 0;
+    const std::string stretch = StretchProblem(*place, header, volume->Size());
+    if (!stretch.empty()) {
+        state.text = "the journal at " + Position(state.offset) + " " + stretch;
+        return state;
     }
+    place->isSound = true;
+    place->header.size = place->size;
+    if ((info.flags & kJournalNeedsInit) != 0) {
+        place->needsInit = true;
+        state.readable = true;  // nothing waits in it
+        return state;
+    }
+    const std::string wrong = DecodeJournalHeader(bytes, info.size, &place->header);
+    if (!wrong.empty()) {
+        state.text = name + " " + wrong;
+        return state;
+    }
+    state.readable = true;
+    state.pendingBytes = place->header.Used();
+    state.empty = state.pendingBytes == 0;
     return state;
+}
+
+IoResult ReadRing(BlockDevice* volume, const JournalPlace& place, u64 position, void* target,
+                  u64 bytes) {
+    const u64 front = std::min(bytes, place.size - position);
+    u8* out = static_cast<u8*>(target);
+    IoResult result = volume->Read(place.offset + position, out, static_cast<std::size_t>(front));
+    if (result.Ok() && front < bytes) {
+        result = volume->Read(place.offset + place.header.sectorSize, out + front,
+                              static_cast<std::size_t>(bytes - front));
+    }
+    return result;
+}
+
+IoResult WriteRing(BlockDevice* volume, const JournalPlace& place, u64 position, const void* source,
+                   u64 bytes) {
+    const u64 front = std::min(bytes, place.size - position);
+    const u8* in = static_cast<const u8*>(source);
+    IoResult result = volume->Write(place.offset + position, in, static_cast<std::size_t>(front));
+    if (result.Ok() && front < bytes) {
+        result = volume->Write(place.offset + place.header.sectorSize, in + front,
+                               static_cast<std::size_t>(bytes - front));
+    }
+    return result;
+}
+
+IoResult WriteJournalHeader(BlockDevice* volume, const JournalPlace& place) {
+    u8 sector[kJournalSector];
+    const IoResult result = volume->Read(place.offset, sector, sizeof sector);
+    if (!result.Ok()) {
+        return result;
+    }
+    EncodeJournalHeader(place.header, sector);
+    return volume->Write(place.offset, sector, sizeof sector);
 }
 
 }  // namespace VELK

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "hfs/volume/convert.h"
+#include "hfs/volume/make_journal.h"
 #include "hfs/volume/volume_header.h"
 #include "hfs/volume/wire.h"
 
@@ -43,6 +44,13 @@ Problem CheckOptions(u64 size, const FormatOptions& options) {
                                 " units: 1 to 255 are possible",
                             "");
     }
+    if (options.journalSize != 0 &&
+        (options.journalSize < kSmallestNewJournal || options.journalSize > kLargestNewJournal)) {
+        return UsageProblem("a journal of " + Grouped(options.journalSize) +
+                                " bytes: " + Grouped(kSmallestNewJournal) + " to " +
+                                Grouped(kLargestNewJournal) + " are possible",
+                            "");
+    }
     if (size % kSectorSize != 0) {
         return UsageProblem("volume size " + Grouped(size) + " is not a multiple of 512", "");
     }
@@ -58,6 +66,7 @@ Problem CheckOptions(u64 size, const FormatOptions& options) {
 struct Plan {
     VolumeHeader header{};
     std::vector<u8> bitmap;  // whole blocks
+    JournalBlocks journal;
 };
 
 void MarkUsed(Plan* plan, u64 first, u64 end) {
@@ -94,11 +103,14 @@ Problem MakePlan(u64 size, const FormatOptions& options, Plan* plan) {
     const u64 lastFree = std::min<u64>((size - kAltHeaderFromEnd) / blockSize,
                                        header.totalBlocks == 0 ? 0 : header.totalBlocks - 1);
     const u64 bitmapBlocks = CeilDiv(CeilDiv(header.totalBlocks, 8), blockSize);
-    if (size < 4 * kHeaderOffset || firstFree + bitmapBlocks > lastFree) {
+    const u64 journalBlocks =
+        options.journalSize == 0 ? 0 : CeilDiv(options.journalSize, blockSize) + 1;
+    const u64 behind = firstFree + bitmapBlocks + journalBlocks;
+    if (size < 4 * kHeaderOffset || behind > lastFree) {
         return UsageProblem("a volume of " + Grouped(size) + " bytes is too small", "");
     }
     plan->bitmap.assign(static_cast<std::size_t>(bitmapBlocks * blockSize), 0);
-    MarkUsed(plan, 0, firstFree + bitmapBlocks);
+    MarkUsed(plan, 0, behind);
     MarkUsed(plan, lastFree, header.totalBlocks);
 
     header.allocationFile.logicalSize = bitmapBlocks * blockSize;
@@ -107,11 +119,16 @@ Problem MakePlan(u64 size, const FormatOptions& options, Plan* plan) {
     header.allocationFile.totalBlocks = static_cast<u32>(bitmapBlocks);
     header.allocationFile.extents[0] = {static_cast<u32>(firstFree),
                                         static_cast<u32>(bitmapBlocks)};
-    header.nextAllocation = static_cast<u32>(firstFree + bitmapBlocks);
+    header.nextAllocation = static_cast<u32>(behind);
+    plan->journal = {static_cast<u32>(firstFree + bitmapBlocks), static_cast<u32>(journalBlocks)};
+    if (journalBlocks != 0 && options.withRoot && !options.emptyTrees) {
+        header.fileCount = kJournalFiles;
+        header.nextCatalogId += kJournalFiles;
+    }
     return {};
 }
 
-Problem WritePlan(BlockDevice* device, const Plan& plan) {
+IoResult WritePlan(BlockDevice* device, const Plan& plan) {
     u8 bytes[kHeaderSize];
     EncodeHeader(plan.header, bytes);
     const u64 size = device->Size();
@@ -130,12 +147,7 @@ Problem WritePlan(BlockDevice* device, const Plan& plan) {
     if (result.Ok()) {
         result = device->Write(kHeaderOffset, bytes, sizeof bytes);
     }
-    if (result.Ok()) {
-        return {};
-    }
-    return FailureAt(
-        result.offset,
-        "write error at " + HexOffset(result.offset) + ": " + IoErrorText(result.error), "");
+    return result;
 }
 
 // Zeroes the blocks of a tree file on the device itself. They belong to nobody yet, so this need
@@ -203,6 +215,7 @@ int InsertCatalogRecord(CBTreeHfs* tree, u32 parentId, const std::u16string& nam
 int InsertRootFolder(CBTreeHfs* tree, const FormatOptions& options) {
     std::vector<u8> folder(kFolderRecordSize);
     StoreBe16(folder.data(), 1);  // folder
+    StoreBe32(folder.data() + 4, options.journalSize != 0 ? kJournalFiles : 0);
     StoreBe32(folder.data() + 8, kRootFolderId);
     for (const u32 dateAt : {12u, 16u, 20u, 24u}) {
         StoreBe32(folder.data() + dateAt, options.date);
@@ -219,7 +232,8 @@ int InsertRootFolder(CBTreeHfs* tree, const FormatOptions& options) {
     return status != kOk ? status : InsertCatalogRecord(tree, kRootFolderId, u"", thread);
 }
 
-Problem MakeTrees(BlockDevice* device, ImageVolume* volume, const FormatOptions& options) {
+Problem MakeTrees(BlockDevice* device, ImageVolume* volume, const FormatOptions& options,
+                  const JournalBlocks& journal) {
     std::vector<NewTree> trees = {{kExtentsFileId, options.extentsNodeSize, options.extentsSize}};
     if (options.withAttributes) {
         trees.push_back({kAttributesFileId, options.attributesNodeSize, options.attributesSize});
@@ -233,7 +247,15 @@ Problem MakeTrees(BlockDevice* device, ImageVolume* volume, const FormatOptions&
     if (!options.withRoot) {
         return {};
     }
-    const int status = InsertRootFolder(volume->OpenTree(kCatalogFileId), options);
+    CBTreeHfs* catalog = volume->OpenTree(kCatalogFileId);
+    int status = InsertRootFolder(catalog, options);
+    if (status == kOk && journal.count != 0) {
+        status = InsertJournalFiles(
+            journal, options.blockSize, options.date,
+            [&](u32 parentId, const std::u16string& name, const std::vector<u8>& record) {
+                return InsertCatalogRecord(catalog, parentId, name, record);
+            });
+    }
     if (status == kErrTooLarge || status == kErrInvalid) {
         return UsageProblem("catalog nodes of " + Grouped(options.catalogNodeSize) +
                                 " bytes cannot hold the root folder",
@@ -247,6 +269,45 @@ u32 SmallestNode(const FormatOptions& options) {
     return options.withAttributes ? std::min(smallest, options.attributesNodeSize) : smallest;
 }
 
+Problem WriteProblem(const IoResult& result) {
+    return result.Ok() ? Problem{}
+                       : FailureAt(result.offset,
+                                   "write error at " + HexOffset(result.offset) + ": " +
+                                       IoErrorText(result.error),
+                                   "");
+}
+
+std::unique_ptr<ImageVolume> MountNew(std::unique_ptr<BlockDevice> device,
+                                      const FormatOptions& options, Problem* problem) {
+    OpenOptions open;
+    open.access = Access::kWrite;
+    open.offset = 0;
+    open.mapBlockSize = options.mapBlockSize != 0 ? options.mapBlockSize : SmallestNode(options);
+    return ImageVolume::Open(std::move(device), open, nullptr, problem);
+}
+
+// Mounts `device`, whose bytes are those of `home`, and makes what the plan left out.
+std::unique_ptr<ImageVolume> MountAndFill(std::unique_ptr<BlockDevice> device, BlockDevice* home,
+                                          const FormatOptions& options, const Plan& plan,
+                                          Problem* problem) {
+    std::unique_ptr<ImageVolume> volume = MountNew(std::move(device), options, problem);
+    if (!volume) {
+        return nullptr;
+    }
+    if (!options.emptyTrees) {
+        *problem = MakeTrees(home, volume.get(), options, plan.journal);
+    }
+    if (!*problem) {
+        const int status = volume->Commit(0);
+        if (status != kOk) {
+            *problem = volume->LastIoProblem()
+                           ? volume->LastIoProblem()
+                           : Failure("cannot write the volume: " + StatusText(status), "");
+        }
+    }
+    return *problem ? nullptr : std::move(volume);
+}
+
 }  // namespace
 
 std::unique_ptr<ImageVolume> MakeVolume(std::unique_ptr<BlockDevice> device,
@@ -258,32 +319,21 @@ std::unique_ptr<ImageVolume> MakeVolume(std::unique_ptr<BlockDevice> device,
         *problem = MakePlan(home->Size(), options, &plan);
     }
     if (!*problem) {
-        *problem = WritePlan(home, plan);
+        *problem = WriteProblem(WritePlan(home, plan));
     }
     if (*problem) {
         return nullptr;
     }
-    OpenOptions open;
-    open.access = Access::kWrite;
-    open.offset = 0;
-    open.mapBlockSize = options.mapBlockSize != 0 ? options.mapBlockSize : SmallestNode(options);
-    std::unique_ptr<ImageVolume> volume =
-        ImageVolume::Open(std::move(device), open, nullptr, problem);
-    if (!volume) {
+    if (plan.journal.count == 0) {
+        return MountAndFill(std::move(device), home, options, plan, problem);
+    }
+    // The journal is announced when everything it will protect is there.
+    auto view = std::make_unique<SliceDevice>(home, 0, home->Size());
+    if (!MountAndFill(std::move(view), home, options, plan, problem)) {
         return nullptr;
     }
-    if (!options.emptyTrees) {
-        *problem = MakeTrees(home, volume.get(), options);
-    }
-    if (!*problem) {
-        const int status = volume->Commit(0);
-        if (status != kOk) {
-            *problem = volume->LastIoProblem()
-                           ? volume->LastIoProblem()
-                           : Failure("cannot write the volume: " + StatusText(status), "");
-        }
-    }
-    return *problem ? nullptr : std::move(volume);
+    *problem = WriteProblem(StartJournal(home, plan.journal, options.blockSize));
+    return *problem ? nullptr : MountNew(std::move(device), options, problem);
 }
 
 std::unique_ptr<ImageVolume> MakeMemoryVolume(u64 size, const FormatOptions& options,

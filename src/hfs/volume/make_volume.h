@@ -20,7 +20,8 @@ struct FormatOptions {
     u64 catalogSize = 0;  // bytes; 0: by the clump size
     u64 extentsSize = 0;
     u64 attributesSize = 0;
-    u32 clumpSize = 0;  // of the tree forks, bytes; 0: by the volume's size
+    u64 journalSize = 0;  // bytes, rounded up to blocks; 0: no journal
+    u32 clumpSize = 0;    // of the tree forks, bytes; 0: by the volume's size
     bool withAttributes = true;
     bool withRoot = true;  // the records of the root folder; without them the catalog is empty
     bool emptyTrees = false;  // forks of size 0 and no records: trees are left to the caller

@@ -13,6 +13,8 @@ public:
     virtual ~CommitSink() = default;
     // On failure `home` may hold a part of the changes; the sink says what that means.
     virtual IoResult Carry(const OverlayDevice& staged, BlockDevice* home, u64* bytesWritten);
+    // After the last Carry: leaves `home` as a volume nobody uses. Writes nothing after a failure.
+    virtual IoResult Finish(BlockDevice*) { return {}; }
 
 protected:
     // Writes the staged sectors in rising order, but none of [skip, skip + skipBytes). No sync.
@@ -40,6 +42,7 @@ public:
         return result;
     }
     void Abort() { staged_.Drop(); }
+    IoResult Finish() { return sink_ != nullptr ? sink_->Finish(home_) : IoResult{}; }
     u64 BytesWritten() const { return bytesWritten_; }
 
 private:

@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <cstring>
 
+#include "hfs/volume/journal_sink.h"
 #include "hfs/volume/volume_state.h"
 #include "hfs/volume/wire.h"
 
@@ -11,7 +12,8 @@ namespace VELK {
 
 namespace {
 
-constexpr u32 kOwnCode = 0x74726566;  // "tref": last mounted version written by this layer
+// "tref": last mounted version written by this layer where it keeps no journal.
+constexpr u32 kOwnCode = 0x74726566;
 
 void CopyRuns(const HfsRuns& runs, std::vector<HfsRuns::Run>* copy) {
     copy->clear();
@@ -57,6 +59,7 @@ void ImageVolume::State::TakeSnapshot() {
         trees[i].isNew = false;
     }
     bitmapChanges.clear();
+    grantedBytes = 0;
 }
 
 // A fork that is mapped for the first time still lies where the last commit left it: nothing can be
@@ -98,7 +101,7 @@ int ImageVolume::State::WriteHeaders() {
         return kOk;
     }
     if (!wasWritten) {
-        header.lastMountedVersion = kOwnCode;
+        header.lastMountedVersion = journalSink != nullptr ? kKeeperCode : kOwnCode;
         header.writeCount += 1;
         EncodeHeader(header, bytes);
     }
@@ -144,19 +147,43 @@ int ImageVolume::State::Commit(unsigned long mode) {
         Restore();
         return status;
     }
-    if (!transaction->IsEmpty()) {
-        const IoResult result = transaction->Commit();
-        if (!result.Ok()) {
-            // A part may have reached the image. The staged changes stay in front of it, so that
-            // what is read goes on agreeing with itself.
-            isWritable = false;
-            return IoStatus({result.error, result.offset - std::min(result.offset, place.offset)},
-                            0, 0, true);
-        }
-        wasWritten = true;
+    status = transaction->IsEmpty() ? kOk : CarryOver();
+    if (status == kOk) {
+        TakeSnapshot();
     }
-    TakeSnapshot();
-    return kOk;
+    return status;
+}
+
+int ImageVolume::State::CarryOver() {
+    const IoResult result = transaction->Commit();
+    if (result.Ok()) {
+        wasWritten = true;
+        return kOk;
+    }
+    if (result.error == kIoTooLarge) {
+        lastIo =
+            FailureAt(journal.offset,
+                      "the changes take " + Grouped(journalSink->Needed()) +
+                          " bytes of the journal, which holds " + Grouped(journalSink->Largest()),
+                      "commit more often");
+        lastIo.status = kErrVolumeJournal;
+        Restore();
+        return kErrVolumeJournal;
+    }
+    // A part may have reached the image. The staged changes stay in front of it, so that what is
+    // read goes on agreeing with itself.
+    isWritable = false;
+    return IoStatus({result.error, result.offset - std::min(result.offset, place.offset)}, 0, 0,
+                    true);
+}
+
+int ImageVolume::State::Close() {
+    isWritable = false;
+    const IoResult result = transaction ? transaction->Finish() : IoResult{};
+    return result.Ok()
+               ? kOk
+               : IoStatus({result.error, result.offset - std::min(result.offset, place.offset)}, 0,
+                          0, true);
 }
 
 void ImageVolume::State::Restore() {
@@ -164,6 +191,7 @@ void ImageVolume::State::Restore() {
         return;
     }
     transaction->Abort();
+    grantedBytes = 0;
     while (!bitmapChanges.empty()) {
         const BitmapChange change = bitmapChanges.back();
         bitmapChanges.pop_back();

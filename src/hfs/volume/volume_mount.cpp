@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <bit>
 
-#include "hfs/volume/journal_state.h"
 #include "hfs/volume/volume_state.h"
 #include "hfs/volume/wire.h"
 #include "hfs/volume/write_checks.h"
@@ -159,51 +158,60 @@ void FillFileSystem(ImageVolume::State* state) {
 
 // Stacks the devices: image, changes in memory, open transaction, the volume's part of it.
 void StackDevices(ImageVolume::State* state) {
-    BlockDevice* home = state->image.get();
-    if (state->options.access == Access::kOverlay) {
-        state->overlay = std::make_unique<OverlayDevice>(home);
-        home = state->overlay.get();
+    if (state->options.access == Access::kOverlay && !state->overlay) {
+        state->overlay = std::make_unique<OverlayDevice>(state->image.get());
     }
-    BlockDevice* top = home;
+    BlockDevice* top = state->Base();
     if (state->options.access != Access::kReadOnly) {
-        state->transaction = std::make_unique<Transaction>(home);
-        if (state->options.access == Access::kWrite) {
-            state->sink = std::make_unique<HeaderLastSink>(state->place.offset + kHeaderOffset);
-            state->transaction->SetSink(state->sink.get());
-        }
+        state->transaction = std::make_unique<Transaction>(top);
         top = state->transaction->Staged();
     }
     state->volume = std::make_unique<SliceDevice>(top, state->place.offset, state->volumeBytes);
 }
 
-Problem ReadHeaders(ImageVolume::State* state) {
-    const VolumePlace& place = state->place;
+// Where the volume ends: with its blocks, or a little behind them where its partition does.
+u64 MeasureVolume(const ImageVolume::State& state) {
+    const u64 blocksBytes = u64{state.header.totalBlocks} * state.header.blockSize;
+    if (state.place.size < blocksBytes + state.header.blockSize) {
+        return std::max(state.place.size, blocksBytes);
+    }
+    const u64 start = state.place.offset;
+    return state.alternateOffset &&
+                   *state.alternateOffset >= start + blocksBytes - kAltHeaderFromEnd
+               ? *state.alternateOffset + kAltHeaderFromEnd - start
+               : blocksBytes;
+}
+
+}  // namespace
+
+Problem ImageVolume::State::ReadHeaders() {
     const u64 mainOffset = place.offset + kHeaderOffset;
-    const bool hasMain = ReadHeaderAt(state->image.get(), mainOffset, &state->header);
+    const bool hasMain = ReadHeaderAt(Base(), mainOffset, &header);
     const Problem mainProblem =
-        hasMain ? CheckHeader(state->header, mainOffset)
+        hasMain ? CheckHeader(header, mainOffset)
                 : FailureAt(mainOffset, "volume header at " + Position(mainOffset) + ": unreadable",
                             "try --backup-header");
-    state->alternateOffset = FindAlternate(
-        state->image.get(), place, mainProblem ? nullptr : &state->header, &state->alternate);
-    if (!state->options.backupHeader) {
+    alternateOffset = FindAlternate(Base(), place, mainProblem ? nullptr : &header, &alternate);
+    if (!options.backupHeader) {
         return mainProblem;
     }
-    if (!state->alternateOffset) {
+    if (!alternateOffset) {
         return FailureAt(place.offset + place.size - kAltHeaderFromEnd,
                          "alternate volume header at " +
                              Position(place.offset + place.size - kAltHeaderFromEnd) +
                              ": there is none",
                          "");
     }
-    state->header = state->alternate;
-    state->usedBackup = true;
-    Problem problem = CheckHeader(state->header, *state->alternateOffset);
+    header = alternate;
+    usedBackup = true;
+    Problem problem = CheckHeader(header, *alternateOffset);
     problem.advice.clear();
     return problem;
 }
 
-}  // namespace
+bool ImageVolume::State::IsCutShort() const {
+    return place.offset + u64{header.totalBlocks} * header.blockSize > image->Size();
+}
 
 Problem ImageVolume::State::Mount(VolumeScan* scan) {
     PlaceOptions where;
@@ -214,53 +222,55 @@ Problem ImageVolume::State::Mount(VolumeScan* scan) {
         return problem;
     }
     place = scan->place;
-    if (Problem problem = ReadHeaders(this)) {
+    if (Problem problem = ReadHeaders()) {
         return problem;
     }
-    const u64 blocksBytes = u64{header.totalBlocks} * header.blockSize;
-    volumeBytes = std::max(place.size, blocksBytes);
-    if (place.size >= blocksBytes + header.blockSize) {
-        volumeBytes =
-            alternateOffset && *alternateOffset >= place.offset + blocksBytes - kAltHeaderFromEnd
-                ? *alternateOffset + kAltHeaderFromEnd - place.offset
-                : blocksBytes;
+    volumeBytes = MeasureVolume(*this);
+    if (Problem problem = SettleJournal()) {
+        return problem;
     }
     StackDevices(this);
     FillFileSystem(this);
     if (Problem problem = ChooseMapBlock(this)) {
         return problem;
     }
-    if (place.offset + blocksBytes > image->Size()) {
-        isTruncated = true;
-        notes.push_back(TruncatedNote(image->Size(), place, place.offset + blocksBytes));
+    isTruncated = IsCutShort();
+    if (isTruncated) {
+        notes.insert(notes.begin(),
+                     TruncatedNote(image->Size(), place,
+                                   place.offset + u64{header.totalBlocks} * header.blockSize));
     }
-    const std::size_t notesBefore = notes.size();
+    return options.access == Access::kReadOnly ? FinishReading() : PrepareWriting();
+}
+
+Problem ImageVolume::State::FinishReading() {
     NoteOverlaps(header, &notes);
-    const bool overlapping = notes.size() != notesBefore;
-    journal = ReadJournalState(volume.get(), header, place.offset);
-    if (journal.present && !journal.empty) {
-        notes.push_back(
-            FailureAt(journal.offset,
-                      "the journal holds transactions (" + Grouped(journal.pendingBytes) + " B)",
-                      "read as the volume stands without them"));
-    }
-    isWritable = options.access != Access::kReadOnly;
+    return {};
+}
+
+Problem ImageVolume::State::PrepareWriting() {
+    std::vector<Problem> overlaps;
+    NoteOverlaps(header, &overlaps);
+    isWritable = true;
     if (options.access == Access::kWrite) {
         if (Problem problem = CheckMayWrite(header, journal, options.force)) {
             return problem;
         }
-        if (overlapping || isTruncated) {
-            Problem problem = notes.front();
+        if (!overlaps.empty() || isTruncated) {
+            Problem problem = isTruncated ? notes.front() : overlaps.front();
             problem.advice = "the volume can only be read";
             return problem;
         }
-    }
-    if (isWritable) {
-        if (Problem problem = LoadBitmap()) {
+        if (Problem problem = ChooseSink()) {
             return problem;
         }
-        TakeSnapshot();
+        InstallJournal();
     }
+    notes.insert(notes.end(), overlaps.begin(), overlaps.end());
+    if (Problem problem = LoadBitmap()) {
+        return problem;
+    }
+    TakeSnapshot();
     return {};
 }
 

@@ -125,6 +125,12 @@ Problem ImageVolume::State::LoadBitmap() {
     MarkOwned(0, static_cast<u32>(CeilDiv(kHeaderOffset + kHeaderSize, fs.allocBlockSize)));
     MarkOwned(static_cast<u32>(std::min<u64>(end / fs.allocBlockSize, fs.totalBlocks - 1)),
               ~u32{0});
+    if (journalPlace.isSound) {
+        const u64 behind = journalPlace.offset + journalPlace.size;
+        const u32 first = static_cast<u32>(journalPlace.offset / fs.allocBlockSize);
+        MarkOwned(header.journalInfoBlock, 1);
+        MarkOwned(first, static_cast<u32>(CeilDiv(behind, fs.allocBlockSize)) - first);
+    }
     for (const u32 fileId : kSpecialFileIds) {
         for (const HfsExtent& extent : fs.ForkOf(fileId)->extents) {
             MarkOwned(extent.startBlock, extent.blockCount);

@@ -20,6 +20,7 @@ struct alignas(16) MapBuffer {
     u64 offset;  // of the block in its fork
     u32 fileId;
     u32 size;
+    bool isOpen;  // for change, where there is a journal
 
     u8* Bytes() { return reinterpret_cast<u8*>(this + 1); }
 };
@@ -121,7 +122,7 @@ int LendBlock(ImageVolume::State* state, HfsRuns* runs, u32 fileId, u64 offset, 
     if (memory == nullptr) {
         return kErrNoMemory;
     }
-    MapBuffer* buffer = new (memory) MapBuffer{runs, offset, fileId, size};
+    MapBuffer* buffer = new (memory) MapBuffer{runs, offset, fileId, size, false};
     int status = 0;
     if (noRead) {
         // Nothing is read, but a block that lies nowhere is found out here and not when it is
@@ -164,6 +165,7 @@ int DirtyMeta(void* self, CFileSystemHfs*, buffer_head* bh) {
                                          buffer->Bytes(), buffer->size);
     if (status == 0) {
         state->handedOver += 1;
+        buffer->isOpen = false;
     }
     return status;
 }
@@ -185,10 +187,38 @@ void Release(void*, buffer_head* bh, int) {
 void BeginModify(void*, buffer_head*) {}
 void EndModify(void*, buffer_head*) {}
 
+// A block that changes will take its own bytes in the journal and, at worst, an entry's share of a
+// list. That it is counted here lets the caller commit before a transaction grows too large.
+int OpenForChange(void* self, buffer_head* bh) {
+    MapBuffer* buffer = BufferOf(bh);
+    if (buffer->isOpen) {
+        return kOk;
+    }
+    const int status = StateOf(self)->Grant(buffer->size);
+    buffer->isOpen = status == kOk;
+    return status;
+}
+
+constexpr HfsJournalOps kJournalOps = {OpenForChange, OpenForChange};
 constexpr HfsVolumeOps kVolumeOps = {Map, DirtyMeta, Zero, Resize};
 constexpr HfsCacheOps kCacheOps = {Release, BeginModify, EndModify};
 
 }  // namespace
+
+int ImageVolume::State::Grant(u32 bytes) {
+    if (!isWritable) {
+        return kErrVolumeReadOnly;
+    }
+    grantedBytes += bytes;
+    return kOk;
+}
+
+void ImageVolume::State::InstallJournal() {
+    if (journalSink != nullptr) {
+        fs.journal.ops = &kJournalOps;
+        fs.journal.self = this;
+    }
+}
 
 void ImageVolume::State::InstallServices() {
     fs.service.ops = &kVolumeOps;

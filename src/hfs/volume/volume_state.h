@@ -8,9 +8,12 @@
 
 #include "hfs/volume/fork_map.h"
 #include "hfs/volume/image_volume.h"
+#include "hfs/volume/journal_state.h"
 #include "hfs/volume/transaction.h"
 
 namespace VELK {
+
+class JournalSink;
 
 // One record of the extents tree that continues a fork past its eight extents.
 struct OverflowRecord {
@@ -70,8 +73,9 @@ void EndReservation(CBTreeHfs* tree);
 struct ImageVolume::State {
     // --- image, from the host's file up to the volume's bytes ------------------------------------
     std::unique_ptr<BlockDevice> image;
-    std::unique_ptr<OverlayDevice> overlay;    // Access::kOverlay
+    std::unique_ptr<OverlayDevice> overlay;    // Access::kOverlay, or a journal in memory
     std::unique_ptr<CommitSink> sink;          // Access::kWrite
+    JournalSink* journalSink = nullptr;        // the sink, where it keeps a journal
     std::unique_ptr<Transaction> transaction;  // unless read-only
     std::unique_ptr<SliceDevice> volume;       // what reads and writes go through
     OpenOptions options;
@@ -83,6 +87,7 @@ struct ImageVolume::State {
     std::vector<Problem> notes;
     Problem lastIo;
     JournalState journal;
+    JournalPlace journalPlace;
     VolumeHeader header{};
     VolumeHeader alternate{};
     std::optional<u64> alternateOffset;  // of the image
@@ -94,6 +99,7 @@ struct ImageVolume::State {
     std::array<TreeSlot, kTreeCount> trees;
     std::array<SpecialFile, 5> files;
     u64 handedOver = 0;
+    u64 grantedBytes = 0;  // of map blocks opened for change since the last commit
     u64 trimFloor = 0;
     u32 unmarkedBlocks = 0;  // in use, but free by the allocation file
 
@@ -109,6 +115,18 @@ struct ImageVolume::State {
 
     // volume_mount.cpp
     Problem Mount(VolumeScan* scan);
+    Problem ReadHeaders();
+    Problem FinishReading();
+    Problem PrepareWriting();
+    bool IsCutShort() const;
+    BlockDevice* Base() { return overlay ? static_cast<BlockDevice*>(overlay.get()) : image.get(); }
+
+    // volume_journal.cpp
+    Problem SettleJournal();
+    bool MayReplay();
+    Problem Replay();
+    Problem FinishReplay(u32 transactions, bool onMedium, bool isComplete);
+    Problem ChooseSink();
 
     // volume_trees.cpp
     TreeSlot* Slot(u32 fileId);
@@ -120,6 +138,8 @@ struct ImageVolume::State {
 
     // volume_service.cpp
     void InstallServices();
+    void InstallJournal();
+    int Grant(u32 bytes);
     int ReadBytes(const HfsRuns& runs, u32 fileId, u64 offset, void* target, u64 bytes);
     int WriteBytes(const HfsRuns& runs, u32 fileId, u64 offset, const void* source, u64 bytes);
     int ZeroBytes(const HfsRuns& runs, u32 fileId, u64 offset, u64 bytes);
@@ -138,7 +158,9 @@ struct ImageVolume::State {
     int SettleOverflow(u32 fileId);
     int WriteBitmap();
     int WriteHeaders();
+    int CarryOver();
     int Commit(unsigned long mode);
+    int Close();
     void Restore();
 };
 

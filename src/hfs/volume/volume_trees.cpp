@@ -117,6 +117,7 @@ ImageVolume::State::State() {
 }
 
 ImageVolume::State::~State() {
+    Close();
     for (TreeSlot& slot : trees) {
         EndReservation(slot.Get());
         slot.Get()->Dtor();
