@@ -79,17 +79,14 @@ Way LookUp(Session* session, u32 fileId, const SearchKey& key) {
 }
 
 void PrintWay(Output* out, const CBTreeHfs& tree, const Way& way) {
-    std::size_t width = 0;
     for (const Step& step : way.steps) {
-        width = std::max(width, step.key.size());
-    }
-    for (const Step& step : way.steps) {
-        const std::string what =
-            step.level > 1 ? fmt::format("-> node {}", step.child) : step.record;
-        std::string line =
-            fmt::format("level {}  node {}  record {} of {}   {:<{}}  {}", step.level, step.node,
-                        step.index, step.count, step.key, step.level > 1 ? 0 : width, what);
-        line.erase(line.find_last_not_of(' ') + 1);
+        std::string line = fmt::format("level {}  node {}  record {} of {}   {}", step.level,
+                                       step.node, step.index, step.count, step.key);
+        if (step.level > 1) {
+            line += fmt::format(" -> node {}", step.child);
+        } else if (!step.record.empty()) {
+            line += "    " + step.record;
+        }
         out->Print("{}\n", EscapedText(line));
     }
     out->Print("position {}, depth {}, {} read\n", (u64{way.leaf} << tree.nodeShift) + way.index,

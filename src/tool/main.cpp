@@ -17,6 +17,8 @@ extern const Command kInfoCommand;
 extern const Command kCheckCommand;
 extern const Command kLsCommand;
 extern const Command kFindCommand;
+extern const Command kDumpCommand;
+extern const Command kNodeCommand;
 extern const Command kStatsCommand;
 extern const Command kPlotCommand;
 extern const Command kBadBlocksCommand;
@@ -35,6 +37,8 @@ const Command* const kCommands[] = {
     &kCheckCommand,
     &kLsCommand,
     &kFindCommand,
+    &kDumpCommand,
+    &kNodeCommand,
     &kStatsCommand,
     &kPlotCommand,
     &kBadBlocksCommand,

@@ -1,6 +1,9 @@
 // Nodes and records through the engine's node operations and accessors.
 #include "tool/node_reader.h"
 
+#include <fmt/format.h>
+
+#include <algorithm>
 #include <cstring>
 
 #include "tool/errors.h"
@@ -185,6 +188,120 @@ void WalkChain(Session* session, u32 fileId, u32 first, bool keepGoing,
         }
         if (!visit(node)) {
             return;
+        }
+    }
+}
+
+std::vector<u32> LevelStarts(Session* session, u32 fileId) {
+    CBTreeHfs* tree = session->Tree(fileId);
+    std::vector<u32> first;
+    HeldNode node(tree);
+    u32 number = tree->header.rootNode;
+    for (u32 level = tree->header.treeDepth; level >= 1; --level) {
+        int status = number < tree->header.totalNodes ? node.Open(number) : kErrCorrupt;
+        const s8 kind = level == 1 ? kBTLeafNode : kBTIndexNode;
+        std::string detail;
+        if (status == 0 && (node.Kind() != kind || node.Height() != level)) {
+            status = kErrCorrupt;
+            detail = fmt::format("no {} node of level {}", NodeKindName(kind), level);
+        }
+        unsigned child = 0;
+        if (status == 0 && level > 1) {
+            status = node.Get()->GetChildNodeNum(&tree->header, 0, &child);
+        }
+        if (status != 0) {
+            ThrowProblem(session->Image(), session->ProblemOf(fileId, number, status, detail));
+        }
+        first.push_back(number);
+        number = child;
+    }
+    return first;
+}
+
+namespace {
+
+// A node that cannot be read ends a walk, or is named and passed over.
+void Unreadable(Session* session, u32 fileId, u32 node, int status, bool keepGoing) {
+    const Problem problem = session->ProblemOf(fileId, node, status, "cannot be read");
+    if (!keepGoing) {
+        ThrowProblem(session->Image(), problem);
+    }
+    session->NotePassedOver(problem);
+}
+
+void VisitByDepth(Session* session, u32 fileId, bool keepGoing,
+                  const std::function<bool(const HeldNode&)>& visit) {
+    CBTreeHfs* tree = session->Tree(fileId);
+    std::vector<bool> seen(tree->header.totalNodes);
+    std::vector<u32> waiting;
+    if (tree->header.rootNode != 0) {
+        waiting.push_back(tree->header.rootNode);
+    }
+    HeldNode node(tree);
+    while (!waiting.empty()) {
+        const u32 number = waiting.back();
+        waiting.pop_back();
+        const bool exists = number < tree->header.totalNodes;
+        const int status = exists && !seen[number] ? node.Open(number) : kErrCorrupt;
+        if (status != 0) {
+            Unreadable(session, fileId, number, status, keepGoing);
+            continue;
+        }
+        seen[number] = true;
+        if (!visit(node)) {
+            return;
+        }
+        if (node.Kind() != kBTIndexNode) {
+            continue;
+        }
+        for (u32 i = node.RecordCount(); i > 0; --i) {
+            unsigned child = 0;
+            const int bad =
+                node.Get()->GetChildNodeNum(&tree->header, static_cast<int>(i - 1), &child);
+            if (bad != 0) {
+                Unreadable(session, fileId, number, bad, keepGoing);
+            } else {
+                waiting.push_back(child);
+            }
+        }
+    }
+}
+
+}  // namespace
+
+void VisitNodes(Session* session, u32 fileId, NodeOrder order, bool keepGoing,
+                const std::function<bool(const HeldNode&)>& visit) {
+    CBTreeHfs* tree = session->Tree(fileId);
+    bool goesOn = true;
+    const auto visitAndTell = [&](const HeldNode& node) {
+        goesOn = visit(node);
+        return goesOn;
+    };
+    switch (order) {
+        case NodeOrder::kLeaf:
+            WalkChain(session, fileId, tree->header.firstLeafNode, keepGoing, visitAndTell);
+            break;
+        case NodeOrder::kBreadth:
+            for (const u32 first : LevelStarts(session, fileId)) {
+                if (goesOn) {
+                    WalkChain(session, fileId, first, keepGoing, visitAndTell);
+                }
+            }
+            break;
+        case NodeOrder::kDepth:
+            VisitByDepth(session, fileId, keepGoing, visit);
+            break;
+        case NodeOrder::kDisk: {
+            HeldNode node(tree);
+            for (u32 number = 0; number < tree->header.totalNodes && goesOn; ++number) {
+                const int status = node.Open(number);
+                if (status != 0) {
+                    Unreadable(session, fileId, number, status, keepGoing);
+                } else {
+                    goesOn = visit(node);
+                }
+            }
+            break;
         }
     }
 }

@@ -81,6 +81,20 @@ MapBit FindMapBit(CBTreeHfs* tree, u32 nodeNum);
 // Numbers of the map nodes, in order; stops at one that is none.
 std::vector<u32> MapNodes(CBTreeHfs* tree);
 
+// Number of the first node of each level, from the root down to the leaves. Throws ToolError.
+std::vector<u32> LevelStarts(Session* session, u32 fileId);
+
+// Orders in which the nodes of a tree can be visited.
+enum class NodeOrder {
+    kLeaf,     // leaves along their chain
+    kBreadth,  // level by level, from the root down
+    kDepth,    // each node before its children
+    kDisk,     // every node of the file, in use or not
+};
+// Calls `visit` for each node in that order; false from it ends the walk. No node is visited twice.
+void VisitNodes(Session* session, u32 fileId, NodeOrder order, bool keepGoing,
+                const std::function<bool(const HeldNode&)>& visit);
+
 // Calls `visit` for each node of the level that begins with node `first`, along its links. A chain
 // longer than the tree is a ring. Throws ToolError unless damage is passed over; false from `visit`
 // ends the walk.

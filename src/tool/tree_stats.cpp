@@ -13,33 +13,6 @@ namespace VELK::tool {
 
 namespace {
 
-// Number of the first node of each level, from the root down to the leaves.
-std::vector<u32> FirstNodes(Session* session, u32 fileId) {
-    CBTreeHfs* tree = session->Tree(fileId);
-    std::vector<u32> first;
-    HeldNode node(tree);
-    u32 number = tree->header.rootNode;
-    for (u32 level = tree->header.treeDepth; level >= 1; --level) {
-        int status = number < tree->header.totalNodes ? node.Open(number) : kErrCorrupt;
-        const s8 kind = level == 1 ? kBTLeafNode : kBTIndexNode;
-        std::string detail;
-        if (status == 0 && (node.Kind() != kind || node.Height() != level)) {
-            status = kErrCorrupt;
-            detail = fmt::format("no {} node of level {}", NodeKindName(kind), level);
-        }
-        unsigned child = 0;
-        if (status == 0 && level > 1) {
-            status = node.Get()->GetChildNodeNum(&tree->header, 0, &child);
-        }
-        if (status != 0) {
-            ThrowProblem(session->Image(), session->ProblemOf(fileId, number, status, detail));
-        }
-        first.push_back(number);
-        number = child;
-    }
-    return first;
-}
-
 void CountRecords(u32 fileId, const HeldNode& node, RecordReader* reader,
                   std::map<std::string, u64>* kinds) {
     NodeRecord record;
@@ -123,7 +96,7 @@ TreeStats CollectStats(Session* session, u32 fileId, bool keepGoing, Progress* p
     std::map<std::string, u64> kinds;
     u64 done = 0;
     u32 level = tree->header.treeDepth;
-    for (const u32 first : FirstNodes(session, fileId)) {
+    for (const u32 first : LevelStarts(session, fileId)) {
         LevelStats row;
         row.level = level--;
         u32 last = 0;
