@@ -112,8 +112,10 @@ SearchKey::SearchKey(const CBTreeHfs* tree, const BTreeKey* key, unsigned id)
     // A search key out of line is asserted by the comparator each time.
     byParentFirst_ =
         compare_ == CompareCatKeysCaseIns && reinterpret_cast<std::uintptr_t>(key) % 4 == 0;
-    if (byParentFirst_ && GetHost16(key->length + kCatKeyNameLength) != 0) {
-        firstUnit_ = FoldPlain(GetHost16(key->length + kCatKeyName));
+    // The whole key, not the two bytes of its length field.
+    const u8* bytes = reinterpret_cast<const u8*>(key);
+    if (byParentFirst_ && GetHost16(bytes + kCatKeyNameLength) != 0) {
+        firstUnit_ = FoldPlain(GetHost16(bytes + kCatKeyName));
     }
 }
 
@@ -135,7 +137,7 @@ inline int SearchKey::CompareFirstUnits(const u8* nodeKey) const {
 
 inline int SearchKey::Compare(const BTreeKey* nodeKey) const {
     if (byParentFirst_) {
-        const int order = CompareFirstUnits(nodeKey->length);
+        const int order = CompareFirstUnits(reinterpret_cast<const u8*>(nodeKey));
         if (order != 0) {
             return order;
         }
