@@ -38,10 +38,11 @@ public:
         for (u32 folder = 0; folder < kFolders; ++folder) {
             const u32 id = nextId_++;
             folderIds_.push_back(id);
-            Insert(kRoot, FolderName(folder),
-                   fmt::format("folder{{id:{},valence:{},created:2026-10-29T00:00:00Z}}", id,
-                               kFilesPerFolder),
-                   id, 1);
+            Insert(
+                kRoot, FolderName(folder),
+                fmt::format("folder{{id:{},valence:{},mode:040755,created:2026-10-29T00:00:00Z}}",
+                            id, kFilesPerFolder),
+                id, 1);
         }
         SetValence(1, "Demo", kFolders);
         // The files come folder by folder in turn, as many writers at once would bring them.
@@ -49,7 +50,8 @@ public:
             for (u32 folder = 0; folder < kFolders; ++folder) {
                 const u32 id = nextId_++;
                 Insert(folderIds_[folder], FileName(folder, file),
-                       fmt::format("file{{id:{},created:2026-10-29T00:00:00Z}}", id), id, 2);
+                       fmt::format("file{{id:{},mode:0100644,created:2026-10-29T00:00:00Z}}", id),
+                       id, 2);
                 figures_->inserted += 1;
             }
         }

@@ -11,7 +11,8 @@ namespace {
 
 constexpr std::string_view kStyle = R"(<style>
 .page{fill:#ffffff}.ink{fill:#1c2330}.soft{fill:#5a6475}.rule{stroke:#b8c0cc;stroke-width:1}
-.free{fill:#eef0f3;stroke:#d5dae1}.header{fill:#1c2330;stroke:#1c2330}.map{fill:#8a4fbf;stroke:#5d2e87}
+.free{fill:#eef0f3;stroke:#d5dae1}.header{fill:#1c2330;stroke:#1c2330}
+.map{fill:#8a4fbf;stroke:#5d2e87}
 .index{stroke:#b3500a;stroke-width:1.5}.leaf{stroke:none}.bad{fill:#d4213d;stroke:#7d0d20}
 .f0{fill:#deebf7}.f1{fill:#cfe1f2}.f2{fill:#b9d5ea}.f3{fill:#9dc6e0}.f4{fill:#7db4d6}
 .f5{fill:#5c9fca}.f6{fill:#4089bd}.f7{fill:#2a72ad}.f8{fill:#175b97}.f9{fill:#08427a}
@@ -20,7 +21,8 @@ constexpr std::string_view kStyle = R"(<style>
 .title{font-size:16px;font-weight:600}.small{font-size:11px}.label{font-size:12px}
 @media (prefers-color-scheme:dark){
 .page{fill:#12161d}.ink{fill:#e6eaf0}.soft{fill:#9aa5b5}.rule{stroke:#3a4452}
-.free{fill:#1d232d;stroke:#2c3542}.header{fill:#e6eaf0;stroke:#e6eaf0}.map{fill:#b78be0;stroke:#e0c8f5}
+.free{fill:#1d232d;stroke:#2c3542}.header{fill:#e6eaf0;stroke:#e6eaf0}
+.map{fill:#b78be0;stroke:#e0c8f5}
 .f0{fill:#1b3350}.f1{fill:#1e3f63}.f2{fill:#224c77}.f3{fill:#285a8b}.f4{fill:#30699f}
 .f5{fill:#3c7ab2}.f6{fill:#4f8ec4}.f7{fill:#6aa5d6}.f8{fill:#8dbde5}.f9{fill:#b8d8f3}
 .index{stroke:#f2a65e}.dot{fill:#6aa5d6}.bar{fill:#4f8ec4}}
