@@ -1,10 +1,12 @@
-// A whole image of any bytes: found, mounted, its trees opened and walked, changed in an overlay.
-// Whatever it holds there is an answer or a problem in words; nothing leaks and everything ends.
+// A whole image of any bytes: checked; found, mounted, its trees opened and walked, changed in an
+// overlay. Whatever it holds there is an answer or a problem in words; the checker asks for no byte
+// that is not there; nothing leaks and everything ends.
 //
 // Input: how to open it, what to do, then the image.
 #include <cstring>
 
 #include "fuzz.h"
+#include "hfs/check/check.h"
 #include "hfs/volume/image_volume.h"
 #include "keys.h"
 
@@ -52,10 +54,39 @@ void Change(ImageVolume* volume, CBTreeHfs* tree, u8 what) {
     volume->Commit(0);
 }
 
+int ReadBytes(void* self, u64 offset, void* target, std::size_t size) {
+    const auto* bytes = static_cast<const test::Bytes*>(self);
+    FUZZ_CHECK(offset <= bytes->size() && size <= bytes->size() - offset);
+    std::memcpy(target, bytes->data() + offset, size);
+    return 0;
+}
+
+// The checker on the same bytes as if the volume began with them.
+void Check(test::Bytes bytes, u8 how) {
+    CheckOptions options;
+    options.full = (how & 8) != 0;
+    options.quick = (how & 4) != 0;
+    options.keepGoing = (how & 2) != 0;
+    options.maxErrors = 20;
+    u32 told = 0;
+    CheckSink sink;
+    sink.self = &told;
+    sink.finding = [](void* self, const CheckFinding& finding) {
+        FUZZ_CHECK(!finding.text.empty() && !CheckFindingLine(finding).empty());
+        *static_cast<u32*>(self) += 1;
+    };
+    const CheckSummary summary = CheckVolume({&bytes, ReadBytes, bytes.size(), 0}, options, sink);
+    FUZZ_CHECK(told + summary.untold == summary.errors + summary.warnings + summary.infos);
+    FUZZ_CHECK(summary.stageCount <= kCheckStages);
+}
+
 void Run(fuzz::Input* input) {
     const u8 how = input->U8();
     const u8 what = input->U8();
     const test::Bytes bytes = input->Rest(kMostBytes);
+    if (!bytes.empty()) {
+        Check(bytes, how);
+    }
     auto device = std::make_unique<MemoryDevice>(bytes.size());
     FUZZ_CHECK(device->Write(0, bytes.data(), bytes.size()).Ok());
     OpenOptions options;

@@ -104,6 +104,7 @@ void Images() {
         const std::string name = caseSensitive ? "sensitive" : "plain";
         Write("image", name + "-read", {0, 0}, image);
         Write("image", name + "-change", {1, 1}, image);
+        Write("image", name + "-full", {8, 0}, image);
     }
 }
 
