@@ -2,6 +2,8 @@
 // to write.
 #include <gtest/gtest.h>
 
+#include <cstring>
+
 #include "bench.h"
 
 namespace VELK::test {
@@ -359,6 +361,40 @@ TEST_F(ReadLevelTest, ANodeWithANegativeCountIsRevived) {
     EXPECT_EQ(bench_->ReadLevel(1, 3, &path_), kOk);
     EXPECT_EQ(node->refCount, 1);
     EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// Two lookups in a tree whose separators disagree with its leaves: each goes its own way down.
+TEST_P(FindDamage, EachLookupFollowsTheSeparators) {
+    const Bytes key = NthDiskKey(4, 1);
+    for (u32 i = 0; i < key.size(); ++i) {
+        image_.Patch8(kIndex, 14 + 24 + i, key[i]);  // record 1 belongs to the second leaf now
+    }
+    bench_.Open(image_);
+    const HostKey first = NthHostKey(4, 0);
+    const HostKey second = NthHostKey(4, 1);
+    EXPECT_EQ(bench_->FindRecord(first.Get(), first.id, nullptr, 0, nullptr, nullptr), kOk);
+    EXPECT_EQ(bench_->FindRecord(second.Get(), second.id, nullptr, 0, nullptr, nullptr),
+              kErrNotFound);
+    EXPECT_EQ(bench_->findData.path[1].node->nodeNum, 2u);
+}
+
+TEST_P(FindDamage, ASecondLookupMeetsTheDamageOfAnIndexNode) {
+    bench_.Open(image_);
+    const HostKey first = NthHostKey(4, 0);
+    const HostKey second = NthHostKey(4, 1);
+    bool found = false;
+    EXPECT_EQ(bench_->FindEntry(first, first.id, &bench_->findData, &found, nullptr, nullptr,
+                                nullptr, nullptr),
+              kOk);
+    HfsNode* index = bench_->findData.path[2].node;
+    ASSERT_EQ(bench_->SetDirty(index, 14 + 24), kOk);
+    std::memset(index->bufs[0].data + 14 + 24, 0xFF, 2);
+    EXPECT_EQ(bench_->FindEntry(second, second.id, &bench_->findData, &found, nullptr, nullptr,
+                                nullptr, nullptr),
+              kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Reported(kReasonNode, 9006), Reported(kErrCorrupt, 3005)}));
+    bench_->findData.ClearPath();
 }
 
 }  // namespace

@@ -151,6 +151,7 @@ u32 FirstNonZeroWord(const u8* data, u32 blockSize) {
 // blocks already zero are neither journalled nor written, and sets the free-space offset.
 void EmptyExisting(CBTreeHfs* tree, HfsNode* node) {
     const BTHeaderMem& header = tree->header;
+    tree->pathVersion += 1;
     bool madeDirty = false;
     bool granted = true;
     for (u32 i = 0; i < header.blocksPerNode; ++i) {
@@ -226,6 +227,7 @@ int LoadNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
     if (makeEmpty) {
         EmptyExisting(tree, node);
     } else {
+        tree->isAllOwn = false;
         HFS_ASSERT(wasEmpty || GetBe16(TailOf(tree->header, node)) == kEmptyTail, 2671);
     }
     *out = node;

@@ -103,15 +103,14 @@ bool HasQuickKeys(const BTHeaderMem& header, const SearchKey& key, u32 count) {
 
 SearchKey::SearchKey(const CBTreeHfs* tree, const BTreeKey* key, unsigned id)
     : key_(key), compare_(tree->compareKeys), id_(id) {
+    // A search key out of line is asserted by the comparator each time it is asked.
     KeyShape shape;
-    if (!ShapeOf(compare_, &shape)) {
+    if (reinterpret_cast<std::uintptr_t>(key) % 4 != 0 || !ShapeOf(compare_, &shape)) {
         return;
     }
     fixed_ = shape.fixed;
     nameLengthAt_ = shape.nameLength;
-    // A search key out of line is asserted by the comparator each time.
-    byParentFirst_ =
-        compare_ == CompareCatKeysCaseIns && reinterpret_cast<std::uintptr_t>(key) % 4 == 0;
+    byParentFirst_ = compare_ == CompareCatKeysCaseIns;
     // The whole key, not the two bytes of its length field.
     const u8* bytes = reinterpret_cast<const u8*>(key);
     if (byParentFirst_ && GetHost16(bytes + kCatKeyNameLength) != 0) {

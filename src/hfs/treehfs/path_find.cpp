@@ -96,14 +96,29 @@ int Descend(CBTreeHfs* tree, const SearchKey& key, HfsFindData* path, bool* foun
     }
 }
 
-// Lookups often come in key order. When the tree's own path still leads where it did, and the key
-// lies between the first and the last key of its leaf, or past the last one of the last leaf, the
-// way down is the one the path holds. Counters move as they would on the way down.
+// Whether going down once more would end where the tree's own path stands, without a word. Only
+// nodes this engine built are known to be in order: in a damaged tree the way down can lead to
+// another leaf, or to an error. A node with more references than expected is asserted.
+bool PathStillLeads(const CBTreeHfs* tree) {
+    const HfsFindData& path = tree->findData;
+    const u32 depth = tree->header.treeDepth;
+    if (!tree->isAllOwn || path.leadsAsOf != tree->pathVersion || depth > kMaxPathDepth) {
+        return false;
+    }
+    for (u32 level = 1; level <= depth; ++level) {
+        if (path.path[level].node == nullptr || path.path[level].node->refCount > 3) {
+            return false;
+        }
+    }
+    return path.path[depth].node->nodeNum == tree->header.rootNode;
+}
+
+// Records are often inserted in key order. When the tree's own path still leads where it did, and
+// the key lies between the first and the last key of its leaf, or past the last one of the last
+// leaf, the way down is the one the path holds. Counters move as they would on the way down.
 bool FindOnSameLeaf(CBTreeHfs* tree, const SearchKey& key, SearchResult* result) {
     HfsFindData* path = &tree->findData;
-    const HfsNode* leaf = path->path[1].node;
-    if (path->leadsAsOf != tree->pathVersion || leaf == nullptr ||
-        !SearchInside(tree, leaf, key, result)) {
+    if (!PathStillLeads(tree) || !SearchInside(tree, path->path[1].node, key, result)) {
         return false;
     }
     path->searchCount += 1;

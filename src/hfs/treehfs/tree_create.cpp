@@ -93,6 +93,7 @@ int CBTreeHfs::Create(unsigned newNodeShift, unsigned char, const unsigned long 
         HFS_ASSERT(isUndone, 5393);
         return status;
     }
+    isAllOwn = true;
     velk_heap_free(scratch);
     scratch = nullptr;
     return EnsureScratch(this);

@@ -1,0 +1,86 @@
+// Lookups one after the other in a tree this object created: the shortcut for keys of the leaf just
+// visited says and counts what the whole way down would.
+#include <gtest/gtest.h>
+
+#include <cstring>
+
+#include "bench.h"
+
+namespace VELK::test {
+namespace {
+
+class FindAgain : public ::testing::Test {
+protected:
+    FindAgain() : bench_(Blocks(512)) {
+        bench_->compareKeys = CompareCatKeysCaseIns;
+        bench_->header.maxKeyLength = kCatMaxKeyLength;
+        bench_->header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
+        const unsigned long long size = 64 * 512;
+        EXPECT_EQ(bench_->Create(9, 0, &size), kOk);
+        for (u32 n = 0; n < 40; ++n) {
+            const HostKey key = NthHostKey(4, n);
+            const Bytes data = Pattern(24, n);
+            EXPECT_EQ(bench_->InsertRecord(key.Get(), key.id, data.data(), 24), kOk);
+        }
+        EXPECT_EQ(bench_->header.treeDepth, 2);
+        bench_.Forget();
+    }
+    ~FindAgain() override { bench_.capture.Take(); }
+
+    int Find(u32 n) { return FindAt(NthHostKey(4, n).Get(), NthHostKey(4, n).id); }
+    int FindAt(const BTreeKey* key, u32 id) {
+        return bench_->FindRecord(key, id, nullptr, 0, nullptr, nullptr);
+    }
+
+    Bench bench_;
+};
+
+TEST_F(FindAgain, CountersMoveAsOnTheWayDown) {
+    const u32 hits = bench_->hitCount;
+    const u32 reads = bench_->readCount;
+    const u32 searches = bench_->findData.searchCount;
+    for (const u32 n : {0u, 0u, 1u, 39u, 39u, 0u}) {
+        EXPECT_EQ(Find(n), kOk);
+        EXPECT_EQ(bench_->findData.path[1].node->refCount, 1);
+    }
+    EXPECT_EQ(bench_->hitCount, hits + 12);
+    EXPECT_EQ(bench_->readCount, reads);
+    EXPECT_EQ(bench_->findData.searchCount, searches + 6);
+}
+
+// The comparator asserts at each probe, so the number of probes shows.
+TEST_F(FindAgain, AKeyOutOfLineIsAssertedAsOften) {
+    const HostKey key = NthHostKey(4, 1);
+    alignas(8) u8 room[sizeof key.bytes + 2];
+    std::memcpy(room + 2, key.bytes, sizeof key.bytes);
+    const BTreeKey* shifted = reinterpret_cast<const BTreeKey*>(room + 2);
+    EXPECT_EQ(FindAt(shifted, key.id), kOk);
+    const Events first = bench_.capture.Take();
+    EXPECT_EQ(FindAt(shifted, key.id), kOk);
+    EXPECT_EQ(bench_.capture.Take(), first);
+    EXPECT_GE(first.size(), 2u);
+    EXPECT_EQ(first[0], Asserted(70));
+}
+
+TEST_F(FindAgain, ANodeHeldByTooManyIsAssertedEachTime) {
+    EXPECT_EQ(Find(1), kOk);
+    HfsNode* leaf = bench_->findData.path[1].node;
+    leaf->refCount += 3;
+    for (int round = 0; round < 2; ++round) {
+        EXPECT_EQ(Find(1), kOk);
+        EXPECT_EQ(bench_.capture.Take(), Events{Asserted(2610)});
+    }
+    leaf->refCount -= 3;
+}
+
+TEST_F(FindAgain, AnIndexNodeEmptiedMeanwhileIsMet) {
+    EXPECT_EQ(Find(1), kOk);
+    ASSERT_EQ(bench_->Zero(bench_->findData.path[2].node), kOk);
+    EXPECT_EQ(Find(1), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Reported(kReasonTree, 2916), Reported(kErrCorrupt, 2982),
+                      Reported(kErrCorrupt, 3126)}));
+}
+
+}  // namespace
+}  // namespace VELK::test
