@@ -131,6 +131,19 @@ TEST_F(DirtyTest, ARefusedLaterBlockKeepsTheEarlierOnesAndLists) {
     EXPECT_TRUE(LedgerHolds(*bench_.tree, 1));
 }
 
+// The order of the list is the order of writing; a change that was refused does not alter it.
+TEST_F(DirtyTest, ARefusalKeepsTheOrderOfTheList) {
+    HfsNode* other = nullptr;
+    ASSERT_EQ(bench_->GetINode(2, &other, false), kOk);
+    bench_->SetDirty(node_, 0);
+    bench_->SetDirty(other, 0);
+    for (const bool zero : {false, true}) {
+        bench_.faults.Fail(Call::kWriteAccess, 1);
+        EXPECT_EQ(zero ? bench_->Zero(node_) : bench_->SetDirty(node_, 1024), kFaultStatus);
+        EXPECT_EQ(Listed(), (std::vector<u32>{1, 2}));
+    }
+}
+
 TEST_F(DirtyTest, ARefusedBlockOfAListedNodeLeavesItListed) {
     bench_->SetDirty(node_, 0);
     bench_.faults.Fail(Call::kWriteAccess, 1);

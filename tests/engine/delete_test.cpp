@@ -300,6 +300,31 @@ TEST_F(DeleteAtPath, LevelsOutsideThePathAreRefused) {
                   {Reported(kReasonInvalid, 9267)});
 }
 
+// A lookup leaves a node it rejected in the path.
+TEST_F(DeleteAtPath, NodeOfAnotherLevelIsRefused) {
+    for (const bool asIndex : {false, true}) {
+        TreeImage image = Image(512, 3, 0);
+        image.Patch8(1, asIndex ? 8 : 9, asIndex ? 0 : 2);
+        Open(image);
+        EXPECT_EQ(Tree().ReadLevel(1, 1, nullptr), kErrCorrupt);
+        tree_->capture.Take();
+        Tree().findData.level = 1;
+        ExpectRefused(Tree().DeleteTree(1, &Tree().findData), kErrInvalid,
+                      {Reported(kReasonInvalid, 9267)});
+        EXPECT_TRUE(ModifiedNodes(Tree()).empty());
+    }
+}
+
+// Giving the old root back stores the header, and clears the mark; the collapse sets it again.
+TEST_F(DeleteAtPath, CollapseOfTheRootLeavesTheHeaderDirty) {
+    Open(Image(512, 4, 3));
+    Find(3);
+    EXPECT_EQ(Tree().DeleteTree(1, &Tree().findData), kOk);
+    EXPECT_EQ(Tree().header.treeDepth, 1);
+    EXPECT_EQ(Tree().header.rootNode, 1u);
+    EXPECT_TRUE(Tree().IsDirty());
+}
+
 TEST_F(DeleteAtPath, LookupThatFailsIsReported) {
     TreeImage image = Image(512, 9, 3);
     image.Patch32(0, kHeadRootNode, 0);

@@ -154,6 +154,13 @@ TEST_F(RestoreTest, AHeaderOfAnotherNodeSizeIsNotTakenOver) {
     }
 }
 
+// Nothing was unsaved, but memory and disk disagree now: the volume has to learn of it.
+TEST_F(RestoreTest, AHeaderOfAnotherNodeSizeLeavesTheTreeDirty) {
+    Put16(&bench_.volume.Disk(4), 32, 2048);
+    bench_->RestoreModifiedNodes();
+    EXPECT_TRUE(bench_->IsDirty());
+}
+
 TEST_F(RestoreTest, AnOpenReservationIsAsserted) {
     bench_->reservationOpen = true;
     bench_->RestoreModifiedNodes();

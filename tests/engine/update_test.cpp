@@ -188,5 +188,19 @@ TEST_P(Update, RefusedAccessIsReportedAndNothingWritten) {
 
 INSTANTIATE_GEOMETRIES(Update, ChangeGeometries);
 
+// A lookup leaves a leaf it rejected in the path.
+TEST(UpdateInPlace, LeafOfTheWrongHeightIsRefused) {
+    TreeImage image = Image(512, 3, 24);
+    image.Patch8(1, 9, 2);
+    TreeOnVolume tree(image, 512);
+    EXPECT_EQ(tree->ReadLevel(1, 1, nullptr), kErrCorrupt);
+    tree.capture.Take();
+    tree->findData.level = 1;
+    const Bytes data = Pattern(24, 9);
+    EXPECT_EQ(tree->UpdateKeyAndRecord(nullptr, data.data()), kErrInvalid);
+    EXPECT_EQ(tree.capture.Take(), Events{Reported(kReasonInvalid, 9214)});
+    EXPECT_TRUE(ModifiedNodes(*tree).empty());
+}
+
 }  // namespace
 }  // namespace VELK::test

@@ -25,7 +25,15 @@ int MarkBlock(CBTreeHfs* tree, HfsBcbBuf* block) {
     return kOk;
 }
 
-// Marks blocks first .. last. A refusal part way leaves the node listed if any block is dirty.
+// After a refusal part way: a node with a dirty block is listed, one that was listed keeps its
+// place.
+void ListIfDirty(CBTreeHfs* tree, HfsNode* node) {
+    if (node->modifiedLink.IsEmpty() && HasDirtyBlock(&tree->header, node)) {
+        node->modifiedLink.LinkTail(&tree->modifiedList);
+    }
+}
+
+// Marks blocks first .. last.
 int MarkBlocks(CBTreeHfs* tree, HfsNode* node, u32 first, u32 last) {
     if (last >= tree->header.blocksPerNode) {
         return Fail(kErrCorrupt, kReasonNode, 779);
@@ -33,9 +41,7 @@ int MarkBlocks(CBTreeHfs* tree, HfsNode* node, u32 first, u32 last) {
     for (u32 i = first; i <= last; ++i) {
         const int status = MarkBlock(tree, &node->bufs[i]);
         if (status != kOk) {
-            if (HasDirtyBlock(&tree->header, node)) {
-                node->modifiedLink.MoveTail(&tree->modifiedList);
-            }
+            ListIfDirty(tree, node);
             Report(status, 790);
             return status;
         }
@@ -91,12 +97,11 @@ int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset) {
 }
 
 int CBTreeHfs::Zero(HfsNode* node) {
+    pathVersion += 1;
     for (u32 i = 0; i < header.blocksPerNode; ++i) {
         const int status = MarkBlock(this, &node->bufs[i]);
         if (status != kOk) {
-            if (HasDirtyBlock(&header, node)) {
-                node->modifiedLink.MoveTail(&modifiedList);
-            }
+            ListIfDirty(this, node);
             Report(status, 816);
             return status;
         }

@@ -6,6 +6,7 @@
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/path_check.h"
+#include "hfs/treehfs/path_level.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/separator.h"
 
@@ -120,24 +121,30 @@ int CheckRoot(CBTreeHfs* tree, HfsFindLevel* entry) {
         HFS_TRACE("Tree %x is empty\n", tree->fileId);
         return kOk;
     }
+    const u32 rootBefore = hdr->rootNode;
     while (NumRecords(entry->node) == 1 && Kind(entry->node) == kBTIndexNode) {
         const int status = CollapseOnce(tree, entry->node, entry);
         if (status != 0) {
             return status;
         }
     }
+    if (hdr->rootNode != rootBefore) {
+        tree->isDirty = true;  // giving the old root back may have stored the header and cleared it
+    }
     return kOk;
 }
 
-// Whether the path's record at `level` can be deleted: it is there, and if the parent has to
-// change, the levels above lead here.
+// Whether the path's record at `level` can be deleted: it is there, in a node of that level, and if
+// the parent has to change, the levels above lead here.
 bool CanDeleteAt(const CBTreeHfs* tree, const HfsFindData* path, int level) {
     if (level < 1 || static_cast<u32>(level) > kMaxPathDepth) {
         return false;
     }
     const HfsFindLevel& entry = path->path[level];
     if (entry.node == nullptr || entry.index < 0 ||
-        static_cast<u32>(entry.index) >= NumRecords(entry.node)) {
+        static_cast<u32>(entry.index) >= NumRecords(entry.node) ||
+        Height(entry.node) != static_cast<u32>(level) ||
+        Kind(entry.node) != (level == 1 ? kBTLeafNode : kBTIndexNode)) {
         return false;
     }
     const bool reachesParent = entry.index == 0 || level == tree->header.treeDepth;
@@ -215,7 +222,7 @@ int CBTreeHfs::DeleteRecord(const void* key, unsigned keyLength, bool usePath) {
     } else if (!findData.valid) {
         return Fail(kErrInvalid, kReasonInvalid, 5132);
     }
-    if (!StandsOnRecord(&findData) || !CanDeleteAt(this, &findData, 1)) {
+    if (!StandsOnLeaf(&findData, 0) || !CanDeleteAt(this, &findData, 1)) {
         return Fail(kErrInvalid, kReasonInvalid, 9268);
     }
     if (header.leafRecords == 0) {

@@ -5,12 +5,6 @@
 
 namespace VELK {
 
-bool StandsOnRecord(const HfsFindData* path) {
-    const HfsFindLevel& leaf = path->path[1];
-    return path->level == 1 && leaf.node != nullptr && IsLeaf(leaf.node) && leaf.index >= 0 &&
-           static_cast<u32>(leaf.index) < NumRecords(leaf.node);
-}
-
 bool ParentsLeadHere(const CBTreeHfs* tree, const HfsFindData* path, u32 level) {
     const BTHeaderMem* hdr = &tree->header;
     const u32 depth = hdr->treeDepth;

@@ -7,9 +7,6 @@
 
 namespace VELK {
 
-// Whether the path's position is a record of a leaf it holds.
-bool StandsOnRecord(const HfsFindData* path);
-
 // Whether every level above `level`, up to the root, holds an index node whose record at the
 // path's index points at the node held one level below. REQUIRES: 1 <= level, node held there.
 // A record that cannot be read is reported by its accessor.

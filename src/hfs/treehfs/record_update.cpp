@@ -1,7 +1,7 @@
 // Overwrites the data of the record at the tree's own position. The record keeps its size, its
 // place and its key; no header field changes.
 #include "hfs/treehfs/node_desc.h"
-#include "hfs/treehfs/path_check.h"
+#include "hfs/treehfs/path_level.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/scratch.h"
 #include "hfs/treehfs/slots.h"
@@ -38,7 +38,7 @@ int WriteData(CBTreeHfs* tree, HfsNode* node, const NodeKey& record, u32 offset,
 // Marks modified the record's data. Nothing is written when that fails.
 int CBTreeHfs::UpdateKeyAndRecord(const void* key, const void* data) {
     HFS_ASSERT(key != nullptr || data != nullptr, 3548);
-    if (!StandsOnRecord(&findData)) {
+    if (!StandsOnLeaf(&findData, 0)) {
         return Fail(kErrInvalid, kReasonInvalid, 9214);
     }
     HfsNode* node = findData.path[findData.level].node;

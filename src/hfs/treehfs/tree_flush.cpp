@@ -99,6 +99,7 @@ void CBTreeHfs::RestoreModifiedNodes() {
         header = before;
         btreeType = typeBefore;
         keyCompareType = compareBefore;
+        isDirty = true;
         return;
     }
     RepairAttributes(this);
