@@ -49,7 +49,8 @@ class Plan:
             text = json.dumps(name)
             dates = f"created:{DATE}"
             if is_folder:
-                record = f"folder{{id:{item_id},valence:{children.get(item_id, 0)},mode:040755,{dates}}}"
+                valence = children.get(item_id, 0)
+                record = f"folder{{id:{item_id},valence:{valence},mode:040755,{dates}}}"
             else:
                 record = f"file{{id:{item_id},mode:0100644,{dates}}}"
             kind = "thread" if is_folder else "thread-file"

@@ -39,7 +39,8 @@ def seven_zip(image):
 
 def fshfsinfo(image):
     output = run("fshfsinfo", "-H", image).stdout.decode("utf-8")
-    return {composed(line[1:]) for line in output.splitlines() if line.startswith("/") and line != "/"}
+    return {composed(line[1:]) for line in output.splitlines()
+            if line.startswith("/") and line != "/"}
 
 
 
