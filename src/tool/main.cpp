@@ -26,6 +26,7 @@ extern const Command kFormatCommand;
 extern const Command kCreateTreeCommand;
 extern const Command kDemoCommand;
 extern const Command kApplyCommand;
+extern const Command kShellCommand;
 extern const Command kExportCommand;
 extern const Command kImportCommand;
 extern const Command kCompletionCommand;
@@ -46,6 +47,7 @@ const Command* const kCommands[] = {
     &kCreateTreeCommand,
     &kDemoCommand,
     &kApplyCommand,
+    &kShellCommand,
     &kExportCommand,
     &kImportCommand,
     &kCompletionCommand,

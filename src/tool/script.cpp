@@ -63,7 +63,7 @@ public:
         const u32 file = static_cast<u32>(script_->files.size());
         script_->files.push_back(name);
         const std::size_t outerOpen = open_.size();
-        u32 number = 0;
+        u32 number = depth == 0 ? context_->firstLine - 1 : 0;
         for (std::size_t at = 0; at < all.size();) {
             const std::size_t end = std::min(all.find('\n', at), all.size());
             ++number;

@@ -110,6 +110,7 @@ struct ScriptProblem {
 struct ScriptContext {
     u32 fileId = kCatalogFileId;  // the tree that keys belong to before the first `use`
     bool canInject = true;        // `fail` is allowed
+    u32 firstLine = 1;            // number of the text's first line
     bool inputIsScript = false;   // standard input is the script: no data can come from it
 };
 

@@ -31,7 +31,13 @@ void ExplainPlace(const std::string& image, const VolumeScan& scan) {
     }
 }
 
+ImageVolume* g_lentVolume = nullptr;
+
 }  // namespace
+
+void LendVolume(ImageVolume* volume) {
+    g_lentVolume = volume;
+}
 
 Session::Session(const Invocation& call, Truncated truncated)
     : image_(call.image), quiet_(call.quiet), json_(call.json) {
@@ -39,11 +45,16 @@ Session::Session(const Invocation& call, Truncated truncated)
         TraceEngine();
     }
     Problem problem;
-    volume_ = ImageVolume::OpenFile(image_, OptionsOf(call), &scan_, &problem);
+    if (g_lentVolume != nullptr && image_ == kLentImage) {
+        volume_ = g_lentVolume;
+        return;
+    }
+    owned_ = ImageVolume::OpenFile(image_, OptionsOf(call), &scan_, &problem);
+    volume_ = owned_.get();
     if (call.verbose) {
         ExplainPlace(image_, scan_);
     }
-    if (!volume_) {
+    if (volume_ == nullptr) {
         ThrowProblem(image_, problem);
     }
     if (volume_->IsTruncated() && truncated == Truncated::kRefuse && !call.keepGoing) {
@@ -77,6 +88,9 @@ CBTreeHfs* Session::Tree(u32 fileId) {
 }
 
 u64 Session::ReadableBytes() const {
+    if (owned_ == nullptr) {
+        return volume_->Fs()->volumeSize;  // lent: all of it is there
+    }
     u64 imageBytes = 0;
     const int fd = open(image_.c_str(), O_RDONLY | O_CLOEXEC);
     if (fd >= 0) {

@@ -10,6 +10,11 @@
 
 namespace VELK::tool {
 
+// While a volume is lent, a session on the image named kLentImage looks at it as it stands, changes
+// in memory included. Null ends the loan.
+constexpr char kLentImage[] = "(this volume)";
+void LendVolume(ImageVolume* volume);
+
 class Session {
 public:
     // What a command can do with an image that was cut short.
@@ -49,7 +54,8 @@ private:
     bool quiet_;
     bool json_;
     VolumeScan scan_;
-    std::unique_ptr<ImageVolume> volume_;
+    std::unique_ptr<ImageVolume> owned_;
+    ImageVolume* volume_ = nullptr;  // owned or lent
     u64 passedOver_ = 0;
 };
 

@@ -11,8 +11,9 @@
 
 namespace VELK::tool {
 // The table of the program, as far as these tests need it.
-extern const Command kApplyCommand, kExportCommand, kImportCommand;
-const Command* const kCommands[] = {&kApplyCommand, &kExportCommand, &kImportCommand, nullptr};
+extern const Command kApplyCommand, kExportCommand, kImportCommand, kLsCommand, kShellCommand;
+const Command* const kCommands[] = {&kApplyCommand, &kExportCommand, &kImportCommand,
+                                    &kLsCommand,    &kShellCommand,  nullptr};
 
 const Command* FindCommand(const std::string& name) {
     for (const Command* const* command = kCommands; *command != nullptr; ++command) {
@@ -73,6 +74,14 @@ Transcript Apply(const std::string& volume, const std::string& script,
             text->replace(at, path.size(), "s.tr");
         }
     }
+    return result;
+}
+
+Transcript Shell(const std::string& input, const std::vector<std::string>& arguments) {
+    const std::string path = TempFile("shell.in", input);
+    EXPECT_NE(std::freopen(path.c_str(), "rb", stdin), nullptr);
+    Transcript result = RunTool("shell", arguments);
+    std::remove(path.c_str());
     return result;
 }
 

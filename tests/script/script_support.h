@@ -18,7 +18,9 @@ Transcript RunTool(const std::string& command, const std::vector<std::string>& a
 // treehfs apply --new VOLUME [options] SCRIPT, the script given as text; its file is s.tr.
 Transcript Apply(const std::string& volume, const std::string& script,
                  const std::vector<std::string>& options);
-// The same on a volume of 1 MiB with 512-byte nodes; only the lines, without the summary.
+// treehfs shell ARGUMENTS with `input` as its standard input.
+Transcript Shell(const std::string& input, const std::vector<std::string>& arguments);
+// Apply on a volume of 1 MiB with 512-byte nodes; only the lines, without the summary.
 std::string Lines(const std::string& script);
 
 // A path in the folder of temporary files, and a file there.
