@@ -10,6 +10,7 @@ add_executable(change_tests
   insert_test.cpp
   record_delete_test.cpp
   record_insert_test.cpp
+  split_limits_test.cpp
   update_test.cpp
 )
 target_link_libraries(change_tests PRIVATE test_support treehfs velk_host GTest::gtest_main)
