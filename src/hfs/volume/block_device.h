@@ -5,6 +5,8 @@
 // is open then gives an error instead of a fault.
 #pragma once
 
+#include <sys/types.h>
+
 #include <cstddef>
 #include <memory>
 #include <string>
@@ -50,7 +52,16 @@ public:
     virtual IoResult Sync() = 0;
 };
 
-// A regular file or a block device of the host.
+// The calls a FileDevice makes of the host for every transfer.
+struct HostCalls {
+    ssize_t (*read)(int handle, void* target, std::size_t bytes, off_t offset);
+    ssize_t (*write)(int handle, const void* source, std::size_t bytes, off_t offset);
+    int (*sync)(int handle);
+};
+
+// A regular file or a block device of the host. The first sync that fails is final: the host may
+// have dropped what it could not write, and a later sync would say nothing of it. From then on the
+// device takes no writes. Neither does a file that has become shorter than it was.
 class FileDevice : public BlockDevice {
 public:
     enum class Mode { kRead, kReadWrite, kCreate };
@@ -68,14 +79,20 @@ public:
     IoResult Write(u64 offset, const void* source, std::size_t bytes) override;
     IoResult Sync() override;
     int Handle() const { return handle_; }
+    // Puts other calls in the place of the host's, for tests of failures; null: the host's own.
+    static void SetHostCalls(const HostCalls* calls);
 
 private:
     FileDevice(int handle, u64 size, bool writable)
         : handle_(handle), size_(size), writable_(writable) {}
+    bool HasShrunk();
 
     int handle_;
     u64 size_;
     bool writable_;
+    bool isFile_ = false;
+    bool hasShrunk_ = false;
+    int syncError_ = 0;  // of the first sync that failed
 };
 
 // Bytes in memory; untouched stretches take none.

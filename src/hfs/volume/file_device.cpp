@@ -33,6 +33,9 @@ std::string IoErrorText(int error) {
 
 namespace {
 
+constexpr HostCalls kHostCalls = {pread, pwrite, fsync};
+const HostCalls* g_calls = &kHostCalls;
+
 Problem CannotOpen(int error) {
     if (error == ENOENT) {
         return Failure("cannot open: no such file", "");
@@ -147,12 +150,11 @@ std::unique_ptr<FileDevice> FileDevice::Open(const std::string& path, Mode mode,
         return nullptr;
     }
     std::unique_ptr<FileDevice> device(new FileDevice(handle, 0, mode != Mode::kRead));
-    bool isFile = false;
-    if (!SizeOf(handle, &device->size_, &isFile, problem)) {
+    if (!SizeOf(handle, &device->size_, &device->isFile_, problem)) {
         return nullptr;
     }
     *problem = mode != Mode::kRead ? Claim(handle) : Problem{};
-    if (!*problem && mode == Mode::kCreate && isFile) {
+    if (!*problem && mode == Mode::kCreate && device->isFile_) {
         *problem = SetFreshSize(handle, size);
         device->size_ = size;
     }
@@ -167,7 +169,7 @@ IoResult FileDevice::Read(u64 offset, void* target, std::size_t bytes) {
     u8* out = static_cast<u8*>(target);
     const u64 start = offset;
     while (bytes > 0) {
-        const ssize_t count = pread(handle_, out, bytes, static_cast<off_t>(offset));
+        const ssize_t count = g_calls->read(handle_, out, bytes, static_cast<off_t>(offset));
         if (count < 0) {
             if (errno == EINTR) {
                 continue;
@@ -175,6 +177,7 @@ IoResult FileDevice::Read(u64 offset, void* target, std::size_t bytes) {
             return {errno, offset};
         }
         if (count == 0) {
+            HasShrunk();
             return {kIoPastEnd, start};
         }
         out += count;
@@ -188,12 +191,16 @@ IoResult FileDevice::Write(u64 offset, const void* source, std::size_t bytes) {
     if (!writable_) {
         return {kIoReadOnly, offset};
     }
-    if (offset > size_ || bytes > size_ - offset) {
+    if (syncError_ != 0) {
+        return {syncError_, offset};
+    }
+    // A write behind the end of a file would make it longer again, with a hole of zeros.
+    if (offset > size_ || bytes > size_ - offset || HasShrunk()) {
         return {kIoPastEnd, offset};
     }
     const u8* in = static_cast<const u8*>(source);
     while (bytes > 0) {
-        const ssize_t count = pwrite(handle_, in, bytes, static_cast<off_t>(offset));
+        const ssize_t count = g_calls->write(handle_, in, bytes, static_cast<off_t>(offset));
         if (count < 0) {
             if (errno == EINTR) {
                 continue;
@@ -211,10 +218,35 @@ IoResult FileDevice::Write(u64 offset, const void* source, std::size_t bytes) {
 }
 
 IoResult FileDevice::Sync() {
-    if (writable_ && fsync(handle_) != 0) {
-        return {errno, 0};
+    if (!writable_) {
+        return {};
     }
-    return {};
+    if (syncError_ != 0) {
+        return {syncError_, 0};
+    }
+    int status = 0;
+    do {
+        status = g_calls->sync(handle_);
+    } while (status != 0 && errno == EINTR);
+    if (status != 0) {
+        syncError_ = errno;
+        return {syncError_, 0};
+    }
+    return HasShrunk() ? IoResult{kIoPastEnd, size_} : IoResult{};
+}
+
+// What is left of a file is the size from now on, for those who tell where it ends.
+bool FileDevice::HasShrunk() {
+    struct stat info;
+    if (isFile_ && fstat(handle_, &info) == 0 && static_cast<u64>(info.st_size) < size_) {
+        size_ = static_cast<u64>(info.st_size);
+        hasShrunk_ = true;
+    }
+    return hasShrunk_;
+}
+
+void FileDevice::SetHostCalls(const HostCalls* calls) {
+    g_calls = calls != nullptr ? calls : &kHostCalls;
 }
 
 }  // namespace VELK

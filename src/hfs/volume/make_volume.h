@@ -23,7 +23,7 @@ struct FormatOptions {
     u64 journalSize = 0;  // bytes, rounded up to blocks; 0: no journal
     u32 clumpSize = 0;    // of the tree forks, bytes; 0: by the volume's size
     bool withAttributes = true;
-    bool withRoot = true;  // the records of the root folder; without them the catalog is empty
+    bool withRoot = true;     // the records of the root folder; without them the catalog is empty
     bool emptyTrees = false;  // forks of size 0 and no records: trees are left to the caller
     std::u16string name = u"Untitled";  // decomposed
     u32 date = 0;                       // seconds since 1904, written to every date
