@@ -234,6 +234,31 @@ TEST_P(BadBlocks, NoMemoryForARunIsReturnedUnreported) {
     path.ClearPath();
 }
 
+TEST_P(BadBlocks, NoMemoryForALaterRunIsReturnedAndTheEarlierStand) {
+    Extents first;
+    Extents second;
+    for (u32 i = 0; i < 8; ++i) {
+        first.push_back({1000 - 10 * i, 1});
+        second.push_back({2000 - 10 * i, 1});
+    }
+    Open({ExtentRecord(5, 0, first), ExtentRecord(5, 8, second)});
+    HfsFindData path;
+    bench_->FindRecord(HostExtKey(0, 5, 0).Get(), 5, nullptr, 0, nullptr, &path);
+    bench_.heap.FailNth(2, true);  // the map's first block of runs is got, a larger one is not
+    EXPECT_EQ(bench_->LoadBadBlocks(&runs_), kErrNoMemory);
+    EXPECT_EQ(Loaded()[0], (std::vector<u32>{0, 1000, 1}));
+    bench_.heap.FailNone();
+    path.ClearPath();
+}
+
+TEST_P(BadBlocks, ALeafThatLeadsToItselfEndsTheList) {
+    Open({ExtentRecord(5, 0, {{100, 3}}), ExtentRecord(5, 3, {{200, 3}})}, 1);
+    Put32(&bench_.volume.Disk(3), 2 * NodeSize(), 2);
+    EXPECT_EQ(bench_->LoadBadBlocks(&runs_), kOk);
+    EXPECT_EQ(Loaded(), WithHole({{0, 100, 3}, {3, 200, 3}}));
+    EXPECT_LE(bench_->readCount + bench_->hitCount, 6u);
+}
+
 TEST_P(BadBlocks, LeafRecordsOfZeroEndAfterTheFirstRecord) {
     Open({ExtentRecord(5, 0, {{100, 3}}), ExtentRecord(5, 3, {{200, 3}})});
     bench_->header.leafRecords = 0;

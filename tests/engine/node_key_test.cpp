@@ -160,6 +160,24 @@ TEST_P(GetKeyTest, RefusesIndicesWhoseSlotLiesOutsideTheNode) {
     }
 }
 
+TEST_P(GetKeyTest, TheDescriptorHoldsNoSlots) {
+    Bytes bytes = OneRecordNode(NodeSize(), 6, 8);
+    Put16(&bytes, 0, 30);  // would be the end of a record, and the next word its start
+    Put16(&bytes, 2, 14);
+    const LooseNode node(bytes, MapBlock());
+    NodeKey key{};
+    EXPECT_EQ(node->GetKey(node.Hdr(), static_cast<int>(NodeSize() / 2 - 2), &key), kErrCorrupt);
+    EXPECT_EQ(capture_.Take(), (Events{Asserted(410), Reported(kReasonNode, kAnySite)}));
+}
+
+TEST_P(GetKeyTest, RecordZeroOfANodeWithoutRecordsIsAssertedAndDescribed) {
+    Bytes bytes = OneRecordNode(NodeSize(), 6, 8);
+    Put16(&bytes, 10, 0);
+    const LooseNode node(bytes, MapBlock());
+    EXPECT_EQ(GetKeyOf(node, 0).size, 16u);
+    EXPECT_EQ(capture_.Take(), Events{Asserted(410)});
+}
+
 TEST_P(GetKeyTest, RefusesARecordThatEndsAtTheNodesEnd) {
     Bytes bytes = OneRecordNode(NodeSize(), 6, 2);
     PutSlot(&bytes, 1, NodeSize());
