@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "bench.h"
+#include "platform/heap.h"
 
 namespace VELK::test {
 namespace {
@@ -254,6 +255,44 @@ TEST(FindLongData, DataLongerThanHalfANodeIsGathered) {
     u32 size = 0;
     EXPECT_EQ(bench->FindRecord(key.Get(), key.id, data.data(), 1900, &size, nullptr), kOk);
     EXPECT_EQ(data, Pattern(1900, 3));
+}
+
+// ---- the scratch buffer
+
+// One leaf of two blocks; the key of record 16 lies in both.
+class FindScratch : public ::testing::Test {
+protected:
+    FindScratch() : bench_(Blocks(512)) {
+        TreeShape shape;
+        shape.nodeSize = 1024;
+        bench_.Open(BuildTree(shape, NthRecords(4, 31, 10)));
+        bench_->findData = HfsFindData();
+        HfsNode* leaf = nullptr;
+        bench_->GetINode(1, &leaf, false);
+        leaf->refCount = 0;
+        velk_heap_free(bench_->scratch);
+        bench_->scratch = bench_->scratchHalf = nullptr;
+        bench_.Forget();
+    }
+    int Find(u32 n) {
+        const HostKey key = NthHostKey(4, n);
+        return bench_->FindRecord(key.Get(), key.id, nullptr, 0, nullptr, nullptr);
+    }
+    Bench bench_;
+};
+
+TEST_F(FindScratch, IsMadeWhenAKeyNeedsIt) {
+    EXPECT_EQ(Find(15), kOk);
+    EXPECT_EQ(bench_->scratch, nullptr);
+    EXPECT_EQ(Find(16), kOk);
+    EXPECT_NE(bench_->scratch, nullptr);
+}
+
+TEST_F(FindScratch, NoMemoryForItIsReportedByFindRecordOnly) {
+    bench_.heap.FailNth(1);
+    EXPECT_EQ(Find(16), kErrNoMemory);
+    EXPECT_EQ(bench_.capture.Take(), Events{Reported(kErrNoMemory, 3126)});
+    EXPECT_EQ(Find(16), kOk);
 }
 
 // ---- depth
