@@ -60,6 +60,17 @@ TEST_P(IterateTest, StayingDeliversTheRecordFound) {
     EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
+TEST_P(IterateTest, ARecordCannotBeDeliveredNowhere) {
+    StandOn(7);
+    const u32 searches = path_.searchCount;
+    EXPECT_EQ(bench_->IncPos(1, nullptr, 8, &recordSize_, nullptr, 0, nullptr, &path_),
+              kErrInvalid);
+    EXPECT_EQ(bench_.capture.Take(), Events{Reported(kReasonInvalid, 9032)});
+    EXPECT_EQ(path_.searchCount, searches);
+    EXPECT_EQ(Step(0), kOk);
+    EXPECT_EQ(Delivered(), 7u);
+}
+
 TEST_P(IterateTest, OneStepAfterTheOtherVisitsAllRecordsInOrder) {
     StandOn(0);
     EXPECT_EQ(Step(0), kOk);

@@ -148,6 +148,9 @@ int CBTreeHfs::IncPos(int count, void* record, unsigned recordCapacity, unsigned
     if (!StandsOnLeaf(path, 1)) {
         return Fail(kErrInvalid, kReasonInvalid, 3236);
     }
+    if (record == nullptr && recordCapacity != 0) {
+        return Fail(kErrInvalid, kReasonInvalid, 9032);  // the record output is not optional
+    }
     path->searchCount += 1;
     const u32 distance = count < 0 ? 0u - static_cast<u32>(count) : static_cast<u32>(count);
     const int status =
