@@ -166,6 +166,9 @@ Runner::Outcome Runner::Audit(bool whole) {
     if (!volume_->breaches.empty()) {
         return "contract: " + volume_->breaches.front();
     }
+    if (Outcome outcome = Check(Present())) {
+        return outcome;
+    }
     if (tree_->header.leafRecords != model_.size()) {
         return "leafRecords " + std::to_string(tree_->header.leafRecords) + ", model " +
                std::to_string(model_.size());
@@ -210,9 +213,31 @@ Runner::Outcome Runner::CompareAll() {
                                   : Outcome("walking past the last record gave " + Hex(status));
 }
 
-// What the independent checker says of the file as it was committed.
-Runner::Outcome Runner::CheckOnDisk() {
-    const Bytes& file = volume_->Disk(setup_.fileId);
+// The tree file as it would be if everything were written now: the disk, over it the cached nodes,
+// over these the header as the tree holds it.
+Bytes Runner::Present() const {
+    const BTHeaderMem& header = tree_->header;
+    Bytes file = volume_->Disk(setup_.fileId);
+    for (const HfsNode* node : CachedNodes(*tree_)) {
+        const std::size_t at = static_cast<std::size_t>(node->nodeNum) * header.nodeSize;
+        for (u32 block = 0; block < header.blocksPerNode; ++block) {
+            const u8* data = node->bufs[block].data;
+            std::copy(data, data + header.blockSize,
+                      file.begin() + static_cast<std::ptrdiff_t>(at + block * header.blockSize));
+        }
+    }
+    Put16(&file, kHeadTreeDepth, header.treeDepth);
+    Put32(&file, kHeadRootNode, header.rootNode);
+    Put32(&file, kHeadLeafRecords, header.leafRecords);
+    Put32(&file, kHeadFirstLeafNode, header.firstLeafNode);
+    Put32(&file, kHeadLastLeafNode, header.lastLeafNode);
+    Put32(&file, kHeadTotalNodes, header.totalNodes);
+    Put32(&file, kHeadFreeNodes, header.freeNodes);
+    return file;
+}
+
+// What the independent checker says of a tree file.
+Runner::Outcome Runner::Check(const Bytes& file) const {
     std::string first;
     CheckSink sink;
     sink.self = &first;

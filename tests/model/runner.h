@@ -59,7 +59,8 @@ private:
     Outcome Expect(const char* what, int status, int wanted);
     Outcome Audit(bool whole);
     Outcome CompareAll();
-    Outcome CheckOnDisk();
+    Outcome Check(const Bytes& file) const;
+    Bytes Present() const;
     Outcome CheckAssertions();
 
     bool Faulted() const { return faults_->HasFailed() || heap_.HasFailed(); }

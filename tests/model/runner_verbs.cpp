@@ -272,7 +272,7 @@ Runner::Outcome Runner::Flush(const Operation& operation) {
     }
     snapshot_ = volume_->Save();
     committed_ = model_;
-    return CheckOnDisk();
+    return Check(volume_->Disk(setup_.fileId));
 }
 
 Runner::Outcome Runner::Reserve(const Operation& operation) {
