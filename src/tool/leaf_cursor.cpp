@@ -40,7 +40,7 @@ void LeafCursor::SeekFirst() {
     if (fileId_ == kExtentsFileId) {
         least.bytes[0] = kExtKeyFixed;
     } else {
-        least.bytes[0] = fileId_ == kCatalogFileId ? kCatKeyFixed : kAttrKeyFixed;
+        least.bytes[0] = static_cast<u8>(fileId_ == kCatalogFileId ? kCatKeyFixed : kAttrKeyFixed);
     }
     least.size = kKeyLengthSize + least.bytes[0];
     Seek(least, nullptr);

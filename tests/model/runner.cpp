@@ -74,7 +74,8 @@ void Runner::Start() {
     if (setup_.fileId != kAttributesFileId) {
         const bool catalog = setup_.fileId == kCatalogFileId;
         tree_->compareKeys = catalog ? CompareCatKeysCaseIns : CompareExtentKeysPlus;
-        tree_->header.maxKeyLength = catalog ? kCatMaxKeyLength : kExtMaxKeyLength;
+        tree_->header.maxKeyLength =
+            static_cast<u16>(catalog ? kCatMaxKeyLength : kExtMaxKeyLength);
         tree_->header.attributes = kBTBigKeysMask | (catalog ? kBTVariableIndexKeysMask : 0);
         tree_->keyCompareType = catalog ? kKeyCompareFolding : 0;
     }
