@@ -141,7 +141,9 @@ void VolumeMembers(Session* session, JsonWriter* json) {
     json->Member("wrapped", place.wrapped);
     json->Member("version", header.version);
     json->Member("attributes", header.attributes);
-    json->Member("created_local", DateIso(header.createDate));
+    std::string created = DateIso(header.createDate);
+    created = created.substr(0, created.find('Z'));  // in local time, which has no zone
+    json->Member("created_local", created);
     json->Member("modified", DateIso(header.modifyDate));
     json->Member("unmounted_cleanly", UnmountText(header)[0] == 'u');
     const JournalState& journal = volume.Journal();

@@ -1,0 +1,50 @@
+"""A volume that xorriso writes during the test: every name is listed, in little memory, and the
+whole catalog is checked. The number of names is the argument."""
+
+import os
+import sys
+
+import harness
+
+COUNT = int(sys.argv[1])
+MEMORY_LIMIT = 32 << 20
+
+checks = harness.Failures()
+image, names = harness.xorriso_volume(COUNT)
+
+
+def measured(*arguments):
+    """Runs the tool; returns its exit code, its output and its peak memory in bytes."""
+    out = harness.scratch() / "out"
+    with open(out, "wb") as target:
+        child = os.posix_spawn(harness.tool(), [harness.tool(), *map(str, arguments)], os.environ,
+                               file_actions=[(os.POSIX_SPAWN_DUP2, target.fileno(), 1)])
+        _, status, usage = os.wait4(child, 0)
+    return os.waitstatus_to_exitcode(status), out.read_bytes(), usage.ru_maxrss * 1024
+
+
+code, out, memory = measured("ls", "-R", "-0", image)
+found = out.decode("utf-8").split("\0")[:-1]
+checks.equal(code, 0, "ls -R")
+checks.equal(len(found), COUNT, "number of names")
+checks.check(sorted(found) == sorted("/" + name for name in names), "names")
+code, out, check_memory = measured("check", image)
+checks.equal(code, 0, "check: " + out.decode("utf-8"))
+if "asan" not in os.environ.get("TREEHFS_BUILD", ""):
+    checks.check(memory < MEMORY_LIMIT, "ls -R takes %d bytes" % memory)
+    checks.check(check_memory < MEMORY_LIMIT, "check takes %d bytes" % check_memory)
+
+# Every kind of walk sees the same records.
+code, out, err = harness.text("find", image, "--name", "*.txt")
+checks.equal(len(out.splitlines()), sum(name.endswith(".txt") for name in names), "find *.txt")
+code, out, err = harness.text("dump", image, "--values", "none", "--order", "dfs", "--json")
+leaf_rows = sum('"child"' not in line for line in out.splitlines()) - 2
+code, by_key, err = harness.text("dump", image, "--values", "none", "--json")
+checks.equal(leaf_rows, len(by_key.splitlines()) - 2, "records by node and by key")
+checks.equal(leaf_rows, 2 * COUNT + 2, "a record and a thread for each name and the root")
+one = names[COUNT // 2 + 1]
+code, out, err = harness.text("ls", "-l", image, "/" + one)
+checks.check(code == 0 and out.endswith(one.rsplit("/", 1)[-1] + "\n"), "one by its path: " + err)
+code, out, err = harness.text("stats", "-t", "c", image)
+checks.check("leaf order:" in out and code == 0, "stats: " + err)
+checks.finish()
