@@ -189,5 +189,21 @@ checks.check(error["code"] == 8 and error["offset"] == BASE + 16, "error with of
 code, out, err = harness.text("ls", good, "/\x1b[31mred", cwd=folder)
 checks.check("\x1b" not in err and "\\x1b[31mred" in err, "escaped error: %r" % err)
 
+# --- help ------------------------------------------------------------------------------------
+code, overview, err = harness.text("help")
+names = [line.split()[0] for line in overview.split("Commands:\n")[1].split("\n\n")[0].splitlines()]
+checks.check({"info", "check", "ls", "find", "dump", "node", "stats", "badblocks"} <= set(names),
+             "commands in the overview: %s" % names)
+for name in names:
+    code, shown, err = harness.text("help", name)
+    examples = shown.rsplit("\nExamples:\n", 1)[-1].splitlines()
+    checks.check(code == 0 and len(examples) == 3 and
+                 all(line.startswith("  treehfs ") for line in examples),
+                 "help of %s ends with three examples" % name)
+    checks.equal(harness.text(name, "--help"), (0, shown, ""), "%s --help" % name)
+for shell in ("bash", "zsh", "fish"):
+    code, script, err = harness.text("completion", shell)
+    checks.check(code == 0 and all(name in script for name in names), "completion " + shell)
+
 checks.equal((folder / good).read_bytes(), whole, "no reading command has changed the image")
 checks.finish()
