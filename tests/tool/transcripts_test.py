@@ -1,8 +1,8 @@
 """Runs the commands of the transcripts in golden/ and compares what they print, byte by byte.
 
 A transcript is a list of `$ treehfs ...` lines, each followed by its standard output, then its
-standard error with `! ` in front of each line, then `=> N` unless the exit code is 0. Its first line
-says which volumes it needs: `# volumes: small`, `built` or `samples`.
+standard error with `! ` in front of each line, then `=> N` unless the exit code is 0. Its first
+line says which volumes it needs: `# volumes: small`, `built` or `samples`.
 
 `transcripts_test.py --update` writes the transcripts anew; read the difference before you keep it.
 """
