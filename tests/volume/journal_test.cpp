@@ -194,6 +194,80 @@ TEST_F(JournalTest, BothByteOrdersAndEveryPlaceInTheRing) {
     }
 }
 
+// Journals as others make them: larger sectors, list headers that hold few blocks.
+TEST_F(JournalTest, OtherSectorAndListSizes) {
+    for (const u32 sectorSize : {512u, 2048u, 4096u}) {
+        for (const u32 listSize : {512u, 1024u, 8192u}) {
+            FormatOptions format = SmallFormat(2 * kJournal);
+            format.blockSize = 4096;
+            device_ = FreshDevice(kSize, format);
+            JournalPlace place = JournalOf(device_.get());
+            place.header.sectorSize = sectorSize;
+            place.header.listSize = listSize;
+            place.header.start = 2 * kJournal - 1024;
+            place.header.end = 2 * kJournal - 1024;
+            test::StoreJournalHeader(device_.get(), place);
+            CutBehind(40);
+            ASSERT_EQ(sectorSize, place_.header.sectorSize);
+            ASSERT_EQ(listSize, place_.header.listSize);
+            auto volume = Mount(Writing());
+            ASSERT_NE(nullptr, volume) << problem_.Text();
+            ASSERT_EQ(1u, volume->Journal().replayed);
+            ASSERT_EQ(expected_, Essence(BytesOf(device_.get()), place_));
+        }
+    }
+}
+
+// More blocks than one list takes: two lists make one transaction, carried out as one.
+TEST_F(JournalTest, ATransactionOfSeveralLists) {
+    JournalPlace place = JournalOf(device_.get());
+    place.header.listSize = 512;
+    test::StoreJournalHeader(device_.get(), place);
+    auto volume = Mount(Writing());
+    ASSERT_NE(nullptr, volume);
+    for (u32 i = 0; i < 260; ++i) {
+        ASSERT_EQ(0, InsertNumber(volume.get(), 1000 + 10 * i));
+        if (volume->IsCommitDue()) {
+            ASSERT_EQ(0, volume->Commit(0));
+        }
+    }
+    ASSERT_EQ(0, volume->Commit(0));
+    const std::vector<u8> before = BytesOf(device_.get());
+    for (u32 i = 0; i < 260; i += 8) {  // a node here, a node there
+        ASSERT_EQ(0, test::UpdateNumber(volume.get(), 1000 + 10 * i, 0x77));
+    }
+    ASSERT_EQ(0, volume->Commit(0));
+    const std::vector<u8> after = BytesOf(device_.get());
+    volume.reset();
+    place = JournalOf(device_.get());
+    std::vector<u8> cut = before;
+    const auto at = static_cast<std::ptrdiff_t>(place.offset);
+    std::copy_n(after.begin() + at, place.size, cut.begin() + at);
+    device_ = DeviceWith(cut);
+    place = JournalOf(device_.get());
+    JournalList list;
+    ASSERT_EQ("", DecodeJournalList(cut.data() + place.offset + place.header.start, place.header,
+                                    place.header.Used(), &list));
+    ASSERT_FALSE(list.isLast);
+    volume = Mount(Writing());
+    ASSERT_NE(nullptr, volume) << problem_.Text();
+    EXPECT_EQ(1u, volume->Journal().replayed);
+    EXPECT_EQ(Essence(after, place), Essence(BytesOf(device_.get()), place));
+    // Without its second list the transaction does not count at all.
+    volume.reset();
+    place.header.end = place.header.Advance(place.header.start, list.bytesUsed);
+    device_ = DeviceWith(cut);
+    test::StoreJournalHeader(device_.get(), place);
+    EXPECT_EQ(nullptr, Mount(Writing()));
+    OpenOptions reading;
+    reading.replay = true;
+    volume = Mount(reading);
+    ASSERT_NE(nullptr, volume);
+    std::vector<u8> seen(kSize);
+    ASSERT_EQ(0, volume->ReadVolume(0, seen.data(), seen.size()));
+    EXPECT_EQ(Essence(before, place), Essence(seen, place));
+}
+
 TEST_F(JournalTest, ATransactionTooLargeIsRefusedBeforeAnythingIsWritten) {
     auto volume = Mount(Writing());
     ASSERT_NE(nullptr, volume);

@@ -151,6 +151,11 @@ Problem ImageVolume::State::ChooseSink() {
             return Failure("the volume does not begin and end with a sector",
                            "its journal cannot be written");
         }
+        if (journalPlace.offset % journalPlace.header.sectorSize != 0 ||
+            journalPlace.size % journalPlace.header.sectorSize != 0) {
+            return Failure("the journal does not begin and end with one of its sectors",
+                           "it cannot be written");
+        }
         JournalSink::Options how;
         how.volumeOffset = place.offset;
         how.volumeBytes = volumeBytes;
