@@ -6,7 +6,7 @@ build=$(cd "$1" && pwd)
 seconds=$2
 shift 2
 targets=("$@")
-[ ${#targets[@]} -gt 0 ] || targets=(node open ops image)
+[ ${#targets[@]} -gt 0 ] || targets=(node open ops image journal)
 here=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd)
 work=$build/../fuzz-found
 mkdir -p "$work/seeds"

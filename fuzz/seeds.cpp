@@ -4,6 +4,7 @@
 
 #include "fuzz.h"
 #include "hfs/volume/make_volume.h"
+#include "journal_base.h"
 #include "keys.h"
 #include "node_image.h"
 #include "tree_image.h"
@@ -108,6 +109,15 @@ void Images() {
     }
 }
 
+// Header and first transaction; the seed's first byte says which checksums are mended.
+void Journals() {
+    const fuzz::JournalBase base = fuzz::MakeJournalBase();
+    const auto journal = base.image.begin() + static_cast<std::ptrdiff_t>(base.journalOffset);
+    Write("journal", "as-it-is", {0}, Bytes(journal, journal + 8192));
+    Write("journal", "header-mended", {1}, Bytes(journal, journal + 8192));
+    Write("journal", "both-mended", {3}, Bytes(journal, journal + 5120));
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
@@ -121,6 +131,7 @@ int main(int argc, char** argv) {
     Trees();
     Operations();
     Images();
+    Journals();
     Write("canary", "harmless", {}, {'b', 'i', 'r'});
     return 0;
 }

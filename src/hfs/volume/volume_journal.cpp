@@ -30,10 +30,12 @@ Problem PendingNote(const JournalState& journal, const std::string& advice) {
                      advice);
 }
 
-bool SameGeometry(const VolumeHeader& a, const VolumeHeader& b) {
+// Whether the journal leaves a volume of the same shape, whose last writer is still one that keeps
+// the journal: or a replay that was cut would not be begun again.
+bool LeavesShape(const VolumeHeader& a, const VolumeHeader& b) {
     return a.signature == b.signature && a.blockSize == b.blockSize &&
            a.totalBlocks == b.totalBlocks && a.journalInfoBlock == b.journalInfoBlock &&
-           (a.attributes & kVolJournaled) == (b.attributes & kVolJournaled);
+           (b.attributes & kVolJournaled) != 0 && KeepsJournal(b.lastMountedVersion);
 }
 
 }  // namespace
@@ -91,7 +93,7 @@ Problem ImageVolume::State::Replay() {
     if (Problem problem = ReadHeaders()) {
         return problem;
     }
-    if (!SameGeometry(before, header)) {
+    if (!LeavesShape(before, header)) {
         return FailureAt(journal.offset, "the journal would change the shape of the volume",
                          "run check");
     }
