@@ -1,0 +1,36 @@
+// The stores by name. See store.h.
+#include "store.h"
+
+#include <filesystem>
+
+namespace bench {
+
+std::unique_ptr<Store> MakeStore(const std::string& name, const Workload& load,
+                                 const std::string& folder) {
+    std::filesystem::remove_all(folder);
+    std::filesystem::create_directories(folder);
+    if (name == "treehfs") {
+        return MakeTreehfs(load, 1);
+    }
+    if (name == "treehfs-2blocks") {
+        return MakeTreehfs(load, 2);
+    }
+    if (name == "treehfs-8blocks") {
+        return MakeTreehfs(load, 8);
+    }
+    if (name == "lmdb") {
+        return MakeLmdb(load, folder);
+    }
+    if (name == "bdb") {
+        return MakeBdb(load, folder);
+    }
+    if (name == "sqlite") {
+        return MakeSqlite(load, folder);
+    }
+    if (name == "leveldb") {
+        return MakeLevelDb(load, folder);
+    }
+    return name == "absl" ? MakeAbsl(load) : nullptr;
+}
+
+}  // namespace bench

@@ -1,0 +1,49 @@
+// One ordered store under test. Every operation that reads delivers the data into the caller's
+// buffer. An operation that did not do what it should returns false: no store may answer wrongly.
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "workload.h"
+
+namespace bench {
+
+class Store {
+public:
+    virtual ~Store() = default;
+
+    // A phase is one transaction where the store knows transactions.
+    virtual void BeginPhase(bool /*writing*/) {}
+    virtual void EndPhase() {}
+
+    // `ascending`: records come in the store's own order.
+    virtual bool Insert(std::uint32_t i, const std::uint8_t* data, std::uint32_t size,
+                        bool ascending) = 0;
+    // Size of the data delivered, -1: absent.
+    virtual int Lookup(std::uint32_t i, std::uint8_t* out) = 0;
+    virtual bool Update(std::uint32_t i, const std::uint8_t* data, std::uint32_t size) = 0;
+    virtual bool Delete(std::uint32_t i) = 0;
+    // Delivers every record, or those of one parent, in order; adds their digests to `*sum` and
+    // returns how many there were.
+    virtual std::uint32_t Scan(std::uint64_t* sum) = 0;
+    virtual std::uint32_t List(std::uint32_t parent, std::uint64_t* sum) = 0;
+    // Bytes the records take in the store's file or memory.
+    virtual std::uint64_t Bytes() = 0;
+    // Records in the store's own order.
+    virtual bool Less(std::uint32_t a, std::uint32_t b) const = 0;
+};
+
+// Known names: treehfs, treehfs-2blocks, treehfs-8blocks (map blocks per node), lmdb, bdb, sqlite,
+// leveldb, absl. Null: none of them. `folder` is emptied for the store to keep files in.
+std::unique_ptr<Store> MakeStore(const std::string& name, const Workload& load,
+                                 const std::string& folder);
+
+std::unique_ptr<Store> MakeTreehfs(const Workload& load, std::uint32_t blocksPerNode);
+std::unique_ptr<Store> MakeLmdb(const Workload& load, const std::string& folder);
+std::unique_ptr<Store> MakeBdb(const Workload& load, const std::string& folder);
+std::unique_ptr<Store> MakeSqlite(const Workload& load, const std::string& folder);
+std::unique_ptr<Store> MakeLevelDb(const Workload& load, const std::string& folder);
+std::unique_ptr<Store> MakeAbsl(const Workload& load);
+
+}  // namespace bench

@@ -1,0 +1,107 @@
+// LMDB: one transaction a phase, writable mapping without syncs, insertion through a cursor.
+#include <lmdb.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+
+#include "store_plain.h"
+
+namespace bench {
+
+namespace {
+
+constexpr std::size_t kMapSize = std::size_t{16} << 30;
+
+void Must(int status) {
+    if (status != 0) {
+        std::fprintf(stderr, "lmdb: %s\n", mdb_strerror(status));
+        std::abort();
+    }
+}
+
+class LmdbStore : public PlainStore {
+public:
+    LmdbStore(const Workload& load, const std::string& folder) : PlainStore(load) {
+        Must(mdb_env_create(&env_));
+        Must(mdb_env_set_mapsize(env_, kMapSize));
+        Must(mdb_env_open(env_, folder.c_str(), MDB_WRITEMAP | MDB_NOSYNC, 0644));
+    }
+    ~LmdbStore() override { mdb_env_close(env_); }
+
+    void BeginPhase(bool writing) override {
+        Must(mdb_txn_begin(env_, nullptr, writing ? 0 : MDB_RDONLY, &txn_));
+        Must(mdb_dbi_open(txn_, nullptr, 0, &dbi_));
+        Must(mdb_cursor_open(txn_, dbi_, &cursor_));
+    }
+    void EndPhase() override {
+        mdb_cursor_close(cursor_);
+        Must(mdb_txn_commit(txn_));
+    }
+    bool Insert(std::uint32_t i, const std::uint8_t* data, std::uint32_t size,
+                bool ascending) override {
+        MDB_val key = Key(i);
+        MDB_val value = {size, const_cast<std::uint8_t*>(data)};
+        return mdb_cursor_put(cursor_, &key, &value, ascending ? MDB_APPEND : MDB_NOOVERWRITE) == 0;
+    }
+    int Lookup(std::uint32_t i, std::uint8_t* out) override {
+        MDB_val key = Key(i);
+        MDB_val value;
+        if (mdb_get(txn_, dbi_, &key, &value) != 0) {
+            return -1;
+        }
+        std::memcpy(out, value.mv_data, value.mv_size);
+        return static_cast<int>(value.mv_size);
+    }
+    bool Update(std::uint32_t i, const std::uint8_t* data, std::uint32_t size) override {
+        MDB_val key = Key(i);
+        MDB_val value = {size, const_cast<std::uint8_t*>(data)};
+        return mdb_cursor_put(cursor_, &key, &value, 0) == 0;
+    }
+    bool Delete(std::uint32_t i) override {
+        MDB_val key = Key(i);
+        return mdb_del(txn_, dbi_, &key, nullptr) == 0;
+    }
+    std::uint64_t Bytes() override {
+        MDB_envinfo info;
+        Must(mdb_env_info(env_, &info));
+        return (std::uint64_t{info.me_last_pgno} + 1) * 4096;
+    }
+
+private:
+    MDB_val Key(std::uint32_t i) const {
+        const auto key = load_.Plain(i);
+        return {key.size(), const_cast<std::uint8_t*>(key.data())};
+    }
+    std::uint32_t Walk(std::uint32_t parent, std::uint64_t* sum, bool oneFolder) override {
+        const Prefix prefix(parent);
+        MDB_val key = {sizeof prefix.bytes, const_cast<std::uint8_t*>(prefix.bytes)};
+        MDB_val value;
+        std::uint8_t data[kLargestData];
+        std::uint8_t keyCopy[kLargestKey];
+        std::uint32_t count = 0;
+        int status = mdb_cursor_get(cursor_, &key, &value, MDB_SET_RANGE);
+        while (status == 0 && !(oneFolder && !prefix.Starts(key.mv_data))) {
+            std::memcpy(keyCopy, key.mv_data, key.mv_size);
+            UseKey(keyCopy);
+            std::memcpy(data, value.mv_data, value.mv_size);
+            *sum += Digest(data, value.mv_size);
+            count += 1;
+            status = mdb_cursor_get(cursor_, &key, &value, MDB_NEXT);
+        }
+        return count;
+    }
+
+    MDB_env* env_ = nullptr;
+    MDB_txn* txn_ = nullptr;
+    MDB_dbi dbi_ = 0;
+    MDB_cursor* cursor_ = nullptr;
+};
+
+}  // namespace
+
+std::unique_ptr<Store> MakeLmdb(const Workload& load, const std::string& folder) {
+    return std::make_unique<LmdbStore>(load, folder);
+}
+
+}  // namespace bench

@@ -1,0 +1,200 @@
+// The tree engine over a volume in memory. The volume keeps the tree file as one stretch of address
+// space and lends its blocks in place, as a driver with a page cache would.
+#include <sys/mman.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+
+#include "hfs/treehfs.h"
+#include "store.h"
+
+namespace bench {
+
+namespace {
+
+using namespace VELK;
+
+constexpr u32 kNodeSize = 4096;
+constexpr u32 kNodeShift = 12;
+constexpr u64 kAddressSpace = u64{64} << 30;
+
+// The tree file; grows within address space that was set aside.
+class RamVolume {
+public:
+    explicit RamVolume(u32 mapBlock) {
+        void* space = mmap(nullptr, kAddressSpace, PROT_READ | PROT_WRITE,
+                           MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
+        if (space == MAP_FAILED) {
+            std::perror("mmap");
+            std::abort();
+        }
+        madvise(space, kAddressSpace, MADV_HUGEPAGE);
+        bytes_ = static_cast<u8*>(space);
+        fs.service = {&kOps, this};
+        fs.cache.ops = &kCacheOps;
+        fs.cache.self = this;
+        fs.mapBlockSize = static_cast<u16>(mapBlock);
+        fs.mapBlockShift = static_cast<u8>(__builtin_ctz(mapBlock));
+        fs.allocBlockSize = kNodeSize;
+        fs.allocBlockShift = kNodeShift;
+        fs.totalBlocks = static_cast<u32>(kAddressSpace >> kNodeShift);
+        fs.volumeSize = u64{1} << 29;  // decides the first size of the tree file only
+        fs.catalogFork.clumpSize = 4u << 20;
+    }
+    ~RamVolume() { munmap(bytes_, kAddressSpace); }
+    RamVolume(const RamVolume&) = delete;
+    RamVolume& operator=(const RamVolume&) = delete;
+
+    CFileSystemHfs fs;
+
+private:
+    static int Map(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u32, u64 offset,
+                   u32 bytes, bool, HfsBcbBuf* bufs) {
+        RamVolume* volume = static_cast<RamVolume*>(self);
+        if (offset + bytes > fs->catalogFork.logicalSize) {
+            return kErrInvalid;
+        }
+        for (u32 at = 0; at < bytes; at += fs->mapBlockSize, ++bufs) {
+            bufs->data = volume->bytes_ + offset + at;
+            bufs->bh = reinterpret_cast<buffer_head*>(bufs->data);
+        }
+        return kOk;
+    }
+    static int DirtyMeta(void*, CFileSystemHfs*, buffer_head*) { return kOk; }
+    static int Zero(void*, CFileSystemHfs*, HfsRuns*, HfsFork*, u8, u32, u64, u64) { return kOk; }
+    static int Resize(void*, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u32, u64 size) {
+        fs->catalogFork.logicalSize = size;
+        fs->catalogFork.totalBlocks = static_cast<u32>(size >> kNodeShift);
+        return size <= kAddressSpace ? kOk : kErrNoSpace;
+    }
+    static void Release(void*, buffer_head*, int) {}
+    static void Modify(void*, buffer_head*) {}
+
+    static constexpr HfsVolumeOps kOps = {Map, DirtyMeta, Zero, Resize};
+    static constexpr HfsCacheOps kCacheOps = {Release, Modify, Modify};
+
+    u8* bytes_;
+};
+
+void SwapKey(void* target, const void* source) {
+    const u8* in = static_cast<const u8*>(source);
+    u8* out = static_cast<u8*>(target);
+    u16 length;
+    u32 parent;
+    std::memcpy(&length, in, 2);
+    std::memcpy(&parent, in + 2, 4);
+    const u16 lengthBe = __builtin_bswap16(length);
+    const u32 parentBe = __builtin_bswap32(parent);
+    std::memcpy(out, &lengthBe, 2);
+    std::memcpy(out + 2, &parentBe, 4);
+    for (u32 at = 6; at < 2u + length; at += 2) {
+        u16 unit;
+        std::memcpy(&unit, in + at, 2);
+        unit = __builtin_bswap16(unit);
+        std::memcpy(out + at, &unit, 2);
+    }
+}
+
+class TreehfsStore : public Store {
+public:
+    TreehfsStore(const Workload& load, u32 mapBlock) : load_(load), volume_(mapBlock) {
+        tree_.volume = &volume_.fs;
+        tree_.fileId = kCatalogFileId;
+        tree_.compareKeys = CompareCatKeysCaseIns;
+        tree_.header.maxKeyLength = kCatMaxKeyLength;
+        tree_.header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
+        tree_.keyCompareType = kKeyCompareFolding;
+        tree_.convert.KeyToDisk = SwapKey;
+        const unsigned long long size = 4u << 20;
+        if (tree_.Create(kNodeShift, 0, &size) != kOk) {
+            std::abort();
+        }
+    }
+    ~TreehfsStore() override {
+        path_.ClearPath();
+        tree_.Dtor();
+    }
+
+    void EndPhase() override {
+        path_.ClearPath();
+        if (tree_.Flush(0) != kOk) {
+            std::abort();
+        }
+    }
+    bool Insert(u32 i, const u8* data, u32 size, bool) override {
+        return tree_.InsertRecord(load_.Host(i), load_.parent[i], data, size) == kOk;
+    }
+    int Lookup(u32 i, u8* out) override {
+        unsigned size = 0;
+        return tree_.FindRecord(load_.Host(i), load_.parent[i], out, kLargestData, &size, &path_) ==
+                       kOk
+                   ? static_cast<int>(size)
+                   : -1;
+    }
+    bool Update(u32 i, const u8* data, u32) override {
+        bool found = false;
+        return tree_.FindEntry(Key(i), load_.parent[i], nullptr, &found, nullptr, nullptr, nullptr,
+                               nullptr) == kOk &&
+               found && tree_.UpdateKeyAndRecord(nullptr, data) == kOk;
+    }
+    bool Delete(u32 i) override {
+        return tree_.DeleteRecord(load_.Host(i), load_.parent[i], false) == kOk;
+    }
+    u32 Scan(u64* sum) override { return Walk(0, sum, false); }
+    u32 List(u32 parent, u64* sum) override { return Walk(parent, sum, true); }
+    u64 Bytes() override { return volume_.fs.catalogFork.logicalSize; }
+    bool Less(u32 a, u32 b) const override {
+        if (load_.parent[a] != load_.parent[b]) {
+            return load_.parent[a] < load_.parent[b];
+        }
+        alignas(8) u8 other[kLargestKey];
+        SwapKey(other, load_.Host(b));
+        return CompareCatKeysCaseIns(Key(a), load_.parent[a],
+                                     reinterpret_cast<const BTreeKey*>(other)) < 0;
+    }
+
+private:
+    const BTreeKey* Key(u32 i) const { return reinterpret_cast<const BTreeKey*>(load_.Host(i)); }
+
+    // From the first key of `parent` on; keys are delivered because a listing needs them.
+    u32 Walk(u32 parent, u64* sum, bool oneFolder) {
+        alignas(8) u8 key[kKeyLengthSize + kMaxKeyLength + 6] = {6};
+        u8 data[kLargestData];
+        bool found = false;
+        if (tree_.FindEntry(reinterpret_cast<BTreeKey*>(key), parent, &path_, &found, nullptr,
+                            nullptr, nullptr, nullptr) != kOk) {
+            return 0;
+        }
+        u32 count = 0;
+        for (int step = 0;; step = 1) {
+            unsigned size = 0;
+            unsigned keySize = 0;
+            if (tree_.IncPos(step, data, sizeof data, &size, key, sizeof key, &keySize, &path_) !=
+                kOk) {
+                break;
+            }
+            u32 owner;
+            std::memcpy(&owner, key + kCatKeyParentId, 4);
+            if (oneFolder && __builtin_bswap32(owner) != parent) {
+                break;
+            }
+            *sum += Digest(data, size);
+            count += 1;
+        }
+        return count;
+    }
+
+    const Workload& load_;
+    RamVolume volume_;
+    CBTreeHfs tree_;
+    HfsFindData path_;
+};
+
+}  // namespace
+
+std::unique_ptr<Store> MakeTreehfs(const Workload& load, std::uint32_t blocksPerNode) {
+    return std::make_unique<TreehfsStore>(load, kNodeSize / blocksPerNode);
+}
+
+}  // namespace bench
