@@ -199,7 +199,7 @@ ScriptRunner::Outcome ScriptRunner::Replace(const std::string_view* words) {
     if (outcome.status == kErrTooLarge) {
         EndReservations();
         volume_->Restore();
-        outcome.fields += " restored=yes";
+        NoteRestored(&outcome);
     }
     return outcome;
 }

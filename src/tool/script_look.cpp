@@ -56,8 +56,9 @@ void PutHeader(const CBTreeHfs& tree, u8* node) {
     PutBe32(node + kHeadFreeNodes, header.freeNodes);
 }
 
+// The invariants that are broken, each once, in the order they were met.
 struct Findings {
-    std::string first;
+    std::string ids;
 };
 
 struct LevelWalk {
@@ -211,14 +212,15 @@ ScriptRunner::Outcome ScriptRunner::Check(u32 count) {
     sink.self = &findings;
     sink.finding = [](void* self, const CheckFinding& finding) {
         Findings* found = static_cast<Findings*>(self);
-        if (finding.severity == CheckSeverity::kError && found->first.empty()) {
-            found->first = CheckIdOf(finding.id).name;
+        const std::string id = CheckIdOf(finding.id).name;
+        if (finding.severity == CheckSeverity::kError && found->ids.find(id) == std::string::npos) {
+            found->ids += (found->ids.empty() ? "" : ",") + id;
         }
     };
     const CheckSummary summary = CheckTreeBytes(bytes.data(), bytes.size(), kind, options, sink);
     std::string fields = fmt::format(" errors={} warnings={} nodes={}", summary.errors,
                                      summary.warnings, summary.nodes);
-    return {kOk, findings.first.empty() ? fields : fields + " first=" + findings.first};
+    return {kOk, findings.ids.empty() ? fields : fields + " ids=" + findings.ids};
 }
 
 ScriptRunner::Outcome ScriptRunner::Stats() {

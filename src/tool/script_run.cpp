@@ -34,6 +34,23 @@ bool FindField(const std::string& fields, std::string_view name, std::string_vie
     return false;
 }
 
+bool ChangesTree(ScriptOp op) {
+    switch (op) {
+        case ScriptOp::kInsert:
+        case ScriptOp::kUpdate:
+        case ScriptOp::kDelete:
+        case ScriptOp::kReplace:
+        case ScriptOp::kReserve:
+        case ScriptOp::kExtend:
+        case ScriptOp::kFlush:
+        case ScriptOp::kClear:
+        case ScriptOp::kCreate:
+            return true;
+        default:
+            return false;
+    }
+}
+
 // The key of the item that a stored thread record names.
 bool KeyOfThread(const std::vector<u8>& thread, SearchKey* key) {
     const RecordKind* kind =
@@ -119,8 +136,13 @@ void ScriptRunner::Settle(Outcome* outcome) {
     }
     EndReservations();
     if (volume_->RestoreAfter(status)) {
-        outcome->fields += " restored=yes";
+        NoteRestored(outcome);
     }
+}
+
+// A restore that fails leaves a volume that takes no more changes.
+void ScriptRunner::NoteRestored(Outcome* outcome) const {
+    outcome->fields += volume_->IsWritable() ? " restored=yes" : " readonly=yes";
 }
 
 // Reads a key; `id:N` stands for the one its thread names. 0 or the status of that lookup.
@@ -147,6 +169,9 @@ int ScriptRunner::TakeKey(std::string_view word, SearchKey* key) {
 }
 
 ScriptRunner::Outcome ScriptRunner::Execute(ScriptOp op, const std::string_view* words, u32 count) {
+    if (ChangesTree(op) && !volume_->IsWritable()) {
+        return {kErrVolumeReadOnly, " readonly=yes"};
+    }
     switch (op) {
         case ScriptOp::kUse:
             return Use(words);

@@ -73,6 +73,7 @@ private:
     std::string StateFields(CBTreeHfs* tree) const;
     // After a changing operation: takes the volume back if `status` says so.
     void Settle(Outcome* outcome);
+    void NoteRestored(Outcome* outcome) const;
     int TakeKey(std::string_view word, SearchKey* key);
 
     // script_change.cpp

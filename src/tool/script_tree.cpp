@@ -77,10 +77,10 @@ ScriptRunner::Outcome ScriptRunner::Flush(u32 count) {
     Outcome outcome;
     outcome.status = volume_->Commit(count != 0 ? 4 : 0);
     outcome.fields = fmt::format(" written={}", volume_->HandedOverBlocks() - before);
-    if (outcome.status != kOk && volume_->IsWritable()) {
+    if (outcome.status != kOk) {
         // The commit has restored already; what was reserved went with it.
         held_.clear();
-        outcome.fields += " restored=yes";
+        NoteRestored(&outcome);
     }
     return outcome;
 }
