@@ -46,7 +46,8 @@ def table(figures, stores):
             ratio = f" {middle / base:6.2f}" if base else ""
             cells.append(f"{middle:>11,.0f}{ratio}")
         print(f"{operation:24}" + "".join(f"{cell:>18}" for cell in cells))
-    for title, key, unit in (("peak memory, MiB", "peakKiB", 1 << 10), ("size, MiB", "bytes", 1 << 20)):
+    sizes = (("peak memory, MiB", "peakKiB", 1 << 10), ("size, MiB", "bytes", 1 << 20))
+    for title, key, unit in sizes:
         values = (statistics.median(result[key] for result in figures[store]) / unit
                   for store in stores)
         print(f"{title:24}" + "".join(f"{value:>18,.0f}" for value in values))
