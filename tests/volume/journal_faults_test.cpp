@@ -131,6 +131,68 @@ TEST_P(JournalFaults, EachAllocationInTurn) {
                [&] { heap_.FailNone(); }, false);
 }
 
+// A second fault while the first is being recovered from, or in the work that is done again.
+class PairsOfFaults : public JournalFaults {
+protected:
+    // Whether the second fault was met.
+    bool SecondFault(u32 first, u32 second) {
+        int status = 0;
+        {
+            test::FaultService faults(volume_->Fs());
+            faults.FailAny(first);
+            status = Work();
+            EXPECT_TRUE(faults.HasFailed());
+        }
+        if (status == 0) {
+            // Nothing depended on it.
+            EXPECT_EQ(after_, Stands()) << first;
+            Mount();
+            return false;
+        }
+        bool hasStruck = false;
+        {
+            test::FaultService faults(volume_->Fs());
+            faults.FailAny(second);
+            volume_->RestoreAfter(status);
+            EXPECT_EQ(before_, Stands()) << first << " " << second;
+            status = Work();
+            hasStruck = faults.HasFailed();
+        }
+        // A recovery may do without what it could not read.
+        EXPECT_TRUE(hasStruck || status == 0) << first << " " << second;
+        if (status != 0) {
+            volume_->RestoreAfter(status);
+            EXPECT_EQ(before_, Stands()) << first << " " << second;
+            if (!volume_->IsWritable()) {
+                Mount();
+            }
+            EXPECT_EQ(0, Work()) << first << " " << second;
+        }
+        EXPECT_EQ(after_, Stands()) << first << " " << second;
+        Mount();
+        return hasStruck;
+    }
+};
+
+TEST_P(PairsOfFaults, AllOfThem) {
+    u32 firsts = 0;
+    {
+        test::FaultService faults(volume_->Fs());
+        ASSERT_EQ(0, Work());
+        firsts = faults.Count();
+    }
+    Mount();
+    u32 pairs = 0;
+    for (u32 first = 1; first <= firsts; ++first) {
+        for (u32 second = 1; SecondFault(first, second); ++second) {
+            pairs += 1;
+            ASSERT_FALSE(HasFailure());
+        }
+    }
+    EXPECT_GT(pairs, 15u);
+}
+
+INSTANTIATE_TEST_SUITE_P(SmallestOperations, PairsOfFaults, testing::Values(0u, 3u, 6u, 7u, 9u));
 INSTANTIATE_TEST_SUITE_P(Operations, JournalFaults, testing::Range(0u, test::kCutOperations));
 
 }  // namespace

@@ -93,7 +93,10 @@ Problem ImageVolume::State::Replay() {
     if (Problem problem = ReadHeaders()) {
         return problem;
     }
-    if (!LeavesShape(before, header)) {
+    JournalPlace found;
+    const bool staysReadable = ReadJournalState(&to, header, place.offset, &found).readable;
+    if (!staysReadable || found.offset != journalPlace.offset || found.size != journalPlace.size ||
+        !LeavesShape(before, header)) {
         return FailureAt(journal.offset, "the journal would change the shape of the volume",
                          "run check");
     }
