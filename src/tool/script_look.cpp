@@ -175,6 +175,9 @@ ScriptRunner::Outcome ScriptRunner::Node(const std::string_view* words) {
     if (number >= tree->header.totalNodes) {
         Remark(fmt::format("the tree has nodes 0..{}", tree->header.totalNodes - 1));
     }
+    if (number >= tree->validNodes && number < tree->header.totalNodes) {
+        return {kOk, " unused=yes"};  // asking the engine for it would make it a fresh node
+    }
     const HeldNode node(tree, static_cast<u32>(number));
     if (node.Status() != kOk) {
         return {node.Status(), {}};

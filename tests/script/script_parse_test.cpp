@@ -2,8 +2,11 @@
 #include <gtest/gtest.h>
 
 #include <cstdio>
+#include <fstream>
+#include <iterator>
 
 #include "script_support.h"
+#include "tool/record_fields.h"
 #include "tool/script.h"
 
 namespace VELK::tool {
@@ -141,6 +144,25 @@ TEST(ScriptParsed, MissingScriptIsNoMistakeOfForm) {
     const Transcript result = RunTool("apply", {"--new", "1M", "/nowhere/x.tr"});
     EXPECT_EQ(result.exitCode, 8);
     EXPECT_EQ(result.err, "treehfs: /nowhere/x.tr: cannot read the script\n");
+}
+
+TEST(ScriptHandbook, NamesEveryOperationAndField) {
+    std::ifstream script(TREEHFS_DOCS "/script.md");
+    const std::string text(std::istreambuf_iterator<char>(script), {});
+    ASSERT_FALSE(text.empty());
+    for (const std::string& name : ScriptOpNames()) {
+        EXPECT_TRUE(text.find("`" + name) != std::string::npos ||
+                    text.find("... " + name + "`") != std::string::npos)
+            << name;
+    }
+    std::ifstream records(TREEHFS_DOCS "/records.md");
+    const std::string fields(std::istreambuf_iterator<char>(records), {});
+    for (u32 i = 0; i < kRecordKindCount; ++i) {
+        for (u32 k = 0; k < kRecordKinds[i].fieldCount; ++k) {
+            const std::string name = kRecordKinds[i].fields[k].name;
+            EXPECT_TRUE(fields.find("`" + name + "`") != std::string::npos) << name;
+        }
+    }
 }
 
 TEST(ExpandWord, CountersStandForTheirNumbers) {
