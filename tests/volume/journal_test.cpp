@@ -218,6 +218,51 @@ TEST_F(JournalTest, OtherSectorAndListSizes) {
     }
 }
 
+// Targets count from the volume's start, wherever in the image that lies.
+TEST_F(JournalTest, AVolumeInsideAnImage) {
+    const std::vector<u8> volumeBytes = BytesOf(device_.get());
+    for (const std::size_t offset : {std::size_t{1536}, std::size_t{65536}}) {
+        std::vector<u8> image(offset, 0x5A);
+        image.insert(image.end(), volumeBytes.begin(), volumeBytes.end());
+        image.resize(image.size() + 4096, 0x5A);
+        auto disk = DeviceWith(image);
+        SliceDevice inner(disk.get(), offset, kSize);
+        JournalPlace place = JournalOf(&inner);
+        place.header.start = kJournal - 2048;
+        place.header.end = kJournal - 2048;
+        test::StoreJournalHeader(&inner, place);
+        OpenOptions options = Writing();
+        options.offset = offset;
+        auto volume = MountOn(disk.get(), options, &problem_);
+        ASSERT_NE(nullptr, volume) << problem_.Text();
+        ASSERT_EQ(0, InsertNumber(volume.get(), 100));
+        ASSERT_EQ(0, volume->Commit(0));
+        const std::vector<u8> before = BytesOf(disk.get());
+        ASSERT_EQ(0, InsertNumber(volume.get(), 101));
+        ASSERT_EQ(0, volume->Commit(0));
+        const std::vector<u8> after = BytesOf(disk.get());
+        volume.reset();
+        std::vector<u8> cut = before;
+        const auto at = static_cast<std::ptrdiff_t>(offset + place.offset);
+        std::copy_n(after.begin() + at, place.size, cut.begin() + at);
+        disk = DeviceWith(cut);
+        volume = MountOn(disk.get(), options, &problem_);
+        ASSERT_NE(nullptr, volume) << problem_.Text();
+        EXPECT_EQ(1u, volume->Journal().replayed);
+        EXPECT_TRUE(test::HasNumber(volume.get(), 101));
+        volume.reset();
+        std::vector<u8> found = BytesOf(disk.get());
+        EXPECT_EQ(0x5A, found[offset - 1]);
+        EXPECT_EQ(0x5A, found.back());
+        EXPECT_TRUE(std::equal(found.begin(), found.begin() + static_cast<std::ptrdiff_t>(offset),
+                               image.begin()));
+        SliceDevice mounted(disk.get(), offset, kSize);
+        const std::vector<u8> expected(after.begin() + static_cast<std::ptrdiff_t>(offset),
+                                       after.end() - 4096);
+        EXPECT_EQ(Essence(expected, place), Essence(BytesOf(&mounted), place));
+    }
+}
+
 // More blocks than one list takes: two lists make one transaction, carried out as one.
 TEST_F(JournalTest, ATransactionOfSeveralLists) {
     JournalPlace place = JournalOf(device_.get());
