@@ -81,21 +81,31 @@ int MixedChanges(CutVolume* on) {
                                                : status;
 }
 
+int UpdateAll(CutVolume* on) {
+    int status = 0;
+    for (auto at = on->numbers.begin(); at != on->numbers.end() && status == 0; ++at) {
+        status = UpdateNumber(on->volume, *at, on->fill);
+    }
+    on->fill = static_cast<u8>(on->fill + 1);
+    return status;
+}
+
 }  // namespace
 
 const char* CutOperationName(u32 operation) {
-    static const char* const kNames[kCutOperations] = {"insert",
-                                                       "insert with split",
-                                                       "root split",
-                                                       "delete",
-                                                       "delete with unlink",
-                                                       "collapse",
-                                                       "update",
-                                                       "growth",
-                                                       "growth by four",
-                                                       "create tree",
-                                                       "several trees",
-                                                       "mixed"};
+    static const char* const kNames[kCutOperations + 1] = {"insert",
+                                                           "insert with split",
+                                                           "root split",
+                                                           "delete",
+                                                           "delete with unlink",
+                                                           "collapse",
+                                                           "update",
+                                                           "growth",
+                                                           "growth by four",
+                                                           "create tree",
+                                                           "several trees",
+                                                           "mixed",
+                                                           "update all"};
     return kNames[operation];
 }
 
@@ -131,8 +141,10 @@ int DoCutOperation(u32 operation, CutVolume* on) {
                        : on->volume->CreateTree(kAttributesFileId, 9, nullptr);
         case 10:
             return GrowAllTrees(on);
-        default:
+        case 11:
             return MixedChanges(on);
+        default:
+            return UpdateAll(on);
     }
 }
 

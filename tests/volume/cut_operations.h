@@ -9,6 +9,7 @@
 namespace VELK::test {
 
 constexpr u32 kCutOperations = 12;
+constexpr u32 kUpdateAll = 12;  // one more, of large transactions
 const char* CutOperationName(u32 operation);
 
 // A volume and the numbers in its catalog.
@@ -16,6 +17,7 @@ struct CutVolume {
     ImageVolume* volume;
     std::set<u32> numbers;
     std::function<int()> commit;  // called by operations that do not fit into one transaction
+    u8 fill = 0x80;               // of updated records; another one each time
 };
 
 // Does one operation without the last commit: 0 or a status.

@@ -293,6 +293,36 @@ TEST(PowerCut, GrowthWithAMapNode) {
     EXPECT_GT(totals.states, 50u);
 }
 
+// Transactions of more than half of the ring: each has to wait until the one before is let go of.
+TEST(PowerCut, TransactionsThatFillTheJournal) {
+    test::Capture capture;
+    for (const u64 journalAt : {u64{512}, u64{20} << 10}) {
+        test::CutBaseShape shape;
+        shape.records = 180;
+        shape.journalAt = journalAt;
+        CutLimits limits;
+        limits.randomSubsets = 30;
+        Totals totals;
+        CutRow(test::MakeCutBase(shape), {test::kUpdateAll, test::kUpdateAll, test::kUpdateAll},
+               limits, &totals);
+        totals.Tell();
+        EXPECT_EQ(3u, totals.commits);
+        EXPECT_GT(totals.replays, 20u);
+    }
+}
+
+// The last writer was one that keeps no journal, and unmounted: the first commit changes that.
+TEST(PowerCut, TheFirstCommitAfterAnotherWriter) {
+    test::Capture capture;
+    CutBase base = test::MakeCutBase({});
+    StoreBe32(base.bytes.data() + kHeaderOffset + 8, 0x31302E30);
+    Totals totals;
+    CutRow(base, {0, 3}, CutLimits{}, &totals);
+    totals.Tell();
+    EXPECT_EQ(2u, totals.commits);
+    EXPECT_GT(totals.replays, 20u);
+}
+
 // Without a journal a cut may leave anything, but never a volume that calls itself clean and is
 // neither the one before nor the one after.
 TEST(PowerCut, WithoutAJournalTheCleanBitTells) {
