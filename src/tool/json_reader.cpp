@@ -102,8 +102,9 @@ private:
             if (!Take(':')) {
                 return Fail("':'");
             }
-            value->members.emplace_back(Utf8FromUnits(name), JsonValue());
-            if (!ReadValue(&value->members.back().second, depth + 1)) {
+            value->names.push_back(Utf8FromUnits(name));
+            value->items.emplace_back();
+            if (!ReadValue(&value->items.back(), depth + 1)) {
                 return false;
             }
         } while (Take(','));
@@ -133,9 +134,9 @@ private:
 }  // namespace
 
 const JsonValue* JsonValue::Find(std::string_view name) const {
-    for (const auto& [memberName, value] : members) {
-        if (memberName == name) {
-            return &value;
+    for (std::size_t i = 0; i < names.size(); ++i) {
+        if (names[i] == name) {
+            return &items[i];
         }
     }
     return nullptr;

@@ -4,7 +4,6 @@
 
 #include <string>
 #include <string_view>
-#include <utility>
 #include <vector>
 
 #include "hfs/names_text.h"
@@ -19,8 +18,8 @@ struct JsonValue {
     bool isTrue = false;
     std::string number;
     NameUnits units;
-    std::vector<JsonValue> items;
-    std::vector<std::pair<std::string, JsonValue>> members;
+    std::vector<JsonValue> items;    // of an array; of an object, the values of its members
+    std::vector<std::string> names;  // of the members
 
     // Member of an object; null when there is none.
     const JsonValue* Find(std::string_view name) const;
