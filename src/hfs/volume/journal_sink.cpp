@@ -125,9 +125,11 @@ IoResult JournalSink::Begin(BlockDevice* home, u64* bytesWritten) {
     if (result.Ok()) {
         result = home->Read(HeaderOffset(), header, sizeof header);
     }
+    if (!result.Ok()) {
+        return result;
+    }
     const u32 attributes = Be32(header + kAttributesInHeader);
-    if (!result.Ok() ||
-        ((attributes & kVolUnmounted) == 0 && KeepsJournal(Be32(header + kVersionInHeader)))) {
+    if ((attributes & kVolUnmounted) == 0 && KeepsJournal(Be32(header + kVersionInHeader))) {
         return result;
     }
     StoreBe32(header + kAttributesInHeader, attributes & ~kVolUnmounted);
