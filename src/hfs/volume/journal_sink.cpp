@@ -18,10 +18,11 @@ constexpr std::size_t kLargestWrite = std::size_t{1} << 20;
 // Collects the bytes of a transaction and writes them into the ring in large pieces.
 class RingWriter {
 public:
-    RingWriter(BlockDevice* volume, JournalPlace* place) : volume_(volume), place_(place) {
-        position_ = place->header.end;
-        most_ = static_cast<std::size_t>(std::min<u64>(kLargestWrite, place->header.Capacity()));
-    }
+    RingWriter(BlockDevice* volume, JournalPlace* place)
+        : volume_(volume),
+          place_(place),
+          position_(place->header.end),
+          most_(static_cast<std::size_t>(std::min<u64>(kLargestWrite, place->header.Capacity()))) {}
     u64 Position() const { return position_; }
     // Room for `bytes` more bytes, to be filled in before the next call; null: a write failed.
     u8* Take(u32 bytes) {
