@@ -1,15 +1,14 @@
 // Opening the image of a command.
 #include "tool/session.h"
 
-#include <fcntl.h>
 #include <fmt/format.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cstdio>
 
 #include "tool/engine_trace.h"
 #include "tool/errors.h"
+#include "tool/read_ahead.h"
 
 namespace VELK::tool {
 
@@ -49,7 +48,11 @@ Session::Session(const Invocation& call, Truncated truncated)
         volume_ = g_lentVolume;
         return;
     }
-    owned_ = ImageVolume::OpenFile(image_, OptionsOf(call), &scan_, &problem);
+    if (auto file = FileDevice::Open(image_, FileDevice::Mode::kRead, 0, &problem)) {
+        imageBytes_ = file->Size();
+        owned_ = ImageVolume::Open(std::make_unique<ReadAheadDevice>(std::move(file)),
+                                   OptionsOf(call), &scan_, &problem);
+    }
     volume_ = owned_.get();
     if (call.verbose) {
         ExplainPlace(image_, scan_);
@@ -89,17 +92,10 @@ CBTreeHfs* Session::Tree(u32 fileId) {
 
 u64 Session::ReadableBytes() const {
     if (owned_ == nullptr) {
-        return volume_->Fs()->volumeSize;  // lent: all of it is there
-    }
-    u64 imageBytes = 0;
-    const int fd = open(image_.c_str(), O_RDONLY | O_CLOEXEC);
-    if (fd >= 0) {
-        const off_t end = lseek(fd, 0, SEEK_END);  // a device has no size in its status
-        imageBytes = end > 0 ? static_cast<u64>(end) : 0;
-        close(fd);
+        return u64{volume_->Header().totalBlocks} * volume_->Header().blockSize;
     }
     const u64 start = volume_->Place().offset;
-    const u64 behind = imageBytes > start ? imageBytes - start : 0;
+    const u64 behind = imageBytes_ > start ? imageBytes_ - start : 0;
     return volume_->Place().size != 0 ? std::min(behind, volume_->Place().size) : behind;
 }
 

@@ -53,6 +53,7 @@ private:
     std::string image_;
     bool quiet_;
     bool json_;
+    u64 imageBytes_ = 0;
     VolumeScan scan_;
     std::unique_ptr<ImageVolume> owned_;
     ImageVolume* volume_ = nullptr;  // owned or lent
