@@ -10,6 +10,7 @@
 #include <cstring>
 
 #include "tool/errors.h"
+#include "tool/progress.h"
 
 namespace VELK::tool {
 
@@ -93,6 +94,8 @@ void Output::Flush() {
 
 void Output::WriteAll(const char* bytes, std::size_t size) {
     while (size > 0) {
+        // A signal ends a write early, with an error or with part of the bytes written.
+        ThrowIfInterrupted();
         const ssize_t written = write(fd_, bytes, size);
         if (written < 0) {
             if (errno == EINTR) {

@@ -2,6 +2,8 @@
 whole catalog is checked. The number of names is the argument."""
 
 import os
+import signal
+import subprocess
 import sys
 
 import harness
@@ -33,6 +35,24 @@ checks.equal(code, 0, "check: " + out.decode("utf-8"))
 if "asan" not in os.environ.get("TREEHFS_BUILD", ""):
     checks.check(memory < MEMORY_LIMIT, "ls -R takes %d bytes" % memory)
     checks.check(check_memory < MEMORY_LIMIT, "check takes %d bytes" % check_memory)
+
+# Somebody stops it while nobody reads what it writes: it ends at once and says so.
+stopped = subprocess.Popen([harness.tool(), "ls", "-R", "-l", image], stdout=subprocess.PIPE,
+                           stderr=subprocess.PIPE)
+stopped.stdout.read(1)
+stopped.send_signal(signal.SIGINT)
+try:
+    checks.equal(stopped.wait(timeout=30), 32, "interrupted")
+    checks.equal(stopped.stderr.read(), b"treehfs: interrupted\n", "interrupted")
+except subprocess.TimeoutExpired:
+    stopped.kill()
+    checks.check(False, "it does not stop")
+# A reader that has seen enough is no failure.
+enough = subprocess.Popen([harness.tool(), "ls", "-R", "-l", image], stdout=subprocess.PIPE,
+                          stderr=subprocess.PIPE)
+enough.stdout.read(1)
+enough.stdout.close()
+checks.equal((enough.wait(timeout=60), enough.stderr.read()), (0, b""), "closed pipe")
 
 # Every kind of walk sees the same records.
 code, out, err = harness.text("find", image, "--name", "*.txt")
