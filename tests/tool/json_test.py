@@ -1,4 +1,4 @@
-"""docs/json.md against what the program prints: every member is described, and none has vanished."""
+"""docs/json.md against what the program prints: every member is described, none has vanished."""
 
 import json
 import re
