@@ -23,7 +23,7 @@ public:
     CFileSystemHfs fs;
 
 private:
-    static constexpr u32 kChunkShift = 20;
+    static constexpr u32 kChunkShift = 21;  // a huge page
 
     static int Map(void* self, CFileSystemHfs* fs, HfsRuns* runs, HfsFork* fork, u8 forkType,
                    u32 fileId, u64 byteOffset, u32 bytes, bool noRead, HfsBcbBuf* bufs);

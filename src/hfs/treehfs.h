@@ -71,6 +71,7 @@ struct HfsNode;
 struct HfsNodeHint {
     HfsNode* node;  // null: none
     const u8* data;
+    u32 nodeNum;
 };
 
 // A cached node. Its bytes are the blocks of `bufs` one after the other; they are not contiguous in

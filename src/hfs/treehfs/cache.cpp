@@ -36,7 +36,8 @@ bool HasWholeBlocks(const BTHeaderMem& header) {
 // Hints an index node has room for: several times the children it is likely to have, so that few
 // of them share a place.
 u32 HintCount(const CBTreeHfs* tree) {
-    return (1u << tree->nodeShift) / static_cast<u32>(sizeof(HfsNodeHint));
+    constexpr u32 kNodeBytesPerHint = 16;
+    return (1u << tree->nodeShift) / kNodeBytesPerHint;
 }
 
 HfsNode* NewNode(const CBTreeHfs* tree, u32 nodeNum, bool withHints) {
@@ -57,14 +58,29 @@ HfsNode* NewNode(const CBTreeHfs* tree, u32 nodeNum, bool withHints) {
     return node;
 }
 
-void SetHint(HfsNodeHint* hint, HfsNode* child) {
+// A child has two places among its parent's hints, side by side.
+HfsNodeHint* HintPlaces(HfsNode* parent, u32 nodeNum) {
+    return &parent->hints[nodeNum & parent->hintMask & ~1u];
+}
+
+HfsNodeHint* FindHint(HfsNode* parent, u32 nodeNum) {
+    HfsNodeHint* hint = HintPlaces(parent, nodeNum);
+    hint += hint->nodeNum == nodeNum ? 0 : 1;
+    return hint->nodeNum == nodeNum && hint->node != nullptr ? hint : nullptr;
+}
+
+// Takes an empty place, else one of the two by a bit of the number that did not choose the pair.
+void SetHint(HfsNode* parent, HfsNode* child) {
+    HfsNodeHint* places = HintPlaces(parent, child->nodeNum);
+    HfsNodeHint* hint = places->node == nullptr ? places : places + 1;
     if (hint->node != nullptr) {
+        hint = places + (child->nodeNum & 1);
         hint->node->hintedBy = nullptr;
     }
     if (child->hintedBy != nullptr) {
         child->hintedBy->node = nullptr;
     }
-    *hint = {child, child->bufs[0].data};
+    *hint = {child, child->bufs[0].data, child->nodeNum};
     child->hintedBy = hint;
 }
 
@@ -310,22 +326,22 @@ int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
 }
 
 int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNode** out) {
-    HfsNodeHint* hint =
-        parent->hints != nullptr ? &parent->hints[nodeNum & parent->hintMask] : nullptr;
-    if (hint != nullptr && hint->node != nullptr) {
-        // Asked for before the node itself is known to be the right one: both may be cold.
+    const bool hasHints = parent->hints != nullptr;
+    HfsNodeHint* hint = hasHints ? FindHint(parent, nodeNum) : nullptr;
+    if (hint != nullptr) {
+        // Asked for all at once, as each may be cold; the node's block entries lie in its second
+        // line.
+        __builtin_prefetch(&hint->node->bufs[0]);
         __builtin_prefetch(hint->data);
         __builtin_prefetch(hint->data + tree->header.blockSize - 64);
-        if (hint->node->nodeNum == nodeNum) {
-            CountHit(tree, hint->node);
-            TakeReference(hint->node);
-            *out = hint->node;
-            return kOk;
-        }
+        CountHit(tree, hint->node);
+        TakeReference(hint->node);
+        *out = hint->node;
+        return kOk;
     }
     const int status = FetchNode(tree, nodeNum, use, out);
-    if (status == kOk && hint != nullptr) {
-        SetHint(hint, *out);
+    if (status == kOk && hasHints) {
+        SetHint(parent, *out);
     }
     return status;
 }

@@ -13,8 +13,6 @@ namespace VELK {
 
 namespace {
 
-constexpr s32 kPrefetchRecords = 64;  // nodes of more records are index nodes, which stay warm
-
 // Folds an ASCII unit; 0 for NUL and for every other unit, which need the folding table.
 u16 FoldPlain(u32 unit) {
     if (unit - 1 >= 0x7F) {
@@ -85,12 +83,26 @@ private:
     u32 nameLengthAt_;
 };
 
-// Asks for the keys of the first three probes and what follows from them, all at once: waiting for
-// one after the other is what a search in a cold leaf consists of.
-void PrefetchProbes(const QuickKeys& keys, u32 count) {
-    const u32 eighth = (count + 7) / 8;
-    for (u32 index = eighth / 2; index < count; index += eighth) {
-        keys.Prefetch(index);
+// Asks for the keys that the first four probes can meet, all at once: waiting for one after the
+// other is what a search in a cold node consists of.
+void PrefetchProbes(const QuickKeys& keys, s32 high) {
+    constexpr u32 kRounds = 4;
+    struct Interval {
+        s32 low;
+        s32 high;
+    };
+    Interval intervals[(1u << kRounds) - 1] = {{0, high}};
+    for (u32 at = 0; at < (1u << kRounds) - 1; ++at) {
+        const Interval here = intervals[at];
+        if (here.low > here.high) {
+            continue;
+        }
+        const s32 middle = (here.low + here.high) >> 1;
+        keys.Prefetch(static_cast<u32>(middle));
+        if (2 * at + 2 < (1u << kRounds) - 1) {
+            intervals[2 * at + 1] = {here.low, middle - 1};
+            intervals[2 * at + 2] = {middle + 1, here.high};
+        }
     }
 }
 
@@ -150,8 +162,8 @@ int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Searc
     s32 high = static_cast<s32>(count) - 1;
     const QuickKeys keys(&tree->header, node, key);
     const bool quick = HasQuickKeys(tree->header, key, count);
-    if (quick && high < kPrefetchRecords) {
-        PrefetchProbes(keys, count);
+    if (quick) {
+        PrefetchProbes(keys, high);
     }
     while (low <= high) {
         const s32 middle = (low + high) >> 1;
