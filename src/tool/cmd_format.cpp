@@ -18,6 +18,7 @@ struct FormatArguments {
     std::optional<u64> blockSize;
     std::optional<u64> catalogSize;
     std::optional<u64> clump;
+    std::optional<u64> journal;
     std::string nodeSizes;
     std::string name;
     std::string date;
@@ -35,6 +36,7 @@ struct FormatArguments {
                      "of all trees, or by tree: c=8192,e=4096,a=8192");
         options.Size("--catalog-size", &catalogSize, "BYTES", "first size of the catalog file");
         options.Size("--clump", &clump, "BYTES", "growth step of the tree files");
+        options.Size("--journal", &journal, "BYTES", "with a journal of this size, 32K to 1G");
         options.Flag("--case-sensitive", &caseSensitive, "HFSX, names compared binary");
         options.Flag("--with-attributes", &withAttributes, "make the attributes tree as well");
         options.Flag("--empty", &empty, "no records at all: for import");
@@ -62,6 +64,7 @@ FormatOptions OptionsOf(const FormatArguments& arguments) {
     options.catalogSize = arguments.catalogSize.value_or(0);
     options.withAttributes = arguments.withAttributes;
     options.withRoot = !arguments.empty;
+    options.journalSize = arguments.journal.value_or(0);
     options.deviceIsZero = true;
     ReadNodeSizes(arguments.nodeSizes, &options);
     options.date = arguments.date.empty() ? HfsNow() : ReadDate(arguments.date);

@@ -81,23 +81,6 @@ std::unique_ptr<ImageVolume> OpenNew(const TargetOptions& target) {
     return volume;
 }
 
-// Writing to a volume that something else may still have plans for loses data.
-void RefuseUnsafe(const Invocation& call, const ImageVolume& volume) {
-    const JournalState& journal = volume.Journal();
-    if (journal.present && !journal.empty) {
-        ThrowFailed(call.image,
-                    fmt::format("the journal holds transactions ({} B): writing would lose them; "
-                                "let the native system replay it, or --force",
-                                Grouped(journal.pendingBytes)),
-                    "");
-    }
-    const u32 attributes = volume.Header().attributes;
-    if ((attributes & kVolUnmounted) == 0 || (attributes & kVolBootInconsistent) != 0) {
-        ThrowFailed(call.image, "the volume was not unmounted cleanly",
-                    "let the native system repair it, or --force");
-    }
-}
-
 void Save(const TargetOptions& options, ImageVolume* volume) {
     if (!options.force && access(options.saveFile.c_str(), F_OK) == 0) {
         ThrowFailed("", options.saveFile + " exists", "--force replaces it");
@@ -151,6 +134,8 @@ std::unique_ptr<ImageVolume> OpenTarget(const Invocation& call, const TargetOpti
     }
     OpenOptions open;
     open.access = options.write ? Access::kWrite : Access::kOverlay;
+    open.force = options.force;
+    open.replay = options.write;  // what the journal holds is carried out before anything is read
     open.offset = call.offset;
     open.partition = call.partition;
     open.backupHeader = call.backupHeader;
@@ -160,9 +145,6 @@ std::unique_ptr<ImageVolume> OpenTarget(const Invocation& call, const TargetOpti
         ImageVolume::OpenFile(call.image, open, nullptr, &problem);
     if (!volume) {
         ThrowProblem(call.image, problem);
-    }
-    if (options.write && !options.force) {
-        RefuseUnsafe(call, *volume);
     }
     return volume;
 }
@@ -179,6 +161,9 @@ void FinishTarget(const Invocation& call, const TargetOptions& options, ImageVol
     }
     if (!options.saveFile.empty()) {
         Save(options, volume);
+    }
+    if (options.write && volume->Close() != kOk) {
+        ThrowProblem(call.image, volume->LastIoProblem());
     }
     u64 changed = volume->HandedOverBlocks() - handedOverBefore;
     for (const u32 fileId : {kCatalogFileId, kExtentsFileId, kAttributesFileId}) {
