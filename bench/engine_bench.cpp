@@ -46,6 +46,8 @@ struct Result {
     u64 volumeBytes = 0;
 };
 
+constexpr u64 kMostBytesPerRecord = 400;  // of the tree file, its half-full nodes included
+
 // What the engine takes from the heap, with the allocator's own rounding.
 struct CountingHeap {
     u64 now = 0;
@@ -154,6 +156,9 @@ public:
         const int status = tree_.Create(kNodeShift, 0, nullptr);
         if (status != kOk) {
             Stop("create", 0, status);
+        }
+        if (!volume_.Supply(order_.size() * kMostBytesPerRecord)) {
+            Stop("memory", 0, kErrNoMemory);
         }
         Time("insert", order_.size(), [this] { InsertAll(); });
         result_.depth = tree_.header.treeDepth;

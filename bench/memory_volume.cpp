@@ -68,19 +68,25 @@ int MemoryVolume::Zero(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u
     return kOk;
 }
 
-int MemoryVolume::Resize(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u32, u64 newSize) {
-    auto* volume = static_cast<MemoryVolume*>(self);
-    while (volume->BytesHeld() < newSize) {
-        constexpr std::size_t kChunkSize = std::size_t{1} << kChunkShift;
+bool MemoryVolume::Supply(u64 bytes) {
+    constexpr std::size_t kChunkSize = std::size_t{1} << kChunkShift;
+    while (BytesHeld() < bytes) {
         void* chunk = std::aligned_alloc(kChunkSize, kChunkSize);
         if (chunk == nullptr) {
-            return kErrNoSpace;
+            return false;
         }
         // Huge pages, as a volume with a large cache would use: otherwise every cold node costs a
         // walk of the page tables besides, and that is measured instead of the engine.
         madvise(chunk, kChunkSize, MADV_HUGEPAGE);
         std::memset(chunk, 0, kChunkSize);
-        volume->chunks_.push_back(static_cast<u8*>(chunk));
+        chunks_.push_back(static_cast<u8*>(chunk));
+    }
+    return true;
+}
+
+int MemoryVolume::Resize(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u32, u64 newSize) {
+    if (!static_cast<MemoryVolume*>(self)->Supply(newSize)) {
+        return kErrNoSpace;
     }
     fs->catalogFork.logicalSize = newSize;
     fs->catalogFork.totalBlocks = static_cast<u32>((newSize + (1u << kMapShift) - 1) >> kMapShift);

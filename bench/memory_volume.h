@@ -18,6 +18,9 @@ public:
     MemoryVolume(const MemoryVolume&) = delete;
     MemoryVolume& operator=(const MemoryVolume&) = delete;
 
+    // Takes and touches memory for a file of `bytes` now, so that what the system needs to supply
+    // it is not measured later. False: there is none.
+    bool Supply(u64 bytes);
     u64 BytesHeld() const { return u64{chunks_.size()} << kChunkShift; }
 
     CFileSystemHfs fs;

@@ -329,13 +329,21 @@ int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNo
     const bool hasHints = parent->hints != nullptr;
     HfsNodeHint* hint = hasHints ? FindHint(parent, nodeNum) : nullptr;
     if (hint != nullptr) {
-        // Asked for all at once, as each may be cold; the node's block entries lie in its second
-        // line.
+        // Asked for all at once, as each may be cold: the node's block entries, which lie in its
+        // second line, its descriptor, and its offset table, which is long in an index node.
+        const u8* end = hint->data + tree->header.blockSize;
         __builtin_prefetch(&hint->node->bufs[0]);
         __builtin_prefetch(hint->data);
-        __builtin_prefetch(hint->data + tree->header.blockSize - 64);
+        __builtin_prefetch(end - 64);
+        if (use == NodeUse::kReadIndex) {
+            __builtin_prefetch(end - 128);
+            __builtin_prefetch(end - 192);
+        }
         CountHit(tree, hint->node);
         TakeReference(hint->node);
+        // A change moves the node to the end of the modified list, which writes to its neighbours.
+        __builtin_prefetch(hint->node->modifiedLink.next, 1);
+        __builtin_prefetch(hint->node->modifiedLink.prev, 1);
         *out = hint->node;
         return kOk;
     }
