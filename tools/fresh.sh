@@ -67,6 +67,7 @@ cp /etc/resolv.conf "$root/etc/resolv.conf"
 git clone -q --no-local "$project" "$root/root/treehfs"
 rm -rf "$root/root/treehfs/.git"
 
+separator=,
 status=0
 try() {
     local started=$SECONDS
@@ -77,8 +78,8 @@ try() {
 
 [ $# -gt 0 ] || set -- run
 command=()
-for word in "$@" ,; do
-    if [ "$word" != , ]; then
+for word in "$@" "$separator"; do
+    if [ "$word" != "$separator" ]; then
         command+=("$word")
         continue
     fi

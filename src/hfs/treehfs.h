@@ -163,106 +163,218 @@ struct BTReserve {
 unsigned GetHfsClumpSize(unsigned blockSize, unsigned nodeSize,
                          const unsigned long long& volumeSize, unsigned fileId);
 
+// One B-tree file of a volume.
+//
+// An object is made empty, told its `volume`, `fileId`, `runs` and `convert`, and brought to life
+// by Init (a tree that is there) or Create (a new one). Operations in the first groups are for
+// drivers; those that take nodes and levels are the steps they are made of, public so that each can
+// be tested and reused alone.
+//
+// Contracts that hold for all of them:
+// - A status is 0 or a value of platform/error.h. Besides those named below, each operation may
+//   return what the volume's services returned, kErrNoMemory, and kErrCorrupt for bytes that cannot
+//   be right. A failure is reported step by step (VELKError) before it is returned; an answer such
+//   as kErrNotFound is not.
+// - Keys and records that callers give and get are in host form, as `convert` defines it.
+// - Operations that change bytes ask SetDirty first. When one fails with anything but kErrNotFound,
+//   kErrExists or kErrTooLarge, its nodes may be half-changed: the volume ends its transaction,
+//   drops all paths and calls RestoreModifiedNodes on each of its trees.
+// - Nothing here locks, and no service of the volume may call back into a tree.
+//
+// Example, an exact lookup:
+//
+//     VELK::HfsFindData path;
+//     int status = tree.FindRecord(&key, parentId, &record, sizeof(record), &size, &path);
+//     path.ClearPath();
 class CBTreeHfs {
 public:
     CBTreeHfs();
     CBTreeHfs(const CBTreeHfs&) = delete;
     CBTreeHfs& operator=(const CBTreeHfs&) = delete;
 
-    // tree_open.cpp
+    // Opens the tree in its fork: geometry from the volume, header record from node 0, both checked
+    // against the limits of the format (format.h). Nothing is written; no node stays cached.
+    // REQUIRES: `volume` and `fileId` set, nothing cached.
+    // kErrInvalid: a file ID other than 3, 4, 8; nodes smaller than the volume's map block.
+    // kErrCorrupt: a header that cannot be right. After a failure only Dtor may follow.
     int Init();
+    // True when the header or the map changed since the last Flush.
     bool IsDirty() const { return isDirty; }
+    // Bytes that a volume accounts for the cached nodes, and with `withObject` for the object too.
     u64 GetMemSize(bool withObject) const;
 
-    // cache.cpp
+    // Gives node `nodeNum` with a reference of the caller's, from the cache or mapped from the
+    // volume. `makeEmpty` gives it zeroed and marked modified, with its first offset slot written.
+    // kErrCorrupt: a number not below `totalNodes`, unless made empty. `*out` is null on failure.
     int GetINode(unsigned nodeNum, HfsNode** out, bool makeEmpty);
+    // Gives a reference back. The node leaves the cache with its last one, and what was changed in
+    // it is lost: for the volume, on nodes it knows to be clean. The flag is ignored.
     void PutINode(HfsNode* node, bool ignored);
 
-    // cache_dirty.cpp
+    // Announces a change of `length` bytes at node offset `offset`: gets the journal's access for
+    // each clean block they lie in and lists the node as modified. No byte may change before.
     int SetDirty(HfsNode* node, unsigned offset, unsigned length);
+    // The same for the one block that holds `offset`.
     int SetDirty(HfsNode* node, unsigned offset);
+    // Announces and zeroes the whole node.
     int Zero(HfsNode* node);
+    // Hands the node's dirty blocks to the volume (DirtyMeta). A block that was refused stays
+    // dirty.
     int FlushINode(HfsNode* node);
+    // Hands over all dirty blocks and drops the modified nodes that nobody holds.
     int Clear();
 
-    // tree_flush.cpp
+    // Checkpoint: writes the header record into node 0 if it changed, and hands over all dirty
+    // blocks. The tree's own path is released. `mode` 4 also zeroes the nodes of the file that
+    // never held data, on the volume; 0 does not. Whether bytes are then on disk is the volume's
+    // business.
     int Flush(unsigned long mode);
+    // Drops all nodes, dirty or not, and the scratch memory. Init may follow.
     void Dtor();
+    // Drops every change since the last Flush and reads the header again.
+    // REQUIRES: no path but the tree's own holds nodes. If IsDirty() is still true afterwards the
+    // header could not be read: the volume goes read-only.
     void RestoreModifiedNodes();
 
-    // path_find.cpp
+    // Lets the path hold node `nodeNum` at `level` (1 the leaves, at most 15), index 0, instead of
+    // the node it holds there. kErrCorrupt: a node of another level or kind.
     int ReadLevel(int level, unsigned nodeNum, HfsFindData* fd);
+    // Looks `key` up; `keyArg` is the ID the comparator takes: parent ID of a catalog key, file ID
+    // of an extents or attributes key. An absent key is status 0 and `*found` false; the path then
+    // stands where it would be inserted. `record` and `keyOut` (each may be null) take as many
+    // bytes as their sizes say on entry; on return these say how many were delivered.
     int FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, bool* found, void* record,
                   unsigned* recordSize, void* keyOut, unsigned* keyOutSize);
+    // Exact lookup of a record. kErrNotFound: no such key, or an empty tree.
+    // REQUIRES: recordCapacity >= convert.minDataBuffer when `record` is given.
     int FindRecord(const void* key, unsigned keyArg, void* record, unsigned recordCapacity,
                    unsigned* recordSize, HfsFindData* fd);
 
-    // path_iterate.cpp
+    // Steps `count` records along the leaves and delivers the record there. 0 delivers the one at
+    // the position, or the next leaf's first when a lookup ended behind a leaf's last record.
+    // A step back over the start of a leaf lands on the first record of the leaf before.
+    // kErrNotFound: over either end of the chain, or an empty tree. A record that is longer than
+    // its buffer is cut. `record` must be given, `keyOut` may be null. REQUIRES: a valid path;
+    // keyCapacity and recordCapacity not below the minima of `convert`.
     int IncPos(int count, void* record, unsigned recordCapacity, unsigned* recordSize, void* keyOut,
                unsigned keyCapacity, unsigned* keySize, HfsFindData* fd);
+    // The position as a number that SetPos takes while the tree is unchanged: node number shifted
+    // by `nodeShift`, plus the record's index; all bits set when the path holds no leaf. Also
+    // converts `key` to disk form into `keyCopy`.
     u64 GetPos(const HfsFindData* fd, const CatalogKey* key, CatalogKey* keyCopy) const;
+    // Goes to a position and delivers its record as IncPos does. REQUIRES: a cleared path, level 0.
+    // kErrNotFound: no such node in the tree; kErrCorrupt: a node that is no leaf.
     int SetPos(const unsigned long long& pos, void* record, unsigned recordCapacity,
                unsigned* recordSize, void* keyOut, unsigned keyCapacity, unsigned* keySize,
                HfsFindData* fd);
 
-    // badblocks.cpp
+    // Adds the extents of the bad-block file to `runs`; of the extents tree only. A volume without
+    // such a file adds nothing. kErrBadRecord: its first record has not 64 bytes; kErrNoMemory: a
+    // run was refused. What was added stays. Uses the tree's own path.
     int LoadBadBlocks(HfsRuns* runs);
 
-    // record_insert.cpp
-    int _InsertRecord(HfsNode* node, int index, unsigned size, NodeKey* key, bool* inserted);
-    int _InsertKeyRecord(HfsNode* node, int index, const BTreeKey* key, unsigned keyLen,
-                         const void* data, unsigned dataSize, HfsConvert* convert, bool* inserted);
-    int _InsertKeyRecord(HfsNode* node, int index, const BTreeKey* key, unsigned keyLen,
-                         const void* data, unsigned dataSize, HfsConvert* convert);
-
-    // record_delete.cpp, record_move.cpp, record_update.cpp
-    int _DeleteRecord(HfsNode* node, int index);
-    int _RotateRecordLeft(HfsNode* left, HfsNode* right);
-    int _RotateRecordRight(HfsNode* right, HfsNode* left);
+    // Inserts a record; `keyLen` is the ID the comparator takes. Splits, grows the file and adds
+    // levels as needed. An odd `dataSize` is padded with a zero.
+    // kErrExists: the key is there; kErrTooLarge: no node can hold it; kErrInvalid: no data. With
+    // these nothing changed.
+    int InsertRecord(const void* key, unsigned keyLen, const void* data, unsigned dataSize);
+    // Removes the record of `key` or, with a null key or `usePath` and a valid path of the tree's
+    // own, the one that path stands on; `keyLength` is the ID the comparator takes.
+    // kErrNotFound: no such key; kErrInvalid: no position to delete at. With these nothing changed.
+    int DeleteRecord(const void* key, unsigned keyLength, bool usePath);
+    // Overwrites the data of the record at the tree's own position, as many bytes as it has. `key`
+    // is null; a key is never written. When it fails nothing was written.
+    // REQUIRES: `data` holds as many bytes as the record's data.
     int UpdateKeyAndRecord(const void* key, const void* data);
 
-    // balance.cpp
-    int _RotateLeft(HfsNode* left, HfsNode* node, int index, const BTreeKey* key, const void* data,
-                    unsigned dataSize, int* outIndex, unsigned* outNodeNum, bool* rotated,
-                    unsigned* moved, HfsConvert* convert);
-    int _RotateRight(HfsNode* node, HfsNode* right, int index, const BTreeKey* key,
-                     const void* data, unsigned dataSize, int* outIndex, unsigned* outNodeNum,
-                     unsigned* moved, HfsConvert* convert);
-
-    // insert_entry.cpp, insert_level.cpp, insert_node.cpp
-    // `keyLen` of InsertRecord and `keyLength` of DeleteRecord are the comparator's ID argument:
-    // the parent ID of a catalog key, the file ID of an extents or attributes key.
-    int InsertRecord(const void* key, unsigned keyLen, const void* data, unsigned dataSize);
-    int InsertTree(const BTreeKey* key, const void* data, unsigned dataSize, HfsNode* node,
-                   int index, int level, bool replacesSeparator, HfsFindData* path,
-                   HfsConvert* convert);
-    int InsertLevel(HfsFindData* path, InsertKey* first, const InsertKey* second, HfsNode* node,
-                    int index, int level);
-    int InsertNode(const InsertKey* insertKey, HfsNode* node, unsigned nodeNum, int index,
-                   unsigned* outNodeNum, int* outIndex, HfsNode** newNode, bool* firstKeyChanged,
-                   bool* enterNewNode, HfsNode** newRoot);
-
-    // delete_tree.cpp
-    int DeleteRecord(const void* key, unsigned keyLength, bool usePath);
-    int DeleteTree(int level, HfsFindData* path);
-
-    // map_walk.cpp, map_alloc.cpp
-    u32 CalcMapBits() const;
-    int GetMapNode(HfsNode** node);
-    int AllocateNode(HfsNode** node);
-    int FreeNode(unsigned nodeNumber);
-
-    // space_extend.cpp, space_reserve.cpp
-    int ExtendBTree(unsigned wantedNodes, const unsigned long long* newFileSize,
-                    const unsigned* growBytes);
+    // Makes sure that nodes for the insertions to come are there, by growing the file now.
+    // `request`: the splits to be ready for, in two classes: plain ones in the low 16 bits, in the
+    // high 16 bits those that may use the part of the volume kept back from others. `reserve`
+    // (null: only grow) notes what was promised. kErrNoSpace: the volume has only that part left.
     int ReserveSpace(int request, BTReserve* reserve);
     // Ends the reservation that `reserve` opened: its nodes are no longer promised to anyone. A
     // reservation that only joined an open one ends with that one, so releasing it changes nothing.
     // Cannot fail; safe to repeat. Release before RestoreModifiedNodes and Dtor.
     void ReleaseSpace(BTReserve* reserve);
-
-    // tree_create.cpp
+    // Grows the file by whole clumps until it holds `wantedNodes` nodes, or to `newFileSize` bytes
+    // when given; `growBytes` replaces the fork's clump size. Never shrinks. A failure after the
+    // fork was resized leaves `totalNodes` new, `freeNodes` old and the header unsaved.
+    int ExtendBTree(unsigned wantedNodes, const unsigned long long* newFileSize,
+                    const unsigned* growBytes);
+    // Makes an empty tree in an empty fork: nodes of 1 << `nodeShift` bytes (9 to 15), the file of
+    // `initialSize` bytes or one clump. The flag is ignored.
+    // REQUIRES: `volume`, `fileId`, `runs` set; for a catalog or extents tree also `compareKeys`
+    // and the header's `attributes` and `maxKeyLength`. kErrInvalid: a node size out of range or
+    // below the map block, or no comparator. When it cannot be finished the fork is empty again.
     int Create(unsigned nodeShift, unsigned char ignored, const unsigned long long* initialSize);
+
+    // One node: opens a gap of `size` bytes at record `index` (-1: behind the last record). `key`
+    // then describes its place; its `size` and slot fields are those of the free space before.
+    // `*inserted` false: it does not fit, nothing changed. A failure leaves what was moved.
+    int _InsertRecord(HfsNode* node, int index, unsigned size, NodeKey* key, bool* inserted);
+    // One node: inserts a record. `keyLen`, when not 0, is the length its stored key claims; the
+    // space follows the key's own length all the same. Exactly `dataSize` bytes are read. A null
+    // `convert` takes key and data as they are. A failure after the gap was opened leaves a record
+    // whose bytes are not all written.
+    int _InsertKeyRecord(HfsNode* node, int index, const BTreeKey* key, unsigned keyLen,
+                         const void* data, unsigned dataSize, HfsConvert* convert, bool* inserted);
+    // The same where it has to fit: kErrTooLarge when it does not.
+    int _InsertKeyRecord(HfsNode* node, int index, const BTreeKey* key, unsigned keyLen,
+                         const void* data, unsigned dataSize, HfsConvert* convert);
+    // One node: removes record `index` (-1: the last one). Bytes that become free space are not
+    // cleared. A failure part way leaves what was moved so far in place.
+    int _DeleteRecord(HfsNode* node, int index);
+
+    // Two nodes: moves record 0 of `right` behind the records of `left`. A failure of the deletion
+    // leaves the record in both.
+    int _RotateRecordLeft(HfsNode* left, HfsNode* right);
+    // Two nodes: moves the last record of `left` in front of the records of `right`, likewise.
+    int _RotateRecordRight(HfsNode* right, HfsNode* left);
+    // Shares the records of a full `node` and one new record, to stand at `index`, with its left
+    // sibling. `*outNodeNum` and `*outIndex` say where the new record went, `*moved` how many
+    // records went over. `*rotated` false: the two cannot hold it together, nothing changed. A
+    // failure leaves the records moved so far in the left sibling.
+    int _RotateLeft(HfsNode* left, HfsNode* node, int index, const BTreeKey* key, const void* data,
+                    unsigned dataSize, int* outIndex, unsigned* outNodeNum, bool* rotated,
+                    unsigned* moved, HfsConvert* convert);
+    // The same with an empty right sibling; places the record or fails.
+    int _RotateRight(HfsNode* node, HfsNode* right, int index, const BTreeKey* key,
+                     const void* data, unsigned dataSize, int* outIndex, unsigned* outNodeNum,
+                     unsigned* moved, HfsConvert* convert);
+
+    // Inserts a record at `index` of `node`, which the path holds at `level`, and carries the
+    // consequences up the path. Also makes the first leaf of an empty tree.
+    int InsertTree(const BTreeKey* key, const void* data, unsigned dataSize, HfsNode* node,
+                   int index, int level, bool replacesSeparator, HfsFindData* path,
+                   HfsConvert* convert);
+    // One level of an insertion: puts one or two records (`second` may be null) into `node`, then
+    // tells the parent by a call for the level above. A failure leaves the levels done so far.
+    // REQUIRES: `node` is the one that the path holds at `level`; if the insertion reaches the
+    // parent, the levels above are those that lead to it.
+    int InsertLevel(HfsFindData* path, InsertKey* first, const InsertKey* second, HfsNode* node,
+                    int index, int level);
+    // Puts a record at `index` of `node`, or of `*newNode` when `nodeNum` names that one: as it is,
+    // shared with the left sibling, or by a split; a root that splits gets a new root. The two
+    // flags are set or left as they are. `*newNode` and `*newRoot` come back as references of the
+    // caller, and so may the left sibling in `*newNode`; a failure releases them, also a node that
+    // came in.
+    int InsertNode(const InsertKey* insertKey, HfsNode* node, unsigned nodeNum, int index,
+                   unsigned* outNodeNum, int* outIndex, HfsNode** newNode, bool* firstKeyChanged,
+                   bool* enterNewNode, HfsNode** newRoot);
+    // Removes the record at the path's position in `level` and what follows from it above: unlinks
+    // an empty node, replaces a separator, collapses the root. A failure leaves the levels done so
+    // far changed.
+    int DeleteTree(int level, HfsFindData* path);
+
+    // Bits that the map has to have for `totalNodes`: node 0's, and whole map nodes behind it.
+    u32 CalcMapBits() const;
+    // Steps along the map: from null to node 0, from a map node to the next. The node that comes in
+    // is given back in any case; on failure none comes out. kErrCorrupt: the chain ended.
+    int GetMapNode(HfsNode** node);
+    // Marks the lowest free node used and gives it, empty, with a reference of the caller's.
+    int AllocateNode(HfsNode** node);
+    // Marks a node free. Its content is neither read nor changed.
+    int FreeNode(unsigned nodeNumber);
 
     CFileSystemHfs* volume = nullptr;  // set before Init or Create
     rb_node* nodeRoot = nullptr;       // cached nodes by number

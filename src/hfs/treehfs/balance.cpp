@@ -113,8 +113,6 @@ bool CanShare(const BTHeaderMem* hdr, const HfsNode* giver, const HfsNode* recei
 
 }  // namespace
 
-// `*rotated` false: the two nodes cannot hold the record together, nothing changed.
-// A failure leaves the records moved so far in the left sibling.
 int CBTreeHfs::_RotateLeft(HfsNode* left, HfsNode* node, int index, const BTreeKey* key,
                            const void* data, unsigned dataSize, int* outIndex, unsigned* outNodeNum,
                            bool* rotated, unsigned* moved, HfsConvert* hook) {
@@ -154,7 +152,6 @@ int CBTreeHfs::_RotateLeft(HfsNode* left, HfsNode* node, int index, const BTreeK
     return kOk;
 }
 
-// Places the record or fails. A failure leaves the records moved so far in the right sibling.
 int CBTreeHfs::_RotateRight(HfsNode* node, HfsNode* right, int index, const BTreeKey* key,
                             const void* data, unsigned dataSize, int* outIndex,
                             unsigned* outNodeNum, unsigned* moved, HfsConvert* hook) {

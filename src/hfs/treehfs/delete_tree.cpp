@@ -179,8 +179,6 @@ int ReserveForDeletion(CBTreeHfs* tree) {
 
 }  // namespace
 
-// Removes the record at the path's position in `level` and what follows from it above.
-// A failure leaves the levels done so far changed.
 int CBTreeHfs::DeleteTree(int level, HfsFindData* path) {
     if (!CanDeleteAt(this, path, level)) {
         return Fail(kErrInvalid, kReasonInvalid, 9267);
@@ -209,7 +207,6 @@ int CBTreeHfs::DeleteTree(int level, HfsFindData* path) {
     return kOk;
 }
 
-// Deletes the record of `key`, or with a null key or `usePath` the one the tree's path stands on.
 int CBTreeHfs::DeleteRecord(const void* key, unsigned keyLength, bool usePath) {
     if (key != nullptr && !(usePath && findData.valid)) {
         bool found = false;

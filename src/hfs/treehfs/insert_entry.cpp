@@ -53,8 +53,6 @@ int ReserveForSplits(CBTreeHfs* tree) {
 
 }  // namespace
 
-// Inserts a record that is not there yet. An odd `dataSize` is padded with a zero.
-// A failure may leave nodes half-changed: the volume restores.
 int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, unsigned dataSize) {
     const BTreeKey* searchKey = static_cast<const BTreeKey*>(key);
     const u64 evenDataSize = (static_cast<u64>(dataSize) + 1) / 2 * 2;
@@ -101,8 +99,6 @@ int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, 
     return kOk;
 }
 
-// Inserts a record at `index` of `node`, which the path holds at `level`, and carries the
-// consequences up the path.
 int CBTreeHfs::InsertTree(const BTreeKey* key, const void* data, unsigned dataSize, HfsNode* node,
                           int index, int level, bool replacesSeparator, HfsFindData* path,
                           HfsConvert* hook) {

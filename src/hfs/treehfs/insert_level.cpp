@@ -135,9 +135,6 @@ int TellParent(CBTreeHfs* tree, HfsFindData* path, HfsNode* node, const LevelCha
 
 }  // namespace
 
-// REQUIRES: `node` is the one that the path holds at `level`; if the insertion reaches the parent,
-// the levels above are those that lead to it.
-// A failure leaves the levels done so far changed.
 int CBTreeHfs::InsertLevel(HfsFindData* path, InsertKey* first, const InsertKey* second,
                            HfsNode* node, int index, int level) {
     if (level < 1 || static_cast<u32>(level) > kMaxPathDepth) {

@@ -213,10 +213,6 @@ int Place(CBTreeHfs* tree, const InsertKey& key, HfsNode* node, unsigned nodeNum
 
 }  // namespace
 
-// Puts a record at `index` of `node`, or of `*newNode` when `nodeNum` names that one.
-// The two flags are set or left as they are. `*newNode` and `*newRoot` come back as references of
-// the caller, and so may the left sibling in `*newNode`; a failure releases them, also a node
-// that came in. Nodes already changed are not restored.
 int CBTreeHfs::InsertNode(const InsertKey* insertKey, HfsNode* node, unsigned nodeNum, int index,
                           unsigned* outNodeNum, int* outIndex, HfsNode** newNode,
                           bool* firstKeyChanged, bool* enterNewNode, HfsNode** newRoot) {

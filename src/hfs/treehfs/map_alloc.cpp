@@ -81,7 +81,6 @@ int CBTreeHfs::AllocateNode(HfsNode** node) {
     return TakeFreeNode(this, false, node);
 }
 
-// Marks a node free. Its content is neither read nor changed.
 int CBTreeHfs::FreeNode(unsigned nodeNumber) {
     HFS_ASSERT(nodeNumber < header.totalNodes, 3778);
     if (nodeNumber >= header.totalNodes) {

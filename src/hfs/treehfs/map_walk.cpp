@@ -55,8 +55,8 @@ u8 MaskOf(u64 bitInPiece) {
 
 }  // namespace
 
-// Adds whole map nodes to node 0's record until `totalNodes` has its bits. Worked out at once and
-// in 64 bits: near 2^32 nodes a sum of 32 bits would pass the number and never reach it.
+// Worked out at once and in 64 bits: near 2^32 nodes a sum of 32 bits would pass the number of map
+// nodes and never reach it.
 u32 CBTreeHfs::CalcMapBits() const {
     if (header.nodeSize < (1u << kMinNodeShift)) {
         return 0;
@@ -70,8 +70,6 @@ u32 CBTreeHfs::CalcMapBits() const {
     return static_cast<u32>(head + mapNodes * step);
 }
 
-// Steps along the chain: from null to node 0, from a map node to the next. The node that comes in
-// is given back in any case; on failure none comes out.
 int CBTreeHfs::GetMapNode(HfsNode** node) {
     NodeRef before(*node);
     *node = nullptr;

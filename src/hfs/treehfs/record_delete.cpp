@@ -38,9 +38,6 @@ int CloseSlots(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 ind
 
 }  // namespace
 
-// Removes record `index` (-1: the last one). Bytes that become free space are not cleared.
-// Marks modified the slots, the moved bytes and the descriptor. A failure part way leaves what was
-// moved so far in place.
 int CBTreeHfs::_DeleteRecord(HfsNode* node, int index) {
     const u32 count = NumRecords(node);
     const u32 record = index == -1 ? count - 1 : static_cast<u32>(index);

@@ -98,9 +98,6 @@ int StoreData(CBTreeHfs* tree, const NodeBytes& bytes, u32 offset, const void* d
 
 }  // namespace
 
-// Opens a gap of `size` bytes at record `index` (-1: behind the last record). `key` then describes
-// its place; its `size` and slot fields are those of the free space before the insertion.
-// Marks modified what it moves, the slots and the descriptor. A failure leaves what was moved.
 int CBTreeHfs::_InsertRecord(HfsNode* node, int index, unsigned size, NodeKey* key,
                              bool* inserted) {
     const u32 count = NumRecords(node);
@@ -147,9 +144,6 @@ int CBTreeHfs::_InsertRecord(HfsNode* node, int index, unsigned size, NodeKey* k
     return kOk;
 }
 
-// Inserts a record. `keyLen`, when not 0, is the length its stored key claims; the space follows
-// the key's own length all the same. Exactly `dataSize` bytes are read; a zero pads an odd size.
-// A failure after the gap was opened leaves a record whose bytes are not all written.
 int CBTreeHfs::_InsertKeyRecord(HfsNode* node, int index, const BTreeKey* key, unsigned keyLen,
                                 const void* data, unsigned dataSize, HfsConvert* hook,
                                 bool* inserted) {

@@ -6,8 +6,6 @@
 
 namespace VELK {
 
-// Moves record 0 of `right` behind the records of `left`.
-// A failure of the deletion leaves the record in both nodes.
 int CBTreeHfs::_RotateRecordLeft(HfsNode* left, HfsNode* right) {
     NodeKey source{};
     HFS_TRY(right->GetKey(&header, 0, &source), 1616);
@@ -23,8 +21,6 @@ int CBTreeHfs::_RotateRecordLeft(HfsNode* left, HfsNode* right) {
     return kOk;
 }
 
-// Moves the last record of `left` in front of the records of `right`.
-// A failure of the deletion leaves the record in both nodes.
 int CBTreeHfs::_RotateRecordRight(HfsNode* right, HfsNode* left) {
     const int last = static_cast<int>(NumRecords(left)) - 1;
     NodeKey source{};

@@ -34,8 +34,6 @@ int WriteData(CBTreeHfs* tree, HfsNode* node, const NodeKey& record, u32 offset,
 
 }  // namespace
 
-// REQUIRES: `data` holds at least as many bytes as the record's data. A key is never written.
-// Marks modified the record's data. Nothing is written when that fails.
 int CBTreeHfs::UpdateKeyAndRecord(const void* key, const void* data) {
     HFS_ASSERT(key != nullptr || data != nullptr, 3548);
     if (!StandsOnLeaf(&findData, 0)) {

@@ -161,8 +161,6 @@ int AddMapNodes(CBTreeHfs* tree, const Growth& growth, MapWalk* walk) {
 
 }  // namespace
 
-// Grows the file so that it holds `wantedNodes` nodes. A failure after the fork was resized leaves
-// `totalNodes` new, `freeNodes` old and the header unsaved: the volume restores.
 int CBTreeHfs::ExtendBTree(unsigned wantedNodes, const unsigned long long* newFileSize,
                            const unsigned* growBytes) {
     if (header.totalNodes >= wantedNodes) {
