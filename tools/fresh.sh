@@ -52,9 +52,9 @@ inside() {
     # shellcheck disable=SC2016  # expanded by the inner shell
     unshare --mount --pid --fork bash -c '
         mount -t proc proc "$1/proc" && mount --rbind /dev "$1/dev" && shift_root=$1 && shift &&
-        exec chroot "$shift_root" /usr/bin/env -i HOME=/root LANG=C.UTF-8 \
+        exec chroot "$shift_root" /usr/bin/env -i HOME=/srv LANG=C.UTF-8 \
             PATH=/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin \
-            bash -c "cd /root/treehfs && exec \"\$@\"" bash "$@"' fresh "$root" "$@"
+            bash -c "cd /srv/treehfs && exec \"\$@\"" bash "$@"' fresh "$root" "$@"
 }
 
 mkdir -p "$work"
@@ -64,8 +64,8 @@ rm -rf "$root"
 mkdir -p "$root"
 tar -C "$root" -xf "$base"
 cp /etc/resolv.conf "$root/etc/resolv.conf"
-git clone -q --no-local "$project" "$root/root/treehfs"
-rm -rf "$root/root/treehfs/.git"
+git clone -q --no-local "$project" "$root/srv/treehfs"
+rm -rf "$root/srv/treehfs/.git"
 
 separator=,
 status=0
