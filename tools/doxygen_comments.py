@@ -3,43 +3,64 @@
 
 The sources are commented for those who read them there. Here the same comments become the site's:
 - the first comment of a file is the file's;
-- a comment on lines of its own describes what follows, up to the next comment, blank line or end
-  of the block: several declarations in a row share it;
-- a comment behind code describes what stands before it.
+- a comment on lines of its own describes what follows. Declarations that follow each other without
+  a blank line or another comment share it;
+- a comment behind code describes what stands before it, also inside such a group.
 """
 import re
 import sys
 
-own_line = re.compile(r'^(\s*)//( .*|)$')
-behind = re.compile(r'^(.*\S\s+)// (.*)$')
-ends_group = re.compile(r'^\s*(\}.*|)$')
-opens_block = re.compile(r'[{(,]\s*(//.*)?$')
+comment_line = re.compile(r'^(\s*)//( .*|)$')
+behind = re.compile(r'^(\s*[^\s}/].*)// (.*)$')
+opens_scope = re.compile(r'^\s*(class|struct|union|enum|namespace|extern "C"|template|public|private)\b')
+literal = re.compile(r'"(\\.|[^"\\])*"|\'(\\.|[^\'\\])\'')
+
+
+def code_of(line):
+    """The line without its comment and without what literals hold."""
+    return re.sub(r'\s*//.*', '', literal.sub('0', line)).rstrip()
+
+
+def depth_change(code):
+    return sum(code.count(c) for c in '({[') - sum(code.count(c) for c in ')}]')
+
+
+def group_length(lines, first):
+    """How many lines from `first` on are declarations that share the comment before them; 0 if
+    there is but one, or if what follows opens a scope of its own."""
+    declarations, depth, number = 0, 0, first
+    while number < len(lines):
+        code = code_of(lines[number])
+        at_edge = depth == 0 and (not code or opens_scope.match(code) or code.startswith('#'))
+        depth += depth_change(code)
+        if at_edge or depth < 0:
+            break
+        if depth == 0 and code.endswith((';', '}')):
+            declarations += 1
+        number += 1
+    return number - first if declarations > 1 else 0
 
 
 def filtered(lines):
-    is_open = False  # a group of declarations that share a comment
-    previous_was_comment = False
+    group_ends = -1  # line in front of which a group closes
+    after_comment = False
     for number, line in enumerate(lines):
-        comment = own_line.match(line)
-        if is_open and (comment or ends_group.match(line)):
+        if number == group_ends:
             yield '/// @}'
-            is_open = False
+        comment = comment_line.match(line)
         if comment:
             if number == 0:
                 yield '/// \\file'
             yield f'{comment[1]}///{comment[2]}'
-            previous_was_comment = True
-            continue
-        code = re.sub(r'\s*//.*', '', line)
-        if previous_was_comment and code.endswith(';') and not code.startswith(('#', 'namespace')):
-            following = lines[number + 1] if number + 1 < len(lines) else ''
-            if following.strip() and not ends_group.match(following) and not own_line.match(following):
+        else:
+            length = group_length(lines, number) if after_comment else 0
+            if length:
                 yield '/// @{'
-                is_open = True
-        previous_was_comment = False
-        tail = behind.match(line)
-        yield f'{tail[1]}///< {tail[2]}' if tail else line
-    if is_open:
+                group_ends = number + length
+            tail = behind.match(line)
+            yield f'{tail[1]}///< {tail[2]}' if tail else line
+        after_comment = bool(comment)
+    if group_ends == len(lines):
         yield '/// @}'
 
 

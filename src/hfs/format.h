@@ -35,10 +35,11 @@ constexpr u32 kDescReserved = 12;    // u16: 0
 constexpr u32 kDescSize = 14;        // record 0 starts here
 constexpr u32 kSlotSize = 2;         // one entry of the offset table
 
-constexpr s8 kBTLeafNode = -1;
-constexpr s8 kBTIndexNode = 0;
-constexpr s8 kBTHeaderNode = 1;
-constexpr s8 kBTMapNode = 2;
+// Kinds of nodes, as the descriptor holds them.
+constexpr s8 kBTLeafNode = -1;   // records: key and data
+constexpr s8 kBTIndexNode = 0;   // records: key and child's node number
+constexpr s8 kBTHeaderNode = 1;  // node 0
+constexpr s8 kBTMapNode = 2;     // goes on with the map of node 0
 
 // Header record (record 0 of node 0), as offsets in the node.
 constexpr u32 kHeadTreeDepth = 14;       // u16
@@ -73,11 +74,11 @@ static_assert(kHeadMapOverhead == 256 && kMapNodeOverhead == 20);
 
 constexpr u32 kBTBigKeysMask = 2;            // key lengths are 16 bits wide
 constexpr u32 kBTVariableIndexKeysMask = 4;  // index keys have their own length
-constexpr u8 kKeyCompareBinary = 0xBC;
-constexpr u8 kKeyCompareFolding = 0xCF;
+constexpr u8 kKeyCompareBinary = 0xBC;       // names by their code units; HFSX only
+constexpr u8 kKeyCompareFolding = 0xCF;      // names regardless of case
 
-constexpr u32 kMinNodeShift = 9;
-constexpr u32 kMaxNodeShift = 15;
+constexpr u32 kMinNodeShift = 9;    // log2 of the least node size, 512 bytes
+constexpr u32 kMaxNodeShift = 15;   // log2 of the greatest node size, 32,768 bytes
 constexpr u32 kMaxOpenDepth = 16;   // a header may claim this much and still opens
 constexpr u32 kMaxPathDepth = 15;   // levels a search path can hold
 constexpr u32 kMaxKeyLength = 520;  // of any key the engine accepts, without its length field
@@ -91,6 +92,7 @@ constexpr u32 kAllocationFileId = 6;
 constexpr u32 kStartupFileId = 7;
 constexpr u32 kAttributesFileId = 8;
 
+// Versions in the volume header.
 constexpr u16 kVersionHfsPlus = 4;
 constexpr u16 kVersionHfsx = 5;
 
@@ -100,42 +102,43 @@ constexpr u32 kKeyLengthSize = 2;
 
 constexpr u32 kCatKeyParentId = 2;    // u32
 constexpr u32 kCatKeyNameLength = 6;  // u16: UTF-16 code units
-constexpr u32 kCatKeyName = 8;
-constexpr u32 kCatKeyFixed = 6;  // least key length
+constexpr u32 kCatKeyName = 8;        // u16[]: the name
+constexpr u32 kCatKeyFixed = 6;       // least key length
 
 constexpr u32 kExtKeyForkType = 2;    // u8: 0 data, 0xFF resource
 constexpr u32 kExtKeyPad = 3;         // u8
 constexpr u32 kExtKeyFileId = 4;      // u32
 constexpr u32 kExtKeyStartBlock = 8;  // u32
-constexpr u32 kExtKeyFixed = 10;
-constexpr u32 kExtKeySize = 12;  // with its length field
+constexpr u32 kExtKeyFixed = 10;      // the one key length there is
+constexpr u32 kExtKeySize = 12;       // with its length field
 
 constexpr u32 kAttrKeyPad = 2;          // u16
 constexpr u32 kAttrKeyFileId = 4;       // u32
 constexpr u32 kAttrKeyStartBlock = 8;   // u32
 constexpr u32 kAttrKeyNameLength = 12;  // u16
-constexpr u32 kAttrKeyName = 14;
-constexpr u32 kAttrKeyFixed = 12;
+constexpr u32 kAttrKeyName = 14;        // u16[]: the name
+constexpr u32 kAttrKeyFixed = 12;       // least key length
 
+// Greatest key length of each tree, without the length field: what its header's maxKeyLength holds.
 constexpr u32 kCatMaxKeyLength = 516;
 constexpr u32 kExtMaxKeyLength = 10;
 constexpr u32 kAttrMaxKeyLength = 266;
 
-constexpr u32 kExtentCount = 8;  // descriptors of an extent record
-constexpr u32 kExtentRecordSize = 64;
-constexpr u8 kForkData = 0x00;
-constexpr u8 kForkResource = 0xFF;
+constexpr u32 kExtentCount = 8;        // descriptors of an extent record
+constexpr u32 kExtentRecordSize = 64;  // bytes: start block and block count for each, u32
+constexpr u8 kForkData = 0x00;         // fork type of an extents key: the data fork
+constexpr u8 kForkResource = 0xFF;     // the resource fork
 
 // A key as the comparators see it: bytes, the first two of which are the key length. Search keys
 // are in host order and 4-byte aligned, node keys big-endian; only byte-wise access is made to
 // either.
 struct BTreeKey {
-    u8 length[2];
+    u8 length[2];  // bytes that follow these two
 };
 
 // A catalog key in host order, with room for the longest name.
 struct alignas(4) CatalogKey {
-    u8 bytes[kKeyLengthSize + kCatMaxKeyLength + 2];
+    u8 bytes[kKeyLengthSize + kCatMaxKeyLength + 2];  // fields at kCatKey...
 };
 
 }  // namespace VELK

@@ -20,14 +20,15 @@ using HfsRuns = CRunMapperT<unsigned int>;
 
 // One map block of a node, as `Map` fills it. The engine borrows it until it calls Release.
 struct HfsBcbBuf {
-    buffer_head* bh;
-    u8* data;    // mapBlockSize bytes, 8-byte aligned
-    bool dirty;  // changed in memory and not handed over yet; kept by the engine
+    buffer_head* bh;  // the volume's handle, given back with Release
+    u8* data;         // mapBlockSize bytes, 8-byte aligned
+    bool dirty;       // changed in memory and not handed over yet; kept by the engine
 };
 
+// A run of allocation blocks (HFS+ volume format, extent descriptor), in host order.
 struct HfsExtent {
-    u32 startBlock;  // allocation block
-    u32 blockCount;
+    u32 startBlock;  // first allocation block on the volume
+    u32 blockCount;  // allocation blocks; 0: the descriptor is unused
 };
 
 // Fork record of the volume header (HFS+ volume format), in host order.
@@ -35,7 +36,7 @@ struct HfsFork {
     u64 logicalSize;  // bytes
     u32 clumpSize;    // growth step in bytes; 0 = the volume's default
     u32 totalBlocks;  // allocation blocks of all extents, those in the overflow tree included
-    HfsExtent extents[kExtentCount];
+    HfsExtent extents[kExtentCount];  // the first eight; further ones lie in the extents tree
 };
 
 // What the volume does for a tree file. `self` is the context of the table, `fs` the volume the
@@ -62,52 +63,70 @@ struct HfsVolumeOps {
 
 // The buffer cache that lends map blocks.
 struct HfsCacheOps {
-    void (*Release)(void* self, buffer_head* bh, int flag);  // gives a block back; null bh allowed
-    void (*BeginModify)(void* self, buffer_head* bh);        // around the zero-filling of
-    void (*EndModify)(void* self, buffer_head* bh);          // a brand-new block
+    // Gives a block back; null is allowed. The engine passes flag 0.
+    void (*Release)(void* self, buffer_head* bh, int flag);
+    // Stand before and behind the zero-filling of a brand-new block.
+    void (*BeginModify)(void* self, buffer_head* bh);
+    void (*EndModify)(void* self, buffer_head* bh);
 };
 
-// The journal, where there is one.
+// The journal, where there is one. Both return a status; any but 0 stops the operation before the
+// block has changed.
 struct HfsJournalOps {
     int (*GetWriteAccess)(void* self, buffer_head* bh);   // before a block first changes
     int (*GetCreateAccess)(void* self, buffer_head* bh);  // before a brand-new block is zero-filled
 };
 
+// A table of functions with the context its entries get. Both stay the volume's.
 template <typename Ops>
 struct HfsService {
-    const Ops* ops = nullptr;
-    void* self = nullptr;
+    const Ops* ops = nullptr;  // null: the service is not there
+    void* self = nullptr;      // passed to each entry
 
+    // Whether the service is there.
     explicit operator bool() const { return ops != nullptr; }
 };
 
+// The buffer cache as the engine holds it, one per volume.
 struct HfsBufferCache {
-    const HfsCacheOps* ops = nullptr;
-    void* self = nullptr;
+    const HfsCacheOps* ops = nullptr;  // set before a tree is opened
+    void* self = nullptr;              // passed to each entry
 
+    // The calls of the table, with its context.
     void Release(buffer_head* bh, int flag) { ops->Release(self, bh, flag); }
     void BeginModify(buffer_head* bh) { ops->BeginModify(self, bh); }
     void EndModify(buffer_head* bh) { ops->EndModify(self, bh); }
 };
 
+// What the engine knows of a volume. The volume's author fills it in before the first tree is
+// opened and keeps it, at one address, until the last one is gone. Numbers are in host order.
+//
+//     CFileSystemHfs fs;
+//     fs.service = {&volumeOps, this};
+//     fs.cache.ops = &cacheOps;
+//     fs.mapBlockSize = 4096;
+//     fs.mapBlockShift = 12;
+//     fs.catalogFork = ...;
 class CFileSystemHfs {
 public:
-    HfsService<HfsVolumeOps> service;
-    HfsBufferCache cache;
+    HfsService<HfsVolumeOps> service;   // must be there
+    HfsBufferCache cache;               // must be there
     HfsService<HfsJournalOps> journal;  // empty: no journal
 
-    u16 mapBlockSize = 0;  // bytes, a power of two from 512 on
-    u8 mapBlockShift = 0;  // its log2
-    u8 allocBlockShift = 0;
-    u32 allocBlockSize = 0;  // bytes, a power of two from 512 on
-    u32 totalBlocks = 0;     // allocation blocks
-    u64 volumeSize = 0;      // bytes
-    u16 version = kVersionHfsPlus;
-    u32 defaultClumpSize = 0;      // bytes, for forks whose record holds 0
-    u32 nesting = 0;               // raised by one around every Resize
-    CWndBitmap* bitmap = nullptr;  // allocation bitmap
-    void* logHandle = nullptr;     // passed to velk_printk
+    u16 mapBlockSize = 0;           // bytes, a power of two from 512 on
+    u8 mapBlockShift = 0;           // its log2
+    u8 allocBlockShift = 0;         // log2 of allocBlockSize
+    u32 allocBlockSize = 0;         // bytes, a power of two from 512 on
+    u32 totalBlocks = 0;            // allocation blocks
+    u64 volumeSize = 0;             // bytes
+    u16 version = kVersionHfsPlus;  // or kVersionHfsx, as in the volume header
+    u32 defaultClumpSize = 0;       // bytes, for forks whose record holds 0
+    u32 nesting = 0;                // raised by one around every Resize
+    CWndBitmap* bitmap = nullptr;   // allocation bitmap
+    void* logHandle = nullptr;      // passed to velk_printk
 
+    // Forks of the special files, as in the volume header. The engine reads sizes and clump sizes;
+    // Resize brings them up to date.
     HfsFork extentsFork{};
     HfsFork catalogFork{};
     HfsFork allocationFork{};
@@ -123,6 +142,7 @@ public:
     // 8 attributes. Null for any other ID.
     HfsFork* ForkOf(u32 fileId);
 
+    // The calls of HfsVolumeOps, on this volume.
     int Map(HfsRuns* runs, HfsFork* fork, u8 forkType, u32 fileId, u64 byteOffset, u32 bytes,
             bool noRead, HfsBcbBuf* bufs) {
         return service.ops->Map(service.self, this, runs, fork, forkType, fileId, byteOffset, bytes,

@@ -10,12 +10,14 @@
 
 namespace VELK {
 
+// The units of a name, owned and borrowed. Not terminated; any unit may occur, 0 included.
 using NameUnits = std::u16string;
 using NameView = std::u16string_view;
 
 // Units of a name as stored: `count` big-endian units at `bytes`.
 NameUnits UnitsFromStored(const void* bytes, unsigned count);
 
+// The name as UTF-8, lone surrogates in the way described above.
 std::string Utf8FromUnits(NameView units);
 // False for bytes that are no UTF-8; a single surrogate in three bytes is accepted.
 bool UnitsFromUtf8(std::string_view text, NameUnits* units);

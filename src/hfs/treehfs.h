@@ -16,24 +16,25 @@
 
 namespace VELK {
 
-// The header record in host order and the node geometry every accessor needs.
+// The header record (HFS+ volume format, B-tree header record) in host order, and the node geometry
+// every accessor needs. In an empty tree root, first and last leaf, records and depth are 0.
 struct BTHeaderMem {
-    u32 rootNode;
-    u32 leafRecords;
-    u32 firstLeafNode;
-    u32 lastLeafNode;
-    u32 totalNodes;
-    u32 freeNodes;
-    u32 clumpSize;  // bytes
-    u32 attributes;
-    u32 nodeSize;  // bytes
-    u16 treeDepth;
-    u16 maxKeyLength;
-    HfsBufferCache* cache;
-    u32 blockSize;  // map block, bytes
-    u32 blockMask;
-    u32 blocksPerNode;
-    u8 blockShift;
+    u32 rootNode;           // node number
+    u32 leafRecords;        // records in all leaves
+    u32 firstLeafNode;      // node number of the leaf with the smallest keys
+    u32 lastLeafNode;       // node number of the leaf with the greatest keys
+    u32 totalNodes;         // nodes of the file, used or free; the header node counts
+    u32 freeNodes;          // nodes whose bit in the map is clear
+    u32 clumpSize;          // bytes
+    u32 attributes;         // kBT...Mask
+    u32 nodeSize;           // bytes
+    u16 treeDepth;          // levels; height of the root
+    u16 maxKeyLength;       // bytes, without the length field; the size of keys that do not vary
+    HfsBufferCache* cache;  // the volume's, which lent the blocks
+    u32 blockSize;          // map block, bytes
+    u32 blockMask;          // blockSize - 1
+    u32 blocksPerNode;      // map blocks a node lies in
+    u8 blockShift;          // log2 of blockSize
 };
 
 // One record of a node: where its bytes lie, piece by piece.
@@ -57,42 +58,49 @@ struct NodeKey {
 
 // One byte position of a node.
 struct NodePtr {
-    u32 offset;
-    u32 firstBytes;
-    u8* ptr;
-    u8* next1;  // the following block, null past the node
-    u8* next2;  // always null
+    u32 offset;      // bytes from the node's start
+    u32 firstBytes;  // bytes from `ptr` to the end of its block
+    u8* ptr;         // its address
+    u8* next1;       // the following block, null past the node
+    u8* next2;       // always null
 };
+
+struct HfsNode;
 
 // Shortcut from an index node to a cached child: the child, and where its first block lies. Beside
 // the red-black tree of cached nodes, never instead of it.
-struct HfsNode;
-
 struct HfsNodeHint {
-    HfsNode* node;  // null: none
-    const u8* data;
-    u32 nodeNum;
+    HfsNode* node;   // not counted; null: none
+    const u8* data;  // the child's first block
+    u32 nodeNum;     // the child's number
 };
 
 // A cached node. Its bytes are the blocks of `bufs` one after the other; they are not contiguous in
 // memory. Allocated with room for blocksPerNode blocks and one zero entry behind them.
 struct HfsNode {
-    rb_node link;  // by nodeNum; first member
-    u32 nodeNum;
+    rb_node link;            // by nodeNum; first member
+    u32 nodeNum;             // its place in the file: byte nodeNum << nodeShift
     list_head modifiedLink;  // linked to itself when no block is dirty
-    s32 refCount;            // -1: discarded by Clear
+    s32 refCount;            // references held; 0: cached all the same, -1: discarded
     u32 hintMask;            // entries of `hints` less one
     HfsNodeHint* hints;      // of an index node, in the node's own heap block; null: none
     HfsNodeHint* hintedBy;   // the one hint that leads to this node; null: none
-    HfsBcbBuf bufs[1];
+    HfsBcbBuf bufs[1];       // the blocks, in order; blocksPerNode of them
 
     // Accessors (node_access.cpp). They change nothing and return 0 or kErrCorrupt, reported with
-    // reason 15; a failed one may leave its output partly filled.
+    // reason 15; a failed one may leave its output partly filled. `hdr` is the tree's header.
+
+    // Where record `index` lies, and its key and data in it.
     int GetKey(const BTHeaderMem* hdr, int index, NodeKey* out) const;
+    // Where the free space lies. REQUIRES: `index` is the number of records.
     int GetFreeKey(const BTHeaderMem* hdr, unsigned index, NodeKey* out) const;
+    // Where node byte `offset` lies.
     int GetPtr(const BTHeaderMem* hdr, unsigned offset, NodePtr* out) const;
+    // The child that record `index` of an index node leads to.
     int GetChildNodeNum(const BTHeaderMem* hdr, int index, unsigned* child) const;
+    // Bytes between the last record and the offset table.
     int GetNodeFreeSize(const BTHeaderMem* hdr, unsigned* freeBytes) const;
+    // Bytes of record `index`, key, padding and data.
     int GetRecordSize(const BTHeaderMem* hdr, int index, unsigned* size) const;
 };
 
@@ -103,13 +111,16 @@ unsigned GetKeyLengthLe(const BTHeaderMem* hdr, const BTreeKey* key, bool leaf);
 
 // Comparators (keys_compare.cpp): search key in host order, 4-byte aligned, its parent or file ID
 // passed as `id` and not read from the key; node key as stored, big-endian. Positive: the search
-// key sorts after the node key.
+// key sorts after the node key. They trust the lengths in both keys.
 using CompareKeysFn = int (*)(const BTreeKey* searchKey, unsigned id, const BTreeKey* nodeKey);
+// Catalog keys by parent, then by name: regardless of case, or by code units. Extents keys by file,
+// fork type and start block. Attributes keys by file, name (code units) and start block.
 int CompareCatKeysCaseIns(const BTreeKey* searchKey, unsigned id, const BTreeKey* nodeKey);
 int CompareCatKeysCaseBin(const BTreeKey* searchKey, unsigned id, const BTreeKey* nodeKey);
 int CompareExtentKeysPlus(const BTreeKey* searchKey, unsigned id, const BTreeKey* nodeKey);
 int CompareAttrKeys(const BTreeKey* searchKey, unsigned id, const BTreeKey* nodeKey);
 
+// One level of a search path.
 struct HfsFindLevel {
     HfsNode* node;  // counted reference, or null
     s32 index;      // record; in a leaf also the insertion point
@@ -119,8 +130,8 @@ struct HfsFindLevel {
 struct HfsFindData {
     u32 level = 0;        // level of the position: 1, or 0 for none
     u32 searchCount = 0;  // raised each time the path is positioned
-    bool valid = false;
-    HfsFindLevel path[kMaxPathDepth + 1] = {};
+    bool valid = false;   // it stands on a record, or where one would be inserted
+    HfsFindLevel path[kMaxPathDepth + 1] = {};  // by level, 1 the leaves; entry 0 is not used
     u64 leadsAsOf = 0;  // the tree's pathVersion when a lookup filled the path; 0: moved since
 
     // Releases every node the path holds; leaves the other fields as they are.
@@ -134,18 +145,18 @@ struct HfsFindData {
 struct HfsConvert {
     u16 minKeyBuffer;   // smallest key buffer callers of lookup and iteration must offer
     u16 minDataBuffer;  // smallest record buffer
-    void (*KeyToDisk)(void* target, const void* source);  // length field included
-    void (*KeyToMemory)(void* target, const void* source, unsigned size);
-    void (*DataToDisk)(void* target, const void* source, unsigned size);
-    void (*DataToMemory)(void* target, const void* source, unsigned size);
+    void (*KeyToDisk)(void* target, const void* source);                   // length field included
+    void (*KeyToMemory)(void* target, const void* source, unsigned size);  // `size` bytes of a key
+    void (*DataToDisk)(void* target, const void* source, unsigned size);   // a record on its way in
+    void (*DataToMemory)(void* target, const void* source, unsigned size);  // one on its way out
 };
 
 // A key with its data on the way into a node.
 struct InsertKey {
-    HfsConvert* convert;  // null: key and data are in disk form (all separators)
-    const BTreeKey* key;
-    u32 keyLength;  // recorded in the stored key's length field
-    const void* data;
+    HfsConvert* convert;     // null: key and data are in disk form (all separators)
+    const BTreeKey* key;     // the caller's, in the form `convert` takes
+    u32 keyLength;           // recorded in the stored key's length field
+    const void* data;        // the caller's; a child's number, big-endian, for index records
     u32 dataSize;            // bytes; 4 for index records
     bool replacesSeparator;  // new separator of a child whose first key changed
     bool secondKeyFollows;   // a second key goes into the same node right after this one
@@ -153,8 +164,8 @@ struct InsertKey {
 
 // A reservation of nodes (space_reserve.cpp).
 struct BTReserve {
-    u32 nodes;
-    u32 used;
+    u32 nodes;   // promised by this reservation
+    u32 used;    // for the volume's use; ReserveSpace sets 0
     bool owner;  // this reservation opened the tree's; otherwise it joined an open one
 };
 
@@ -376,30 +387,30 @@ public:
     // Marks a node free. Its content is neither read nor changed.
     int FreeNode(unsigned nodeNumber);
 
-    CFileSystemHfs* volume = nullptr;  // set before Init or Create
-    rb_node* nodeRoot = nullptr;       // cached nodes by number
-    list_head modifiedList;            // cached nodes with dirty blocks
-    u32 nodeCount = 0;                 // nodes now cached
-    u32 maxNodeCount = 0;
-    u32 hitCount = 0;    // node requests served from the cache
-    u32 readCount = 0;   // nodes mapped from the volume
-    u32 writeCount = 0;  // for the volume's use; the engine only prints it
-    u32 validNodes = 0;  // nodes below hold initialised data, others are new
-    u32 fileId = 0;      // 3, 4 or 8; set before Init or Create
-    u32 nodeShift = 0;   // log2 of the node size
-    HfsRuns runs;        // extents of the tree file, passed to the volume
-    BTHeaderMem header{};
-    u8* scratch = nullptr;      // nodeSize bytes: keys that straddle blocks
-    u8* scratchHalf = nullptr;  // its upper half: record data that straddles blocks
-    u8 btreeType = 0;
-    u8 keyCompareType = 0;
-    HfsFindData findData;  // used when a caller passes no path
-    CompareKeysFn compareKeys = nullptr;
-    HfsConvert convert{};  // set by the volume
-    u32 reservedNodes = 0;
-    u32 reservationUsed = 0;
-    bool reservationOpen = false;
-    bool isDirty = false;  // header or map changed since the last flush
+    CFileSystemHfs* volume = nullptr;     // set before Init or Create
+    rb_node* nodeRoot = nullptr;          // cached nodes by number
+    list_head modifiedList;               // cached nodes with dirty blocks
+    u32 nodeCount = 0;                    // nodes now cached
+    u32 maxNodeCount = 0;                 // the most there have been
+    u32 hitCount = 0;                     // node requests served from the cache
+    u32 readCount = 0;                    // nodes mapped from the volume
+    u32 writeCount = 0;                   // for the volume's use; the engine only prints it
+    u32 validNodes = 0;                   // nodes below hold initialised data, others are new
+    u32 fileId = 0;                       // 3, 4 or 8; set before Init or Create
+    u32 nodeShift = 0;                    // log2 of the node size
+    HfsRuns runs;                         // extents of the tree file, passed to the volume
+    BTHeaderMem header{};                 // as node 0 holds it, or will after the next flush
+    u8* scratch = nullptr;                // nodeSize bytes: keys that straddle blocks
+    u8* scratchHalf = nullptr;            // its upper half: record data that straddles blocks
+    u8 btreeType = 0;                     // byte kHeadBtreeType of the header record
+    u8 keyCompareType = 0;                // kKeyCompare..., 0 where the header says nothing
+    HfsFindData findData;                 // used when a caller passes no path
+    CompareKeysFn compareKeys = nullptr;  // set by Init, before Create by the volume
+    HfsConvert convert{};                 // set by the volume
+    u32 reservedNodes = 0;         // promised by the open reservation and those that joined it
+    u32 reservationUsed = 0;       // for the volume's use; set to 0 when one is opened
+    bool reservationOpen = false;  // ReserveSpace was called with a BTReserve, and not released
+    bool isDirty = false;          // header or map changed since the last flush
     u64 pathVersion = 1;  // raised when records move so that a stored path may no longer lead right
     bool isAllOwn = false;  // Create made the tree and no node was read from the volume since
 };

@@ -16,9 +16,9 @@ public:
     // Works on `bits` (big-endian bit order, at least ceil(count / 8) bytes) until the next Attach.
     void Attach(u8* bits, u32 count);
 
-    u32 Size() const { return count_; }
-    u32 GetZeros() const { return zeros_; }
-    bool IsSet(u32 bit) const;  // bits at or past Size() read as set
+    u32 Size() const { return count_; }      // bits
+    u32 GetZeros() const { return zeros_; }  // clear bits; counted, not searched
+    bool IsSet(u32 bit) const;               // bits at or past Size() read as set
 
     // Sets or clears [first, first + count) and returns how many bits really changed.
     // REQUIRES: first + count <= Size().

@@ -4,14 +4,17 @@
 
 namespace VELK {
 
+// The head of a list, or the link inside an element of one. Owns nothing.
 struct list_head {
-    list_head* next;
-    list_head* prev;
+    list_head* next;  // the first element, in a head
+    list_head* prev;  // the last element, in a head
 
+    // Links it to itself: an empty list, or an element on no list. REQUIRED before anything else.
     void Init() {
         next = this;
         prev = this;
     }
+    // Of a head: nothing is on the list. Of an element: it is on none.
     bool IsEmpty() const { return next == this; }
 
     // Unlinks this element and links it to itself.

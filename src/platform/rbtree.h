@@ -6,11 +6,13 @@
 
 namespace VELK {
 
+// The links of an element that hangs in a tree, as a member of the element. Owns nothing.
 struct rb_node {
     std::uintptr_t parentColor;  // parent's address; lowest bit: 1 = black, 0 = red
-    rb_node* right;
-    rb_node* left;
+    rb_node* right;              // child behind this node in the owner's order, or null
+    rb_node* left;               // child before it, or null
 
+    // Null at the root; the node itself when it is in no tree.
     rb_node* Parent() const {
         return reinterpret_cast<rb_node*>(parentColor & ~static_cast<std::uintptr_t>(1));
     }
@@ -24,7 +26,7 @@ struct rb_node {
         *slot = this;
     }
 
-    // A node in no tree is its own parent.
+    // A node in no tree is its own parent. Mark a node before the first question.
     void MarkUnlinked() { parentColor = reinterpret_cast<std::uintptr_t>(this); }
     bool IsLinked() const { return Parent() != this; }
 

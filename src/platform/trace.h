@@ -4,6 +4,8 @@
 // Bit of velk_trace_level that lets informational and diagnostic traces print.
 #define VELK_TRACE_DIAGNOSTIC 0x10u
 
+// Behind a declaration: the compiler compares the arguments from number `first` on with the format,
+// argument number `text`. Nothing on compilers that cannot.
 #if defined(__GNUC__)
 #define VELK_PRINTF(text, first) __attribute__((format(printf, text, first)))
 #else
@@ -12,6 +14,7 @@
 
 extern "C" {
 
+// Which traces print, bit by bit; 0 when the program starts. Assertions ask no bit.
 extern unsigned velk_trace_level;
 
 // Prints one trace text, which brings its own line feed. Assertions print through it always.

@@ -6,6 +6,7 @@
 
 namespace VELK {
 
+// Unsigned and signed integers of 8 to 64 bits, in host order unless a comment says otherwise.
 using u8 = std::uint8_t;
 using u16 = std::uint16_t;
 using u32 = std::uint32_t;

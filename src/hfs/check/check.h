@@ -2,7 +2,17 @@
 // format and the order of names, and nothing of the engine or the volume layer: it judges both.
 //
 // It visits every node at most once, holds a few bytes per node, believes no count before it has
-// been compared with the size of the image, and writes nothing.
+// been compared with the size of the image, and writes nothing. docs/check.md says what each
+// invariant means.
+//
+//     CheckOptions options;
+//     options.full = true;
+//     CheckSink sink;
+//     sink.finding = [](void*, const CheckFinding& finding) {
+//         std::puts(CheckFindingLine(finding).c_str());
+//     };
+//     const CheckSummary summary = CheckVolume(source, options, sink);
+//     return summary.errors == 0 && summary.unreadable == 0 && !summary.isStopped;
 #pragma once
 
 #include <cstddef>
@@ -25,22 +35,24 @@ enum class CheckId : u8 {
     D01,
 };
 // clang-format on
-constexpr u32 kCheckIdCount = 51;
+constexpr u32 kCheckIdCount = 51;  // how many invariants there are
 
+// A remark; something a reader can live with; something that makes it go wrong.
 enum class CheckSeverity : u8 { kInfo, kWarning, kError };
 
 // How thorough a run must be for an invariant to be looked at.
 enum class CheckScope : u8 { kQuick, kDefault, kFull };
 
+// What is known of an invariant. The texts are constant.
 struct CheckIdInfo {
-    CheckId id;
-    const char* name;  // "K03"
-    CheckScope scope;
+    CheckId id;              // its place in the table
+    const char* name;        // "K03"
+    CheckScope scope;        // the shallowest run that looks
     CheckSeverity severity;  // the worst it is reported with
     const char* text;        // one line for a person
 };
 
-// All invariants, in the order of CheckId; kCheckIdCount entries.
+// All invariants, in the order of CheckId; kCheckIdCount entries. And one of them.
 const CheckIdInfo* CheckIdTable();
 const CheckIdInfo& CheckIdOf(CheckId id);
 // By name, as in "K03". False: there is none.
@@ -53,38 +65,40 @@ constexpr u64 CheckIdBit(CheckId id) {
 
 // The bytes of a volume: offset 0 is its first byte, wherever it lies in the image.
 struct CheckSource {
-    void* self;
+    void* self;  // passed to `read`
     // Fills all `size` bytes or returns a status other than 0. Never asked beyond `size` below.
     int (*read)(void* self, u64 offset, void* target, std::size_t size);
     u64 size;         // bytes there are from the volume's start to its end (or the image's)
     u64 imageOffset;  // of the volume in the image; only added to the offsets in findings
 };
 
+// How thorough the run is and what it reports. By default every tree is walked from its root.
 struct CheckOptions {
     bool quick = false;      // headers, map and leaf chain only
     bool full = false;       // also the trees against each other, the bitmap, the volume's counts
     bool keepGoing = false;  // go on in a tree after a node that cannot be read
     u32 trees = 0;           // bit 1 << file ID of the trees to report on; 0: all
     u64 only = 0;            // these invariants alone, in whatever scope they have; 0: all
-    u64 skip = 0;
-    u32 maxErrors = 100;  // stop at so many errors; as many other findings are told; 0: no limit
-    u32 mapBlock = 0;     // unit nodes are mapped in, if the caller has one (H02); 0: none
+    u64 skip = 0;            // these invariants are not reported; 0: none
+    u32 maxErrors = 100;     // stop at so many errors; as many other findings are told; 0: no limit
+    u32 mapBlock = 0;        // unit nodes are mapped in, if the caller has one (H02); 0: none
     bool backupHeader = false;  // start from the alternate volume header
 };
 
-constexpr u64 kCheckNoOffset = ~u64{0};
+constexpr u64 kCheckNoOffset = ~u64{0};  // a finding that belongs to no byte in particular
 
+// One breach of an invariant. Valid during the call that tells of it; copy what is to stay.
 struct CheckFinding {
-    CheckId id = CheckId::V01;
-    CheckSeverity severity = CheckSeverity::kError;
-    u32 tree = 0;                 // file ID of the tree, 0: the volume
-    s64 node = -1;                // -1: no node in particular
-    s32 record = -1;              // index in the node
-    u64 offset = kCheckNoOffset;  // byte of the image
-    std::string where;            // "catalog node 14 record 0"
-    std::string expected;         // may be empty
-    std::string found;            // may be empty
-    std::string text;             // a sentence that holds all of it
+    CheckId id = CheckId::V01;                       // the invariant
+    CheckSeverity severity = CheckSeverity::kError;  // of this breach; never above the invariant's
+    u32 tree = 0;                                    // file ID of the tree, 0: the volume
+    s64 node = -1;                                   // -1: no node in particular
+    s32 record = -1;                                 // index in the node
+    u64 offset = kCheckNoOffset;                     // byte of the image
+    std::string where;                               // "catalog node 14 record 0"
+    std::string expected;                            // may be empty
+    std::string found;                               // may be empty
+    std::string text;                                // a sentence that holds all of it
 };
 
 // "error K03 catalog node 14 record 0 (image offset 0x2380e): key ... is not above ..."
@@ -92,31 +106,34 @@ std::string CheckFindingLine(const CheckFinding& finding);
 
 // A stretch that could not be read. No invariant: it says nothing about the volume.
 struct CheckUnreadable {
-    u32 tree = 0;
-    s64 node = -1;
+    u32 tree = 0;                 // file ID of the tree, 0: the volume
+    s64 node = -1;                // -1: no node in particular
     u64 offset = kCheckNoOffset;  // byte of the image
-    u64 size = 0;
-    int status = 0;  // what CheckSource::read returned; kCheckPastEnd: beyond the source
-    std::string where;
+    u64 size = 0;                 // bytes
+    int status = 0;     // what CheckSource::read returned; kCheckPastEnd: beyond the source
+    std::string where;  // "catalog node 14"
 };
-constexpr int kCheckPastEnd = -1;
+constexpr int kCheckPastEnd = -1;  // status of a stretch that lies beyond the source
 
+// How far the run has come.
 struct CheckProgress {
     const char* stage;  // "catalog"
     u64 done;           // nodes
-    u64 total;
-    u64 bytes;  // read since the start of the run
+    u64 total;          // nodes there are to visit, as far as is known
+    u64 bytes;          // read since the start of the run
 };
 
 // What the caller wants to hear of; each may be null.
 struct CheckSink {
-    void* self = nullptr;
+    void* self = nullptr;  // passed to each
+    // One finding, or one stretch that could not be read, as it is met.
     void (*finding)(void* self, const CheckFinding& finding) = nullptr;
     void (*unreadable)(void* self, const CheckUnreadable& unreadable) = nullptr;
     // Every few hundred nodes. False stops the run.
     bool (*progress)(void* self, const CheckProgress& progress) = nullptr;
 };
 
+// How a stage ended.
 enum class CheckVerdict : u8 {
     kSound,     // looked at; there may be remarks of severity info
     kFindings,  // errors or warnings
@@ -125,37 +142,46 @@ enum class CheckVerdict : u8 {
     kStopped,   // not finished: unreadable, too many errors, or interrupted
 };
 
+// What one stage found. Counts are of this stage alone.
 struct CheckStage {
-    const char* title = "";  // "catalog tree"
-    CheckVerdict verdict = CheckVerdict::kNotRun;
-    const char* why = "";  // of kNotRun and kStopped: "needs --full"
+    const char* title = "";                        // "catalog tree"
+    CheckVerdict verdict = CheckVerdict::kNotRun;  // how it ended
+    const char* why = "";                          // of kNotRun and kStopped: "needs --full"
+    // Findings by severity.
     u32 errors = 0;
     u32 warnings = 0;
     u32 infos = 0;
+
     u64 nodes = 0;    // visited
     u64 records = 0;  // in leaves
     u64 runs = 0;     // of the bad-block list
 };
 
+// Stages of a run over a volume: the header, the extents, catalog and attributes trees, the
+// bad-block list, the trees against each other.
 constexpr u32 kCheckStages = 6;
 
+// What the whole run found.
 struct CheckSummary {
+    // Findings by severity.
     u32 errors = 0;
     u32 warnings = 0;
     u32 infos = 0;
-    u32 untold = 0;      // findings that were counted, but no longer told
-    u32 unreadable = 0;  // nodes and other pieces
-    u64 nodes = 0;       // visited
-    u64 bytes = 0;       // read
-    bool isStopped = false;
-    u32 stageCount = 0;
-    CheckStage stages[kCheckStages];
+
+    u32 untold = 0;                   // findings that were counted, but no longer told
+    u32 unreadable = 0;               // nodes and other pieces
+    u64 nodes = 0;                    // visited
+    u64 bytes = 0;                    // read
+    bool isStopped = false;           // it ended before its end, so silence means nothing
+    u32 stageCount = 0;               // entries of `stages` in use
+    CheckStage stages[kCheckStages];  // in the order they ran
 };
 
 // Checks the volume: header, three trees, bad-block list, and with `full` how they fit together.
 CheckSummary CheckVolume(const CheckSource& source, const CheckOptions& options,
                          const CheckSink& sink);
 
+// How the names of a catalog are ordered: regardless of case, or by their code units.
 enum class CheckNameOrder : u8 { kFolding, kBinary };
 
 // What a tree file that lies flat in memory holds.

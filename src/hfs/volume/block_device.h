@@ -29,12 +29,13 @@ struct IoResult {
     int error = 0;   // 0, a kIo... value, or an errno value
     u64 offset = 0;  // first byte that could not be transferred; kIoPastEnd: of the range
 
-    bool Ok() const { return error == 0; }
+    bool Ok() const { return error == 0; }  // every byte was transferred
 };
 
-// "Input/output error" and the like.
+// The text for IoResult::error: "Input/output error" and the like.
 std::string IoErrorText(int error);
 
+// A run of bytes that can be read, and perhaps written. Not copied; used by one thread at a time.
 class BlockDevice {
 public:
     BlockDevice() = default;
@@ -42,9 +43,9 @@ public:
     BlockDevice& operator=(const BlockDevice&) = delete;
     virtual ~BlockDevice() = default;
 
-    virtual u64 Size() const = 0;
-    virtual bool IsWritable() const = 0;
-    // All of [offset, offset + bytes) or an error.
+    virtual u64 Size() const = 0;         // bytes
+    virtual bool IsWritable() const = 0;  // else Write and Zero give kIoReadOnly
+    // All of [offset, offset + bytes) or an error. Zero writes zeros.
     virtual IoResult Read(u64 offset, void* target, std::size_t bytes) = 0;
     virtual IoResult Write(u64 offset, const void* source, std::size_t bytes) = 0;
     virtual IoResult Zero(u64 offset, u64 bytes);
@@ -52,8 +53,10 @@ public:
     virtual IoResult Sync() = 0;
 };
 
-// The calls a FileDevice makes of the host for every transfer.
+// The calls a FileDevice makes of the host for every transfer: pread, pwrite and fsync, or others
+// that take, return and set errno like these.
 struct HostCalls {
+    // Positioned; they may transfer less than was asked for, and are then called again.
     ssize_t (*read)(int handle, void* target, std::size_t bytes, off_t offset);
     ssize_t (*write)(int handle, const void* source, std::size_t bytes, off_t offset);
     int (*sync)(int handle);
@@ -64,6 +67,7 @@ struct HostCalls {
 // device takes no writes. Neither does a file that has become shorter than it was.
 class FileDevice : public BlockDevice {
 public:
+    // What the file is opened for. To be written, it must not be mounted, nor locked by another.
     enum class Mode { kRead, kReadWrite, kCreate };
 
     // Opens `path`; null with `*problem` set when that fails, when it is a folder, or when it is
@@ -78,7 +82,7 @@ public:
     IoResult Read(u64 offset, void* target, std::size_t bytes) override;
     IoResult Write(u64 offset, const void* source, std::size_t bytes) override;
     IoResult Sync() override;
-    int Handle() const { return handle_; }
+    int Handle() const { return handle_; }  // the host's file descriptor; stays the device's
     // Puts other calls in the place of the host's, for tests of failures; null: the host's own.
     static void SetHostCalls(const HostCalls* calls);
 
@@ -98,6 +102,7 @@ private:
 // Bytes in memory; untouched stretches take none.
 class MemoryDevice : public BlockDevice {
 public:
+    // `size` bytes of zeros. A write that finds no memory gives kIoNoMemory.
     explicit MemoryDevice(u64 size);
 
     u64 Size() const override { return size_; }
@@ -117,6 +122,8 @@ private:
 // The bytes [offset, offset + size) of another device, which must outlive this one.
 class SliceDevice : public BlockDevice {
 public:
+    // `base` stays the caller's. A slice that leaves it is refused by the base, transfer by
+    // transfer.
     SliceDevice(BlockDevice* base, u64 offset, u64 size)
         : base_(base), offset_(offset), size_(size) {}
 
@@ -126,7 +133,7 @@ public:
     IoResult Write(u64 offset, const void* source, std::size_t bytes) override;
     IoResult Zero(u64 offset, u64 bytes) override;
     IoResult Sync() override { return base_->Sync(); }
-    u64 Offset() const { return offset_; }
+    u64 Offset() const { return offset_; }  // byte of the base where the slice starts
 
 private:
     BlockDevice* base_;
@@ -138,15 +145,16 @@ private:
 // of the base, which must outlive this one.
 class OverlayDevice : public BlockDevice {
 public:
-    static constexpr u32 kPageSize = 4096;
-    static constexpr u32 kSectorsPerPage = kPageSize / kSectorSize;
+    static constexpr u32 kPageSize = 4096;  // bytes; page n starts at byte n * kPageSize
+    static constexpr u32 kSectorsPerPage = kPageSize / kSectorSize;  // sectors of a page
 
     // One page of changes: sectors of `changed` hold `bytes`, the others are the base's.
     struct Page {
-        u8 changed = 0;  // bit i: sector i
-        u8 bytes[kPageSize];
+        u8 changed = 0;       // bit i: sector i
+        u8 bytes[kPageSize];  // those of unchanged sectors say nothing
     };
 
+    // Without changes. `base` stays the caller's.
     explicit OverlayDevice(BlockDevice* base) : base_(base) {}
 
     u64 Size() const override { return base_->Size(); }
@@ -157,11 +165,12 @@ public:
     IoResult Write(u64 offset, const void* source, std::size_t bytes) override;
     IoResult Sync() override { return {}; }
 
-    BlockDevice* Base() const { return base_; }
-    bool IsEmpty() const { return pages_.empty(); }
-    std::size_t PageCount() const { return pages_.size(); }
+    BlockDevice* Base() const { return base_; }              // the device below
+    bool IsEmpty() const { return pages_.empty(); }          // nothing was changed
+    std::size_t PageCount() const { return pages_.size(); }  // changed pages
     // Numbers of the changed pages, rising.
     std::vector<u64> ChangedPages() const;
+    // The changes in page `number`, null when there are none. Stays the device's.
     const Page* PageAt(u64 number) const;
     // Reads as Read does; for those who hold the device constant.
     IoResult Peek(u64 offset, void* target, std::size_t bytes) const;

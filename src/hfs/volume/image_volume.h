@@ -2,11 +2,17 @@
 // opens the trees, and for volumes that take changes keeps them in one transaction over all trees,
 // the volume header and the allocation file.
 //
-//   OpenOptions options;
-//   Problem problem;
-//   auto volume = ImageVolume::OpenFile("disk.img", options, nullptr, &problem);
-//   if (!volume) ... problem.Text() ...
-//   CBTreeHfs* catalog = volume->Tree(kCatalogFileId, &problem);
+//     Problem problem;
+//     auto volume = ImageVolume::OpenFile("disk.img", OpenOptions{}, nullptr, &problem);
+//     CBTreeHfs* catalog = volume ? volume->Tree(kCatalogFileId, &problem) : nullptr;
+//     if (catalog == nullptr) {
+//         std::puts(problem.Text().c_str());
+//         return;
+//     }
+//     HfsFindData path;
+//     status = catalog->FindRecord(&key, parentId, &record, sizeof record, &size, &path);
+//     path.ClearPath();  // before the volume goes
+//     volume->Close();   // or the destructor
 #pragma once
 
 #include <cstdio>
@@ -30,18 +36,20 @@ constexpr int kErrVolumeReadOnly = static_cast<int>(0xA0000203u);   // takes no 
 constexpr int kErrVolumeUnmapped = static_cast<int>(0xA0000204u);   // past the fork's extents
 constexpr int kErrVolumeJournal = static_cast<int>(0xA0000205u);    // more than the journal holds
 
+// What becomes of changes.
 enum class Access {
     kReadOnly,  // changes are refused
     kOverlay,   // changes stay in memory, the image is never written
     kWrite,     // a commit reaches the image
 };
 
+// How to mount. The names after -- are the options of the tool that set these.
 struct OpenOptions {
-    Access access = Access::kReadOnly;
-    std::optional<u64> offset;  // --offset
-    u32 partition = 0;          // --partition; 0: whichever holds a volume
-    bool backupHeader = false;  // start from the alternate header
-    bool force = false;         // --force: write past a full journal or an unclean unmount
+    Access access = Access::kReadOnly;  // what becomes of changes
+    std::optional<u64> offset;          // --offset: byte of the image where the volume starts
+    u32 partition = 0;                  // --partition; 0: whichever holds a volume
+    bool backupHeader = false;          // start from the alternate header
+    bool force = false;                 // --force: write past a full journal or an unclean unmount
     // Carry out the transactions that wait in the journal before anything else is read: on the
     // image with Access::kWrite, else in memory only.
     bool replay = false;
@@ -51,17 +59,19 @@ struct OpenOptions {
 
 // The volume's journal as found at mount.
 struct JournalState {
-    bool present = false;
-    bool readable = false;  // info block and header are there and sound
-    bool empty = true;
+    bool present = false;       // the volume header says there is one
+    bool readable = false;      // info block and header are there and sound
+    bool empty = true;          // nothing waits in it
     u64 pendingBytes = 0;       // bytes of transactions that were not carried out
     u32 replayed = 0;           // transactions that this mount has carried out
     bool isConsistent = false;  // it was kept, and nothing waits in it any more
     u64 offset = 0;             // of the journal header, bytes of the image
-    u64 size = 0;
-    std::string text;  // what is wrong with it, when not readable
+    u64 size = 0;               // bytes, journal header included
+    std::string text;           // what is wrong with it, when not readable
 };
 
+// One mounted volume, and its trees. Not copied, not moved: trees and paths point into it. One
+// thread at a time. Trees are opened when they are first asked for.
 class ImageVolume {
 public:
     // Null with `*problem` set when there is no volume to mount. `scan` (optional) receives what
@@ -77,9 +87,9 @@ public:
     ImageVolume& operator=(const ImageVolume&) = delete;
     ~ImageVolume();  // closes, tears the trees down; what was not committed is gone
 
-    CFileSystemHfs* Fs();
+    CFileSystemHfs* Fs();                // as the engine sees the volume; stays the volume's
     const VolumeHeader& Header() const;  // with the changes made since mount
-    const VolumePlace& Place() const;
+    const VolumePlace& Place() const;    // where in the image it was found
     // Things a user should know although the volume opened: a truncated image, a journal that is
     // not empty, overlapping forks, ...
     const std::vector<Problem>& Notes() const;

@@ -11,18 +11,22 @@
 
 namespace VELK {
 
+// What the new volume is like. Sizes are bytes; node sizes and block size powers of two. Values a
+// volume cannot have are refused with ExitClass::kUsage.
 struct FormatOptions {
     bool caseSensitive = false;  // HFSX with binary name order
     u32 blockSize = 4096;        // allocation block, 512 to 65,536
-    u32 catalogNodeSize = 4096;  // 512 to 32,768
+    // Nodes, 512 to 32,768.
+    u32 catalogNodeSize = 4096;
     u32 extentsNodeSize = 4096;
     u32 attributesNodeSize = 8192;
-    u64 catalogSize = 0;  // bytes; 0: by the clump size
+    // First size of the tree files; 0: by the clump size.
+    u64 catalogSize = 0;
     u64 extentsSize = 0;
     u64 attributesSize = 0;
-    u64 journalSize = 0;  // bytes, rounded up to blocks; 0: no journal
-    u32 clumpSize = 0;    // of the tree forks, bytes; 0: by the volume's size
-    bool withAttributes = true;
+    u64 journalSize = 0;         // bytes, rounded up to blocks; 0: no journal
+    u32 clumpSize = 0;           // of the tree forks, bytes; 0: by the volume's size
+    bool withAttributes = true;  // an attributes tree, empty
     bool withRoot = true;     // the records of the root folder; without them the catalog is empty
     bool emptyTrees = false;  // forks of size 0 and no records: trees are left to the caller
     std::u16string name = u"Untitled";  // decomposed

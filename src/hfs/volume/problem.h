@@ -17,23 +17,26 @@ enum class ExitClass : int {
     kUsage = 16,  // asked the wrong way
 };
 
+// Made without arguments it is no problem. Problems are compared with nothing and thrown never:
+// they are returned, or written to a `Problem*` that may be null where its declaration says so.
 struct Problem {
-    ExitClass exitClass = ExitClass::kNone;
+    ExitClass exitClass = ExitClass::kNone;  // kNone: there is none
     int status = 0;             // status of the engine or of this layer behind it, 0: none
     std::string what;           // "volume header at 1024: block size 3000 is not a power of two"
     std::string advice;         // "try --backup-header"; may be empty
     std::optional<u64> offset;  // byte of the image
     std::optional<u32> fileId;  // tree file it concerns
-    std::optional<u32> node;
-    std::string check;  // invariant of the checker that names it, as in "H04"; may be empty
+    std::optional<u32> node;    // node of that tree
+    std::string check;          // invariant of the checker that names it, as in "H04"; may be empty
 
+    // Whether there is a problem.
     explicit operator bool() const { return exitClass != ExitClass::kNone; }
 
     // "WHAT: ADVICE", without the name of the image.
     std::string Text() const { return advice.empty() ? what : what + ": " + advice; }
 };
 
-// A problem of class kFailed.
+// A problem of class kFailed, one that also names a byte of the image, and one of class kUsage.
 Problem Failure(std::string what, std::string advice);
 Problem FailureAt(u64 offset, std::string what, std::string advice);
 Problem UsageProblem(std::string what, std::string advice);
@@ -44,7 +47,7 @@ std::string Grouped(u64 number);
 std::string Position(u64 offset);
 // "0x15810".
 std::string HexOffset(u64 number);
-// printf into a string.
+// printf into a string; what goes beyond 511 bytes is cut.
 #if defined(__GNUC__)
 __attribute__((format(printf, 1, 2)))
 #endif
