@@ -64,4 +64,6 @@ def filtered(lines):
         yield '/// @}'
 
 
-print('\n'.join(filtered(open(sys.argv[1], encoding='utf-8').read().split('\n'))))
+if __name__ == '__main__':
+    with open(sys.argv[1], encoding='utf-8') as header:
+        print('\n'.join(filtered(header.read().split('\n'))))

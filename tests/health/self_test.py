@@ -3,14 +3,19 @@
 that keeps it."""
 
 import pathlib
+import sys
 import tempfile
 import unittest
 
 import banned
 import layers
 import lengths
+import links
 import sites
 import symbols
+
+sys.path.append(str(pathlib.Path(__file__).resolve().parents[2] / "tools"))
+import doxygen_comments  # noqa: E402
 
 
 class Tree(unittest.TestCase):
@@ -113,6 +118,47 @@ class Sites(Tree):
         self.engine("HFS_TRY(F(), site);\n")
         sites.write(self.root)
         self.assertIn("is no number", sites.check(self.root)[0])
+
+
+class Links(Tree):
+    def test_links_to_files_and_headings_pass(self):
+        self.put("docs/a.md", "# The `a`: one\n\n[b](../b.md#on-the-b-1) [c](#the-a-one)\n"
+                              "![p](p.svg) [net](https://example.org/x) `[no](link)`\n\n"
+                              "    [no](x)\n")
+        self.put("docs/p.svg", "")
+        self.put("b.md", "## On the b\n\n## On the b\n\n[a]: docs/a.md\n")
+        self.assertEqual(links.check(self.root), [])
+
+    def test_links_that_lead_nowhere_fail(self):
+        self.put("a.md", "# A\n\n[x](b.md)\n[two\nlines](#b)\n[![p](p.png)](a.md)\n\n[r]: no.md\n")
+        self.put("docs/c.md", "[out](../../etc)\n")
+        self.assertEqual([f.split(": ")[0] for f in links.check(self.root)],
+                         ["a.md:3", "a.md:5", "a.md:6", "a.md:8", "docs/c.md:1"])
+
+    def test_sites_are_followed_to_their_anchors(self):
+        self.put("a.html", '<h1 id="top">A</h1><a href="b.html#x">b</a><a href="#top">a</a>')
+        self.put("b.html", '<a name="x"></a><img src="p.png"><a href="a.html#y">a</a>')
+        self.assertEqual(links.check_site(self.root),
+                         ["b.html:1: p.png: no such file", "b.html:1: a.html#y: no such anchor"])
+        self.assertEqual(len(links.check_site(self.root / "none")), 1)
+
+
+class Comments(unittest.TestCase):
+    def shown(self, text):
+        return "\n".join(doxygen_comments.filtered(text.split("\n")))
+
+    def test_comments_describe_the_file_what_follows_and_what_precedes(self):
+        self.assertEqual(self.shown("// The file.\n\n// A.\nint a;\n\nint b;  // B\n"),
+                         "/// \\file\n/// The file.\n\n/// A.\nint a;\n\nint b;  ///< B\n")
+
+    def test_declarations_in_a_row_share_a_comment(self):
+        both = "int F(int a,\n      int b);\nint G() {\n}\n"
+        self.assertEqual(self.shown(f"\n// Both.\n{both}\nint H();"),
+                         f"\n/// Both.\n/// @{{\n{both}/// @}}\n\nint H();")
+
+    def test_a_type_shares_its_comment_with_nobody(self):
+        text = "\n/// A.\nstruct A {\n    int a;\n};\nint b;"
+        self.assertEqual(self.shown(text.replace("///", "//")), text)
 
 
 class Symbols(unittest.TestCase):
