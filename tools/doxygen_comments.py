@@ -5,12 +5,14 @@ The sources are commented for those who read them there. Here the same comments 
 - the first comment of a file is the file's;
 - a comment on lines of its own describes what follows. Declarations that follow each other without
   a blank line or another comment share it;
-- a comment behind code describes what stands before it, also inside such a group.
+- a comment behind code describes what stands before it, also inside such a group;
+- a ruled comment, as in `// --- trees ----`, is a heading for those who read the source.
 """
 import re
 import sys
 
 comment_line = re.compile(r'^(\s*)//( .*|)$')
+ruler = re.compile(r'^\s*// --- .* ---+$')
 behind = re.compile(r'^(\s*[^\s}/].*)// (.*)$')
 opens_scope = re.compile(r'^\s*(class|struct|union|enum|namespace|extern "C"|template|public|private)\b')
 literal = re.compile(r'"(\\.|[^"\\])*"|\'(\\.|[^\'\\])\'')
@@ -48,6 +50,9 @@ def filtered(lines):
         if number == group_ends:
             yield '/// @}'
         comment = comment_line.match(line)
+        if ruler.match(line):
+            yield ''
+            continue
         if comment:
             if number == 0:
                 yield '/// \\file'

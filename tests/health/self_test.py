@@ -151,6 +151,9 @@ class Comments(unittest.TestCase):
         self.assertEqual(self.shown("// The file.\n\n// A.\nint a;\n\nint b;  // B\n"),
                          "/// \\file\n/// The file.\n\n/// A.\nint a;\n\nint b;  ///< B\n")
 
+    def test_ruled_headings_describe_nothing(self):
+        self.assertEqual(self.shown("\n// --- trees ------\nint a;\nint b;"), "\n\nint a;\nint b;")
+
     def test_declarations_in_a_row_share_a_comment(self):
         both = "int F(int a,\n      int b);\nint G() {\n}\n"
         self.assertEqual(self.shown(f"\n// Both.\n{both}\nint H();"),
