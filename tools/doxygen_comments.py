@@ -4,17 +4,17 @@
 The sources are commented for those who read them there. Here the same comments become the site's:
 - the first comment of a file is the file's;
 - a comment on lines of its own describes what follows. Declarations that follow each other without
-  a blank line or another comment share it;
-- a comment behind code describes what stands before it, also inside such a group;
-- a ruled comment, as in `// --- trees ----`, is a heading for those who read the source.
+  a blank line or another comment share it; where they have comments of their own it is their title;
+- one that a blank line follows is a heading for those who read the source;
+- a comment behind code describes what stands before it, also inside such a group.
 """
 import re
 import sys
 
 comment_line = re.compile(r'^(\s*)//( .*|)$')
-ruler = re.compile(r'^\s*// --- .* ---+$')
 behind = re.compile(r'^(\s*[^\s}/].*)// (.*)$')
-opens_scope = re.compile(r'^\s*(class|struct|union|enum|namespace|extern "C"|template|public|private)\b')
+opens_scope = re.compile(
+    r'^\s*(class|struct|union|enum|namespace|extern "C"|template|public|private)\b')
 literal = re.compile(r'"(\\.|[^"\\])*"|\'(\\.|[^\'\\])\'')
 
 
@@ -43,28 +43,44 @@ def group_length(lines, first):
     return number - first if declarations > 1 else 0
 
 
+def named(comment):
+    """A comment as the heading of a group: its first sentence is the title."""
+    text = ' '.join(line.strip().removeprefix('//').strip() for line in comment)
+    title, _, rest = text.partition('. ')
+    yield '/// \\name ' + title.rstrip('.')
+    if rest:
+        yield '/// ' + rest
+
+
 def filtered(lines):
+    number = 0
     group_ends = -1  # line in front of which a group closes
-    after_comment = False
-    for number, line in enumerate(lines):
+    while number < len(lines):
         if number == group_ends:
             yield '/// @}'
-        comment = comment_line.match(line)
-        if ruler.match(line):
-            yield ''
+        first = number
+        while number < len(lines) and comment_line.match(lines[number]):
+            number += 1
+        comment = lines[first:number]
+        if not comment:
+            tail = behind.match(lines[number])
+            yield f'{tail[1]}///< {tail[2]}' if tail else lines[number]
+            number += 1
             continue
-        if comment:
-            if number == 0:
-                yield '/// \\file'
-            yield f'{comment[1]}///{comment[2]}'
+        is_heading = first > 0 and (number == len(lines) or not lines[number].strip())
+        length = group_length(lines, number)
+        if first == 0:
+            yield '/// \\file'
+        if is_heading:
+            yield from [''] * len(comment)
+        elif length and behind.match(lines[number]):
+            yield from named(comment)
         else:
-            length = group_length(lines, number) if after_comment else 0
-            if length:
-                yield '/// @{'
-                group_ends = number + length
-            tail = behind.match(line)
-            yield f'{tail[1]}///< {tail[2]}' if tail else line
-        after_comment = bool(comment)
+            for line in comment:
+                yield line.replace('//', '///', 1)
+        if length:
+            yield '/// @{'
+            group_ends = number + length
     if group_ends == len(lines):
         yield '/// @}'
 

@@ -60,13 +60,13 @@ constexpr u32 kHeadEnd = 120;            // the user data record starts here
 constexpr u32 kHeadMapRecord = 248;      // the map record starts here
 constexpr u32 kHeadMapIndex = 2;         // its record index in node 0
 constexpr u32 kHeadSlotsSize = 8;        // offset table of node 0
-constexpr u32 kHeadNumRecords = 3;
+constexpr u32 kHeadNumRecords = 3;       // records of node 0
 
 static_assert(kHeadTreeDepth == kDescSize);
 static_assert(kHeadMapRecord == kHeadEnd + 128);
 
 // Map nodes: one record from 14 to nodeSize - 6.
-constexpr u32 kMapNodeTail = 6;
+constexpr u32 kMapNodeTail = 6;  // bytes behind it
 constexpr u32 kHeadMapOverhead =
     kHeadMapRecord + kHeadSlotsSize;                        // bytes of node 0 that are no map
 constexpr u32 kMapNodeOverhead = kDescSize + kMapNodeTail;  // bytes of a map node that are no map
@@ -98,13 +98,16 @@ constexpr u16 kVersionHfsx = 5;
 
 // Keys. The layout is the same in host order (search keys) and big-endian (keys in nodes); offsets
 // count the key length field, which holds the number of bytes after itself.
-constexpr u32 kKeyLengthSize = 2;
 
+constexpr u32 kKeyLengthSize = 2;  // bytes of that field, u16
+
+// Catalog key: where its fields stand, and what they are.
 constexpr u32 kCatKeyParentId = 2;    // u32
 constexpr u32 kCatKeyNameLength = 6;  // u16: UTF-16 code units
 constexpr u32 kCatKeyName = 8;        // u16[]: the name
 constexpr u32 kCatKeyFixed = 6;       // least key length
 
+// Extents key: where its fields stand, and what they are.
 constexpr u32 kExtKeyForkType = 2;    // u8: 0 data, 0xFF resource
 constexpr u32 kExtKeyPad = 3;         // u8
 constexpr u32 kExtKeyFileId = 4;      // u32
@@ -112,6 +115,7 @@ constexpr u32 kExtKeyStartBlock = 8;  // u32
 constexpr u32 kExtKeyFixed = 10;      // the one key length there is
 constexpr u32 kExtKeySize = 12;       // with its length field
 
+// Attributes key: where its fields stand, and what they are.
 constexpr u32 kAttrKeyPad = 2;          // u16
 constexpr u32 kAttrKeyFileId = 4;       // u32
 constexpr u32 kAttrKeyStartBlock = 8;   // u32

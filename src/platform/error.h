@@ -8,7 +8,7 @@ namespace VELK {
 
 // A status is a 32-bit value carried in an int: 0 is success. Statuses of the volume, the journal
 // or any other service pass through the engine unchanged.
-constexpr int kOk = 0;
+constexpr int kOk = 0;                                        // done
 constexpr int kErrInvalid = static_cast<int>(0xA0000101u);    // invalid request, or no room
 constexpr int kErrBadRecord = static_cast<int>(0xA0000106u);  // bad-block record of the wrong size
 constexpr int kErrNoMemory = static_cast<int>(0xA0000107u);   // out of memory

@@ -26,8 +26,9 @@ struct rb_node {
         *slot = this;
     }
 
-    // A node in no tree is its own parent. Mark a node before the first question.
+    // A node in no tree is its own parent. A new one has to be marked so.
     void MarkUnlinked() { parentColor = reinterpret_cast<std::uintptr_t>(this); }
+    // Whether it hangs in a tree.
     bool IsLinked() const { return Parent() != this; }
 
     // Rebalances after Link.

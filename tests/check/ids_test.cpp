@@ -45,6 +45,27 @@ TEST(CheckIds, DocumentTellsTheSame) {
     }
 }
 
+// "| `K03` | likely cause | what to do |", each once, in the order of the table.
+TEST(CheckIds, DocumentSaysWhatToDoForEach) {
+    std::ifstream file(TREEHFS_CHECK_DOCUMENT);
+    ASSERT_TRUE(file.is_open());
+    u32 count = 0;
+    for (std::string line; std::getline(file, line);) {
+        if (line.compare(0, 3, "| `") != 0) {
+            continue;
+        }
+        ASSERT_LT(count, kCheckIdCount) << line;
+        const std::string head = std::string("| `") + CheckIdTable()[count].name + "` | ";
+        EXPECT_EQ(line.substr(0, head.size()), head);
+        const std::size_t second = line.find(" | ", head.size());
+        ASSERT_NE(second, std::string::npos) << line;
+        EXPECT_GT(second, head.size() + 5) << line;
+        EXPECT_GT(line.size(), second + 10) << line;
+        count += 1;
+    }
+    EXPECT_EQ(count, kCheckIdCount);
+}
+
 // Test names carry the invariant they provoke: "H04RootNodeBeyondTheTree".
 TEST(CheckIds, EveryOneIsProvokedByATest) {
     std::string names;

@@ -151,13 +151,19 @@ class Comments(unittest.TestCase):
         self.assertEqual(self.shown("// The file.\n\n// A.\nint a;\n\nint b;  // B\n"),
                          "/// \\file\n/// The file.\n\n/// A.\nint a;\n\nint b;  ///< B\n")
 
-    def test_ruled_headings_describe_nothing(self):
-        self.assertEqual(self.shown("\n// --- trees ------\nint a;\nint b;"), "\n\nint a;\nint b;")
+    def test_headings_describe_nothing(self):
+        self.assertEqual(self.shown("\n// Trees.\n// More.\n\n// A.\nint a;"),
+                         "\n\n\n\n/// A.\nint a;")
 
     def test_declarations_in_a_row_share_a_comment(self):
         both = "int F(int a,\n      int b);\nint G() {\n}\n"
         self.assertEqual(self.shown(f"\n// Both.\n{both}\nint H();"),
                          f"\n/// Both.\n/// @{{\n{both}/// @}}\n\nint H();")
+
+    def test_a_comment_over_declarations_with_their_own_is_their_title(self):
+        self.assertEqual(self.shown("\n// Kinds. Of a\n// node.\nint a;  // A\nint b;\n"),
+                         "\n/// \\name Kinds\n/// Of a node.\n/// @{\n"
+                         "int a;  ///< A\nint b;\n/// @}\n")
 
     def test_a_type_shares_its_comment_with_nobody(self):
         text = "\n/// A.\nstruct A {\n    int a;\n};\nint b;"

@@ -59,7 +59,7 @@ struct HostCalls {
     // Positioned; they may transfer less than was asked for, and are then called again.
     ssize_t (*read)(int handle, void* target, std::size_t bytes, off_t offset);
     ssize_t (*write)(int handle, const void* source, std::size_t bytes, off_t offset);
-    int (*sync)(int handle);
+    int (*sync)(int handle);  // 0: all that was written is on the medium
 };
 
 // A regular file or a block device of the host. The first sync that fails is final: the host may
@@ -75,7 +75,7 @@ public:
     // bytes.
     static std::unique_ptr<FileDevice> Open(const std::string& path, Mode mode, u64 size,
                                             Problem* problem);
-    ~FileDevice() override;
+    ~FileDevice() override;  // closes the file; does not sync
 
     u64 Size() const override { return size_; }
     bool IsWritable() const override { return writable_; }

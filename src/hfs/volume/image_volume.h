@@ -83,6 +83,7 @@ public:
     static std::unique_ptr<ImageVolume> OpenFile(const std::string& path,
                                                  const OpenOptions& options, VolumeScan* scan,
                                                  Problem* problem);
+
     ImageVolume(const ImageVolume&) = delete;
     ImageVolume& operator=(const ImageVolume&) = delete;
     ~ImageVolume();  // closes, tears the trees down; what was not committed is gone
@@ -93,13 +94,14 @@ public:
     // Things a user should know although the volume opened: a truncated image, a journal that is
     // not empty, overlapping forks, ...
     const std::vector<Problem>& Notes() const;
-    bool IsTruncated() const;
-    const JournalState& Journal() const;
+    bool IsTruncated() const;             // the image ends before the volume does
+    const JournalState& Journal() const;  // as found at mount, and what became of it
     // The alternate header; null when it cannot be read. `*offset` (optional): its image offset.
     const VolumeHeader* AlternateHeader(u64* offset) const;
-    bool UsedBackupHeader() const;
+    bool UsedBackupHeader() const;  // the volume was mounted by it
 
     // --- trees -----------------------------------------------------------------------------------
+
     // fileId is kExtentsFileId, kCatalogFileId or kAttributesFileId.
     bool HasTree(u32 fileId) const;  // its fork is not empty
     // The open tree; opens it on first use. Null with `*problem` (optional) set.
@@ -109,7 +111,7 @@ public:
     // Drops clean nodes nobody holds while the trees' caches are above the budget. Search paths
     // stay valid. Call it between operations of long jobs; cheap when there is nothing to do.
     void TrimCache();
-    u64 CachedBytes() const;
+    u64 CachedBytes() const;  // of all trees, clean or not
 
     // Byte of the image where byte `forkOffset` of a special file lies; none when it lies nowhere.
     std::optional<u64> ImageOffset(u32 fileId, u64 forkOffset);
@@ -126,6 +128,7 @@ public:
     const Problem& LastIoProblem() const;
 
     // --- changes ---------------------------------------------------------------------------------
+
     bool IsWritable() const;  // takes changes; ends when a restore leaves a tree dirty
     // Makes an absent tree with the engine's Create and adds it to the volume. `initialSize` null:
     // the default clump. Catalog and extents constants are set here. 0 or a status.

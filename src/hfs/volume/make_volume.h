@@ -1,5 +1,9 @@
 // Writes a new, empty HFS+ or HFSX volume onto a device. The trees are made by the engine's Create
 // and the first catalog records by its InsertRecord.
+//
+//     FormatOptions options;
+//     options.name = u"Scratch";
+//     auto volume = MakeMemoryVolume(64 << 20, options, &problem);  // mounted, and writable
 #pragma once
 
 #include <memory>

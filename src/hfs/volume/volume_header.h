@@ -50,7 +50,7 @@ struct VolumeHeader {
     u32 nextCatalogId;       // next ID to hand out
     u32 writeCount;          // raised by writers
     u64 encodingsBitmap;     // one bit for each text encoding in use
-    u32 finderInfo[8];       // kept as it is
+    u32 finderInfo[8];       // 6 and 7: the volume's identifier; the others are kept as they are
     // Forks of the special files; all zero where there is none.
     HfsFork allocationFile;
     HfsFork extentsFile;
