@@ -8,3 +8,16 @@ target_include_directories(treehfs_options INTERFACE ${PROJECT_SOURCE_DIR}/src)
 add_library(treehfs_engine_options INTERFACE)
 target_link_libraries(treehfs_engine_options INTERFACE treehfs_options)
 target_compile_options(treehfs_engine_options INTERFACE -fno-exceptions -fno-rtti)
+
+# Libraries whose objects also go into the shared library: position-independent, and with no symbol
+# of their own to offer there.
+function(treehfs_share)
+  set_target_properties(${ARGN} PROPERTIES POSITION_INDEPENDENT_CODE ON
+    CXX_VISIBILITY_PRESET hidden VISIBILITY_INLINES_HIDDEN ON)
+endfunction()
+
+# A static library that is installed: as libtreehfs_NAME.a, so that its origin shows.
+function(treehfs_archive target name)
+  treehfs_share(${target})
+  set_target_properties(${target} PROPERTIES OUTPUT_NAME treehfs_${name})
+endfunction()

@@ -2,9 +2,9 @@
 // (the bad-block file among them), forks of attributes.
 #include "tool/block_owner.h"
 
+#include "hfs/records/json_writer.h"
 #include "tool/catalog_list.h"
 #include "tool/errors.h"
-#include "tool/json_writer.h"
 #include "tool/leaf_cursor.h"
 
 namespace VELK::tool {

@@ -3,9 +3,9 @@
 
 #include <string>
 
+#include "hfs/records/record_fields.h"
 #include "hfs/treehfs/bytes.h"
 #include "platform/types.h"
-#include "tool/record_fields.h"
 
 namespace VELK::tool {
 

@@ -11,9 +11,9 @@
 #include <unordered_set>
 #include <vector>
 
+#include "hfs/records/key_text.h"
+#include "hfs/records/name_text.h"
 #include "tool/catalog_item.h"
-#include "tool/key_text.h"
-#include "tool/name_text.h"
 #include "tool/session.h"
 
 namespace VELK::tool {

@@ -1,9 +1,9 @@
 // treehfs apply: runs an operations script through the engine.
 #include <cstdio>
 
+#include "hfs/records/json_writer.h"
 #include "tool/command.h"
 #include "tool/errors.h"
-#include "tool/json_writer.h"
 #include "tool/script_run.h"
 #include "tool/script_volume.h"
 #include "tool/script_words.h"

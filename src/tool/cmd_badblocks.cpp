@@ -1,8 +1,8 @@
 // badblocks: the runs of the bad-block file, as the engine loads them.
+#include "hfs/records/json_writer.h"
+#include "hfs/records/text_format.h"
 #include "tool/errors.h"
-#include "tool/json_writer.h"
 #include "tool/session.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

@@ -2,12 +2,12 @@
 #include <algorithm>
 
 #include "hfs/check/check.h"
+#include "hfs/records/json_writer.h"
+#include "hfs/records/name_text.h"
+#include "hfs/records/text_format.h"
 #include "tool/errors.h"
-#include "tool/json_writer.h"
-#include "tool/name_text.h"
 #include "tool/progress.h"
 #include "tool/session.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

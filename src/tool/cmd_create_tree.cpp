@@ -1,9 +1,9 @@
 // create-tree: adds a tree the volume lacks, usually the attributes tree.
+#include "hfs/records/text_format.h"
 #include "tool/command.h"
 #include "tool/errors.h"
 #include "tool/format_args.h"
 #include "tool/script_volume.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 
@@ -33,7 +33,7 @@ int RunCreateTree(Invocation* call) {
     const int status = volume->CreateTree(fileId, nodeShift, size ? &*size : nullptr);
     if (status != kOk) {
         volume->RestoreAfter(status);
-        ThrowFailed(call->image, fmt::format("{} tree: {}", ForkName(fileId), StatusText(status)),
+        ThrowFailed(call->image, fmt::format("{} tree: {}", ForkName(fileId), StatusWithCode(status)),
                     "nothing was changed");
     }
     const CBTreeHfs* tree = volume->Tree(fileId, nullptr);

@@ -2,13 +2,13 @@
 #include <cstdio>
 
 #include "hfs/check/check.h"
+#include "hfs/records/text_format.h"
 #include "tool/command.h"
 #include "tool/demo_volume.h"
 #include "tool/errors.h"
 #include "tool/plot.h"
 #include "tool/progress.h"
 #include "tool/session.h"
-#include "tool/text_format.h"
 #include "tool/tree_stats.h"
 
 namespace VELK::tool {

@@ -1,11 +1,11 @@
 // treehfs export: the records of a tree as lines of JSON.
+#include "hfs/records/json_writer.h"
+#include "hfs/records/record_json.h"
 #include "hfs/volume/volume_header.h"
 #include "tool/errors.h"
-#include "tool/json_writer.h"
 #include "tool/leaf_cursor.h"
 #include "tool/progress.h"
 #include "tool/record_digest.h"
-#include "tool/record_json.h"
 #include "tool/session.h"
 
 namespace VELK::tool {
@@ -16,7 +16,7 @@ std::string HeaderLine(u32 fileId, const CBTreeHfs& tree) {
     JsonWriter json(&line);
     json.BeginObject();
     json.Member("schema", "treehfs.records/1");
-    json.Member("tree", TreeName(fileId));
+    json.Member("tree", ForkName(fileId));
     json.Member("node_size", tree.header.nodeSize);
     const bool isBinary = fileId != kCatalogFileId || tree.compareKeys == CompareCatKeysCaseBin;
     json.Member("compare", isBinary ? "binary" : "case-insensitive");
@@ -56,7 +56,7 @@ int Run(Invocation* call) {
     call->out.Write(HeaderLine(fileId, *tree));
     LeafCursor cursor(&session, fileId, call->keepGoing);
     cursor.SeekFirst();
-    Progress progress(*call, std::string("export ") + TreeName(fileId), "records",
+    Progress progress(*call, std::string("export ") + ForkName(fileId), "records",
                       tree->header.leafRecords, 0);
     RecordDigest digest;
     LeafRecord record;

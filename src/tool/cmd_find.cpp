@@ -1,11 +1,11 @@
 // find: by name, ID, kind, size, date or block; or by exact key, showing the way down the tree.
+#include "hfs/records/text_format.h"
 #include "hfs/volume/volume_header.h"
 #include "tool/block_owner.h"
 #include "tool/errors.h"
 #include "tool/item_printer.h"
 #include "tool/key_search.h"
 #include "tool/name_glob.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

@@ -1,11 +1,11 @@
 // format: a new volume in a file, its trees made by the engine.
 #include <unistd.h>
 
+#include "hfs/records/text_format.h"
 #include "hfs/volume/make_volume.h"
 #include "tool/command.h"
 #include "tool/errors.h"
 #include "tool/format_args.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

@@ -2,12 +2,12 @@
 #include <algorithm>
 #include <cstdio>
 
+#include "hfs/records/json_writer.h"
+#include "hfs/records/record_json.h"
 #include "hfs/treehfs/bytes.h"
 #include "tool/errors.h"
-#include "tool/json_writer.h"
 #include "tool/progress.h"
 #include "tool/record_digest.h"
-#include "tool/record_json.h"
 #include "tool/script_run.h"
 #include "tool/script_volume.h"
 
@@ -87,9 +87,9 @@ public:
             if (status != kOk) {
                 volume_->RestoreAfter(status);
                 ThrowFailed(call_.image,
-                            std::string("cannot create the ") + TreeName(fileId_) +
+                            std::string("cannot create the ") + ForkName(fileId_) +
                                 " tree with nodes of " + Grouped(nodeSize_) +
-                                " bytes: " + StatusText(status),
+                                " bytes: " + StatusWithCode(status),
                             status == kErrInvalid ? "try --map " + std::to_string(nodeSize_) : "");
             }
         }
@@ -188,7 +188,7 @@ private:
         }
         if (status != kOk) {
             volume_->RestoreAfter(status);
-            Wrong(StatusText(status) + "; what was put in since the last batch is dropped");
+            Wrong(StatusWithCode(status) + "; what was put in since the last batch is dropped");
         }
         ++sinceFlush_;
         volume_->TrimCache();
@@ -196,7 +196,7 @@ private:
             sinceFlush_ = 0;
             status = volume_->Commit(0);
             if (status != kOk) {
-                Wrong("the batch could not be kept: " + StatusText(status));
+                Wrong("the batch could not be kept: " + StatusWithCode(status));
             }
         }
         return true;

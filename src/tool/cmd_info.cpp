@@ -1,11 +1,11 @@
 // info: the volume and its trees on one screen.
 #include "hfs/names_text.h"
+#include "hfs/records/text_format.h"
 #include "tool/catalog_paths.h"
 #include "tool/errors.h"
 #include "tool/leaf_cursor.h"
 #include "tool/progress.h"
 #include "tool/record_digest.h"
-#include "tool/text_format.h"
 #include "tool/volume_text.h"
 
 namespace VELK::tool {

@@ -1,10 +1,10 @@
 // plot: a picture of a tree.
+#include "hfs/records/text_format.h"
 #include "tool/command.h"
 #include "tool/errors.h"
 #include "tool/plot.h"
 #include "tool/progress.h"
 #include "tool/session.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

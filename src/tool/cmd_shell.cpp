@@ -57,7 +57,7 @@ private:
             return "...> ";
         }
         std::string prompt =
-            std::string(TreeName(runner_.FileId())) + (isWriting_ ? "(WRITE)> " : "(memory)> ");
+            std::string(ForkName(runner_.FileId())) + (isWriting_ ? "(WRITE)> " : "(memory)> ");
         return isWriting_ && call_->color ? kRed + prompt + kPlain : prompt;
     }
 

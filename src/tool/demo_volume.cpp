@@ -7,11 +7,11 @@
 #include <cstring>
 #include <vector>
 
+#include "hfs/records/key_text.h"
+#include "hfs/records/record_text.h"
 #include "hfs/volume/convert.h"
 #include "hfs/volume/make_volume.h"
 #include "tool/errors.h"
-#include "tool/key_text.h"
-#include "tool/record_text.h"
 
 namespace VELK::tool {
 
@@ -83,7 +83,7 @@ private:
 
     void Must(int status, const char* what) {
         if (status != kOk) {
-            ThrowFailed("demo", fmt::format("{}: {}", what, StatusText(status)), "");
+            ThrowFailed("demo", fmt::format("{}: {}", what, StatusWithCode(status)), "");
         }
     }
     static SearchKey KeyOf(u32 parent, const std::string& name) {

@@ -3,13 +3,13 @@
 
 #include <algorithm>
 
+#include "hfs/records/json_writer.h"
+#include "hfs/records/key_text.h"
+#include "hfs/records/name_text.h"
+#include "hfs/records/record_fields.h"
+#include "hfs/records/record_text.h"
+#include "hfs/records/record_view.h"
 #include "tool/hex_rows.h"
-#include "tool/json_writer.h"
-#include "tool/key_text.h"
-#include "tool/name_text.h"
-#include "tool/record_fields.h"
-#include "tool/record_text.h"
-#include "tool/record_view.h"
 
 namespace VELK::tool {
 

@@ -5,6 +5,7 @@
 #include <string>
 #include <vector>
 
+#include "hfs/records/nearest_word.h"
 #include "hfs/volume/problem.h"
 
 namespace VELK::tool {
@@ -48,10 +49,5 @@ void PrintError(const ToolError& error, bool json);
 
 // A remark on standard error: "treehfs: SUBJECT: TEXT".
 void PrintNote(const std::string& subject, const Problem& note);
-
-// The word of `words` that `wrong` was most likely meant to be; empty: none is near.
-std::string NearestWord(const std::string& wrong, const std::vector<std::string>& words);
-// " (did you mean WORD?)", or nothing.
-std::string DidYouMean(const std::string& wrong, const std::vector<std::string>& words);
 
 }  // namespace VELK::tool

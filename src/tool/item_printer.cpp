@@ -4,8 +4,8 @@
 #include <cstring>
 
 #include "hfs/names_text.h"
-#include "tool/record_view.h"
-#include "tool/text_format.h"
+#include "hfs/records/record_view.h"
+#include "hfs/records/text_format.h"
 
 namespace VELK::tool {
 

@@ -4,7 +4,7 @@
 #include <optional>
 #include <string>
 
-#include "tool/key_text.h"
+#include "hfs/records/key_text.h"
 #include "tool/session.h"
 
 namespace VELK::tool {

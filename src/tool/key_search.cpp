@@ -1,11 +1,11 @@
 // One lookup by key.
 #include "tool/key_search.h"
 
+#include "hfs/records/name_text.h"
+#include "hfs/records/record_view.h"
 #include "tool/errors.h"
 #include "tool/key_argument.h"
 #include "tool/leaf_cursor.h"
-#include "tool/name_text.h"
-#include "tool/record_view.h"
 
 namespace VELK::tool {
 

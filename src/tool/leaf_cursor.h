@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "tool/key_text.h"
+#include "hfs/records/key_text.h"
 #include "tool/node_reader.h"
 #include "tool/session.h"
 

@@ -3,13 +3,13 @@
 
 #include <algorithm>
 
+#include "hfs/records/json_writer.h"
+#include "hfs/records/key_text.h"
+#include "hfs/records/name_text.h"
+#include "hfs/records/record_view.h"
+#include "hfs/records/text_format.h"
 #include "tool/errors.h"
 #include "tool/hex_rows.h"
-#include "tool/json_writer.h"
-#include "tool/key_text.h"
-#include "tool/name_text.h"
-#include "tool/record_view.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 
@@ -80,7 +80,7 @@ std::vector<NodePrinter::Line> NodePrinter::RecordLines(const HeldNode& node, st
     for (u32 i = 0; i + 1 < SlotsShown(node); ++i) {
         const int status = reader.Describe(node.Get(), i, &record);
         if (status != 0) {
-            *fault = fmt::format("record {} cannot be located: {}", i, StatusText(status));
+            *fault = fmt::format("record {} cannot be located: {}", i, StatusWithCode(status));
             break;
         }
         Line line;

@@ -2,9 +2,9 @@
 // key order (a straight line is a compact tree).
 #include <algorithm>
 
+#include "hfs/records/text_format.h"
 #include "tool/plot.h"
 #include "tool/plot_svg.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

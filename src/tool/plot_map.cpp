@@ -3,9 +3,9 @@
 #include <algorithm>
 #include <cmath>
 
+#include "hfs/records/text_format.h"
 #include "tool/plot.h"
 #include "tool/plot_svg.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

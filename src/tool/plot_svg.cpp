@@ -2,8 +2,8 @@
 // pages; fill goes from pale to deep, kinds differ in hue and outline as well.
 #include "tool/plot_svg.h"
 
+#include "hfs/records/text_format.h"
 #include "tool/plot.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

@@ -2,10 +2,10 @@
 // below as bars of squares. A box is as wide as what hangs under it.
 #include <algorithm>
 
+#include "hfs/records/text_format.h"
 #include "tool/node_reader.h"
 #include "tool/plot.h"
 #include "tool/plot_svg.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

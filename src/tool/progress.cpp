@@ -9,10 +9,10 @@
 #include <csignal>
 #include <cstdio>
 
+#include "hfs/records/text_format.h"
 #include "hfs/volume/problem.h"
 #include "tool/command.h"
 #include "tool/errors.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

@@ -1,8 +1,8 @@
 // Records as text that can be given back.
+#include "hfs/records/record_fields.h"
+#include "hfs/records/record_text.h"
+#include "hfs/records/text_format.h"
 #include "hfs/treehfs/bytes.h"
-#include "tool/record_fields.h"
-#include "tool/record_text.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 namespace {

@@ -4,10 +4,10 @@
 
 #include <cstdio>
 
+#include "hfs/records/quoted.h"
 #include "platform/error.h"
 #include "tool/command.h"
 #include "tool/errors.h"
-#include "tool/quoted.h"
 #include "tool/script_lex.h"
 #include "tool/script_words.h"
 
@@ -16,22 +16,6 @@ namespace {
 
 constexpr u32 kDeepestInclude = 16;
 constexpr u32 kDeepestRepeat = 16;
-
-struct StatusWord {
-    const char* name;
-    int status;
-};
-constexpr StatusWord kStatusWords[] = {
-    {"ok", kOk},
-    {"invalid", kErrInvalid},
-    {"bad-record", kErrBadRecord},
-    {"no-memory", kErrNoMemory},
-    {"not-found", kErrNotFound},
-    {"exists", kErrExists},
-    {"too-large", kErrTooLarge},
-    {"corrupt", kErrCorrupt},
-    {"no-space", kErrNoSpace},
-};
 
 bool ReadAll(std::FILE* file, std::string* text) {
     char buffer[65536];
@@ -223,9 +207,11 @@ private:
 }  // namespace
 
 bool ParseStatus(std::string_view word, int* status) {
-    for (const StatusWord& known : kStatusWords) {
-        if (word == known.name) {
-            *status = known.status;
+    std::size_t count = 0;
+    const StatusEntry* known = StatusTable(&count);
+    for (std::size_t i = 0; i < count; ++i) {
+        if (word == known[i].name) {
+            *status = known[i].status;
             return true;
         }
     }
@@ -239,8 +225,10 @@ bool ParseStatus(std::string_view word, int* status) {
 
 std::vector<std::string> StatusNames() {
     std::vector<std::string> names;
-    for (const StatusWord& known : kStatusWords) {
-        names.push_back(known.name);
+    std::size_t count = 0;
+    const StatusEntry* known = StatusTable(&count);
+    for (std::size_t i = 0; i < count; ++i) {
+        names.push_back(known[i].name);
     }
     return names;
 }

@@ -1,10 +1,10 @@
 // Operations of scripts that change records.
 #include <fmt/format.h>
 
+#include "hfs/records/record_fields.h"
+#include "hfs/records/text_format.h"
 #include "hfs/treehfs/bytes.h"
-#include "tool/record_fields.h"
 #include "tool/script_run.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 namespace {
@@ -69,8 +69,8 @@ void ScriptRunner::ExplainInsert(CBTreeHfs* tree, int status, u32 size) {
         Remark(fmt::format("key and data take {} bytes, a node holds {} (too-large)", Grouped(size),
                            Grouped(tree->header.nodeSize)));
     } else if (status == kErrNoSpace) {
-        Remark(fmt::format("{}: the volume has no free blocks to grow the {}", StatusText(status),
-                           TreeName(fileId_)));
+        Remark(fmt::format("{}: the volume has no free blocks to grow the {}",
+                           StatusWithCode(status), ForkName(fileId_)));
     }
 }
 

@@ -2,11 +2,11 @@
 #include <array>
 #include <iterator>
 
+#include "hfs/records/key_text.h"
+#include "hfs/records/record_text.h"
 #include "platform/error.h"
 #include "tool/command.h"
 #include "tool/errors.h"
-#include "tool/key_text.h"
-#include "tool/record_text.h"
 #include "tool/script.h"
 #include "tool/script_words.h"
 

@@ -3,12 +3,12 @@
 
 #include <algorithm>
 
+#include "hfs/records/json_writer.h"
+#include "hfs/records/record_fields.h"
 #include "hfs/treehfs/bytes.h"
 #include "tool/command.h"
 #include "tool/errors.h"
-#include "tool/json_writer.h"
 #include "tool/progress.h"
-#include "tool/record_fields.h"
 #include "tool/script_words.h"
 
 namespace VELK::tool {

@@ -11,13 +11,13 @@
 #include <string>
 #include <vector>
 
+#include "hfs/records/key_text.h"
+#include "hfs/records/record_text.h"
 #include "hfs/volume/image_volume.h"
 #include "tool/engine_log.h"
 #include "tool/fault_shim.h"
-#include "tool/key_text.h"
 #include "tool/output.h"
 #include "tool/record_digest.h"
-#include "tool/record_text.h"
 #include "tool/script.h"
 
 namespace VELK::tool {

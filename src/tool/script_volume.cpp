@@ -156,7 +156,7 @@ void FinishTarget(const Invocation& call, const TargetOptions& options, ImageVol
         const int status = volume->Commit(0);
         if (status != kOk) {
             ThrowFailed(options.Subject(call),
-                        "the last changes could not be kept: " + StatusText(status), "");
+                        "the last changes could not be kept: " + StatusWithCode(status), "");
         }
     }
     if (!options.saveFile.empty()) {

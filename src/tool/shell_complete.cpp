@@ -1,9 +1,9 @@
 // Completion: fixed words from tables, keys and paths from the tree itself.
 #include "tool/shell_complete.h"
 
+#include "hfs/records/key_text.h"
+#include "hfs/records/record_fields.h"
 #include "hfs/treehfs/bytes.h"
-#include "tool/key_text.h"
-#include "tool/record_fields.h"
 #include "tool/script.h"
 
 namespace VELK::tool {

@@ -5,9 +5,9 @@
 
 #include <algorithm>
 
+#include "hfs/records/record_view.h"
+#include "hfs/records/text_format.h"
 #include "tool/errors.h"
-#include "tool/record_view.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "tool/json_writer.h"
+#include "hfs/records/json_writer.h"
 #include "tool/node_reader.h"
 #include "tool/progress.h"
 

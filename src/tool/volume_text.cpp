@@ -1,10 +1,10 @@
 // The volume in words.
 #include "tool/volume_text.h"
 
+#include "hfs/records/text_format.h"
 #include "tool/catalog_paths.h"
 #include "tool/errors.h"
 #include "tool/hex_rows.h"
-#include "tool/text_format.h"
 
 namespace VELK::tool {
 

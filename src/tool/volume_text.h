@@ -3,7 +3,7 @@
 
 #include <string>
 
-#include "tool/json_writer.h"
+#include "hfs/records/json_writer.h"
 #include "tool/session.h"
 
 namespace VELK::tool {

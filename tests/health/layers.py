@@ -19,9 +19,11 @@ AREAS = {
     "engine": {"platform", "format", "interface", "names"},
     "check": {"platform", "format", "names"},
     "volume": {"platform", "format", "interface", "engine-public", "names", "host"},
+    "records": {"platform", "format", "interface", "engine-public", "names", "volume"},
     "host": {"platform"},
+    "c": {"platform", "host", "format", "interface", "names", "volume", "records", "check"},
     "tool": {"platform", "format", "interface", "engine-public", "names", "host", "volume",
-             "check"},
+             "check", "records"},
 }
 # Private engine headers that code above the engine may use, and why.
 ENGINE_PUBLIC = {"bytes.h": "big-endian loads and stores of the whole project"}
@@ -51,11 +53,12 @@ def area(name):
         return "platform"
     if name.startswith("hfs/treehfs/"):
         return "engine"
-    for folder in ("volume", "check"):
+    for folder in ("volume", "check", "records"):
         if name.startswith(f"hfs/{folder}/"):
             return folder
-    if name.startswith("tool/"):
-        return "tool"
+    for folder in ("c", "tool"):
+        if name.startswith(folder + "/"):
+            return folder
     stem = name.removeprefix("hfs/").split(".")[0]
     if stem == "format":
         return "format"

@@ -1,5 +1,5 @@
 // JSON as import meets it: every kind of value, halves of pairs, and what is no JSON.
-#include "tool/json_reader.h"
+#include "hfs/records/json_reader.h"
 
 #include <gtest/gtest.h>
 

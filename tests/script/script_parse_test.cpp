@@ -5,8 +5,8 @@
 #include <fstream>
 #include <iterator>
 
+#include "hfs/records/record_fields.h"
 #include "script_support.h"
-#include "tool/record_fields.h"
 #include "tool/script.h"
 
 namespace VELK::tool {

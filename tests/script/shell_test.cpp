@@ -3,10 +3,10 @@
 
 #include <cstdio>
 
+#include "hfs/records/key_text.h"
+#include "hfs/records/record_text.h"
 #include "hfs/volume/make_volume.h"
 #include "script_support.h"
-#include "tool/key_text.h"
-#include "tool/record_text.h"
 #include "tool/shell_complete.h"
 
 namespace VELK::tool {

@@ -1,5 +1,5 @@
 // Keys as text: every form, every complaint, and the way back.
-#include "tool/key_text.h"
+#include "hfs/records/key_text.h"
 
 #include <gtest/gtest.h>
 

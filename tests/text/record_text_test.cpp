@@ -1,5 +1,5 @@
 // Record data as text: every form, every complaint, and the way back.
-#include "tool/record_text.h"
+#include "hfs/records/record_text.h"
 
 #include <gtest/gtest.h>
 
@@ -7,8 +7,8 @@
 #include <random>
 
 #include "hfs/format.h"
-#include "tool/record_fields.h"
-#include "tool/record_view.h"
+#include "hfs/records/record_fields.h"
+#include "hfs/records/record_view.h"
 
 namespace VELK::tool {
 namespace {

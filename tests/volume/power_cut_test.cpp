@@ -47,7 +47,7 @@ public:
             status = status == 0 ? Commit(volume.get()) : status;
             if (status != 0) {
                 EXPECT_TRUE(status == kErrNoSpace || status == kErrVolumeJournal)
-                    << test::CutOperationName(operation) << " " << StatusText(status);
+                    << test::CutOperationName(operation) << " " << StatusWithCode(status);
                 volume->RestoreAfter(status);
                 on.numbers = before;
                 refusals += 1;

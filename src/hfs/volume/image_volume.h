@@ -29,13 +29,6 @@
 
 namespace VELK {
 
-// Statuses of this layer; they pass through the engine unchanged.
-constexpr int kErrVolumeIo = static_cast<int>(0xA0000201u);         // the device failed
-constexpr int kErrVolumeTruncated = static_cast<int>(0xA0000202u);  // past the end of the image
-constexpr int kErrVolumeReadOnly = static_cast<int>(0xA0000203u);   // takes no changes
-constexpr int kErrVolumeUnmapped = static_cast<int>(0xA0000204u);   // past the fork's extents
-constexpr int kErrVolumeJournal = static_cast<int>(0xA0000205u);    // more than the journal holds
-
 // What becomes of changes.
 enum class Access {
     kReadOnly,  // changes are refused

@@ -184,7 +184,7 @@ Problem MakeTree(BlockDevice* device, ImageVolume* volume, const NewTree& tree,
                        "choose a larger size or smaller trees");
     }
     if (status != kOk) {
-        return Failure(std::string(ForkName(tree.fileId)) + " tree: " + StatusText(status), "");
+        return Failure(std::string(ForkName(tree.fileId)) + " tree: " + StatusWithCode(status), "");
     }
     return options.deviceIsZero ? Problem{} : ZeroFork(device, volume, tree.fileId);
 }
@@ -261,7 +261,7 @@ Problem MakeTrees(BlockDevice* device, ImageVolume* volume, const FormatOptions&
                                 " bytes cannot hold the root folder",
                             "choose larger nodes or a shorter name");
     }
-    return status == kOk ? Problem{} : Failure("root folder: " + StatusText(status), "");
+    return status == kOk ? Problem{} : Failure("root folder: " + StatusWithCode(status), "");
 }
 
 u32 SmallestNode(const FormatOptions& options) {
@@ -302,7 +302,7 @@ std::unique_ptr<ImageVolume> MountAndFill(std::unique_ptr<BlockDevice> device, B
         if (status != kOk) {
             *problem = volume->LastIoProblem()
                            ? volume->LastIoProblem()
-                           : Failure("cannot write the volume: " + StatusText(status), "");
+                           : Failure("cannot write the volume: " + StatusWithCode(status), "");
         }
     }
     return *problem ? nullptr : std::move(volume);

@@ -5,7 +5,6 @@
 #include <cstdio>
 
 #include "hfs/format.h"
-#include "hfs/volume/image_volume.h"
 #include "platform/error.h"
 
 namespace VELK {
@@ -55,32 +54,7 @@ std::string Format(const char* format, ...) {
     return buffer;
 }
 
-const char* StatusName(int status) {
-    switch (status) {
-        case kOk:
-            return "ok";
-        case kErrInvalid:
-            return "invalid";
-        case kErrBadRecord:
-            return "bad-record";
-        case kErrNoMemory:
-            return "no-memory";
-        case kErrNotFound:
-            return "not-found";
-        case kErrExists:
-            return "exists";
-        case kErrTooLarge:
-            return "too-large";
-        case kErrCorrupt:
-            return "corrupt";
-        case kErrNoSpace:
-            return "no-space";
-        default:
-            return "status";
-    }
-}
-
-std::string StatusText(int status) {
+std::string StatusWithCode(int status) {
     return Format("%s (%08X)", StatusName(status), static_cast<unsigned>(status));
 }
 

@@ -5,6 +5,7 @@
 #include <optional>
 #include <string>
 
+#include "platform/status.h"
 #include "platform/types.h"
 
 namespace VELK {
@@ -54,9 +55,8 @@ __attribute__((format(printf, 1, 2)))
 std::string
 Format(const char* format, ...);
 
-// "ok", "invalid", "corrupt", ...; "status" for a value nobody named. And "corrupt (A000011C)".
-const char* StatusName(int status);
-std::string StatusText(int status);
+// Name and number of a status: "corrupt (A000011C)".
+std::string StatusWithCode(int status);
 
 // "catalog", "extents", "attributes", "allocation", "startup", else "file".
 const char* ForkName(u32 fileId);

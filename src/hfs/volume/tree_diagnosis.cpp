@@ -69,7 +69,7 @@ Finding FirstFinding(const TreeDiagnosis& tree) {
 Problem DiagnoseTree(const TreeDiagnosis& tree) {
     const std::string name = std::string(ForkName(tree.fileId)) + " tree: ";
     const Finding finding = tree.header != nullptr ? FirstFinding(tree) : Finding{};
-    std::string text = name + StatusText(tree.status);
+    std::string text = name + StatusWithCode(tree.status);
     Problem problem;
     if (finding.text.empty()) {
         problem = Failure(text, "run check");
