@@ -3,15 +3,18 @@
 include(GNUInstallDirs)
 include(CMakePackageConfigHelpers)
 
-# The libraries people name. `engine`: trees, for drivers. `volume`: volumes in images, records,
-# the checker and a hosted platform. They gather the archives that the project is built in.
+# The libraries people name. `engine`: trees, for drivers. `host`: the same with the platform's
+# functions for a program. `volume`: besides, volumes in images, records and the checker. They gather
+# the archives that the project is built in.
 add_library(treehfs_api_engine INTERFACE)
 target_link_libraries(treehfs_api_engine INTERFACE treehfs hfs_convert hfs_names velk_platform)
+add_library(treehfs_api_host INTERFACE)
+target_link_libraries(treehfs_api_host
+  INTERFACE treehfs_api_engine $<LINK_GROUP:RESCAN,treehfs,velk_host>)
 add_library(treehfs_api_volume INTERFACE)
 target_link_libraries(treehfs_api_volume
-  INTERFACE hfs_records hfs_volume hfs_check treehfs_api_engine
-  $<LINK_GROUP:RESCAN,treehfs,velk_host>)
-foreach(name engine volume)
+  INTERFACE hfs_records hfs_volume hfs_check treehfs_api_host)
+foreach(name engine host volume)
   set_target_properties(treehfs_api_${name} PROPERTIES EXPORT_NAME ${name})
   target_compile_features(treehfs_api_${name} INTERFACE cxx_std_20)
   add_library(treehfs::${name} ALIAS treehfs_api_${name})
@@ -19,7 +22,8 @@ endforeach()
 
 set(archives treehfs velk_platform velk_host hfs_names hfs_names_text hfs_convert hfs_volume
   hfs_check hfs_records)
-set(libraries ${archives} treehfs_api_engine treehfs_api_volume treehfs_c_static)
+set(libraries ${archives} treehfs_api_engine treehfs_api_host treehfs_api_volume
+  treehfs_c_static)
 if(TARGET treehfs_c)
   list(APPEND libraries treehfs_c)
 endif()

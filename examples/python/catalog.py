@@ -10,7 +10,7 @@ import sys
 import treehfs
 
 volume = treehfs.open(sys.argv[1], overlay=True)
-print(f"{volume.info.file_count} files, {volume.info.folder_count} folders,",
+print("files:", volume.info.file_count, "folders:", volume.info.folder_count,
       "flags:", ", ".join(sorted(volume.info.flags)) or "none")
 
 # %% Everything in the root folder.

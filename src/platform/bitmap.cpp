@@ -58,6 +58,15 @@ u8 MaskOf(u64 base, u64 first, u64 end) {
     return static_cast<u8>(mask);
 }
 
+// Ones of a word, counted in pairs, fours and bytes. std::popcount would call into the compiler's
+// run-time library on processors without an instruction for it, and a driver may have none.
+u32 OnesOf(u64 word) {
+    word -= word >> 1 & 0x5555555555555555u;
+    word = (word & 0x3333333333333333u) + (word >> 2 & 0x3333333333333333u);
+    word = (word + (word >> 4)) & 0x0F0F0F0F0F0F0F0Fu;
+    return static_cast<u32>(word * 0x0101010101010101u >> 56);
+}
+
 }  // namespace
 
 unsigned long GetFreeBitPosBe(const unsigned char* bits, unsigned long first, unsigned long count) {
@@ -70,11 +79,10 @@ void CWndBitmap::Attach(u8* bits, u32 count) {
     zeros_ = count;
     u64 bit = 0;
     for (; count - bit >= kWordBits; bit += kWordBits) {
-        zeros_ -= static_cast<u32>(std::popcount(LoadWord(bits + bit / 8)));
+        zeros_ -= OnesOf(LoadWord(bits + bit / 8));
     }
     for (; bit < count; bit += 8) {
-        zeros_ -= static_cast<u32>(
-            std::popcount(static_cast<u8>(bits[bit / 8] & MaskOf(bit, bit, count))));
+        zeros_ -= OnesOf(static_cast<u8>(bits[bit / 8] & MaskOf(bit, bit, count)));
     }
 }
 
@@ -88,7 +96,7 @@ u32 CWndBitmap::SetRun(u32 first, u32 count) {
     for (u64 base = first & ~7u; base < end; base += 8) {
         const u8 mask = MaskOf(base, first, end);
         u8* byte = bits_ + base / 8;
-        changed += static_cast<u32>(std::popcount(static_cast<u8>(~*byte & mask)));
+        changed += OnesOf(static_cast<u8>(~*byte & mask));
         *byte = static_cast<u8>(*byte | mask);
     }
     zeros_ -= changed;
@@ -101,7 +109,7 @@ u32 CWndBitmap::ClearRun(u32 first, u32 count) {
     for (u64 base = first & ~7u; base < end; base += 8) {
         const u8 mask = MaskOf(base, first, end);
         u8* byte = bits_ + base / 8;
-        changed += static_cast<u32>(std::popcount(static_cast<u8>(*byte & mask)));
+        changed += OnesOf(static_cast<u8>(*byte & mask));
         *byte = static_cast<u8>(*byte & ~mask);
     }
     zeros_ += changed;

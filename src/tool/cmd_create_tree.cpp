@@ -33,7 +33,8 @@ int RunCreateTree(Invocation* call) {
     const int status = volume->CreateTree(fileId, nodeShift, size ? &*size : nullptr);
     if (status != kOk) {
         volume->RestoreAfter(status);
-        ThrowFailed(call->image, fmt::format("{} tree: {}", ForkName(fileId), StatusWithCode(status)),
+        ThrowFailed(call->image,
+                    fmt::format("{} tree: {}", ForkName(fileId), StatusWithCode(status)),
                     "nothing was changed");
     }
     const CBTreeHfs* tree = volume->Tree(fileId, nullptr);

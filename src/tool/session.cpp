@@ -112,7 +112,8 @@ Problem Session::ProblemOf(u32 fileId, u32 node, int status, const std::string& 
     }
     const CBTreeHfs* tree = volume_->OpenTree(fileId);
     const u64 forkOffset = tree != nullptr ? u64{node} << tree->nodeShift : 0;
-    std::string what = fmt::format("{} node {}: {}", ForkName(fileId), node, StatusWithCode(status));
+    std::string what =
+        fmt::format("{} node {}: {}", ForkName(fileId), node, StatusWithCode(status));
     if (!detail.empty()) {
         what += ": " + detail;
     }

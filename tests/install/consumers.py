@@ -40,13 +40,13 @@ class Step:
         if text not in have:
             sys.exit(f"{' '.join(map(str, command))}: '{have}', wanted '{text}'")
 
-    def configure(self, way, folder):
+    def configure(self, way, folder, target="all"):
         self.run("cmake", "-S", HERE / "consumer", "-B", folder, f"-DWAY={way}",
                  f"-DTREEHFS_SOURCE={ROOT}", f"-DEXAMPLES={ROOT / 'examples'}",
                  f"-DCMAKE_C_COMPILER={self.cc}", f"-DCMAKE_CXX_COMPILER={self.cxx}",
                  f"-DCMAKE_PREFIX_PATH={self.prefix}", "-DCMAKE_BUILD_TYPE=",
                  f"-DCMAKE_C_FLAGS={self.flags}", f"-DCMAKE_CXX_FLAGS={self.flags}")
-        self.run("cmake", "--build", folder, "-j2")
+        self.run("cmake", "--build", folder, "-j2", "--target", target)
 
     def install(self):
         shutil.rmtree(self.work, ignore_errors=True)
@@ -90,12 +90,24 @@ class Step:
         self.want('2:"readme"\nnote: success\n', program, image)
 
     def source(self):
-        """Both ways in one folder, so that the engine is compiled once."""
+        """Both ways in one folder, so that the engine is compiled once; and that engine in a
+        program that has no library at all beneath it."""
         folder = self.work / "source"
         shutil.rmtree(folder, ignore_errors=True)
+        self.flags = ""  # no sanitizer: that would be a library
         for way in ("subdirectory", "fetch"):
-            self.configure(way, folder)
+            self.configure(way, folder, "ram_volume")
             self.want(RAM_VOLUME, folder / "ram_volume")
+        archives = folder / "_deps/treehfs-build/src"
+        self.run(self.cxx, "-std=c++20", "-O1", "-ffreestanding", "-nostdlib", "-static",
+                 "-fno-exceptions", "-fno-rtti", "-fno-stack-protector",
+                 "-fno-threadsafe-statics", "-Wall", "-Wextra", "-Werror", f"-I{ROOT / 'src'}",
+                 ROOT / "examples/driver/driver.cpp",
+                 ROOT / "examples/ram_volume/ram_volume.cpp",
+                 archives / "hfs/treehfs/libtreehfs_engine.a", archives / "hfs/libtreehfs_convert.a",
+                 archives / "hfs/libtreehfs_names.a", archives / "platform/libtreehfs_platform.a",
+                 "-o", folder / "driver")
+        self.want("", folder / "driver")
 
 
 if __name__ == "__main__":

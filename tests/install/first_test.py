@@ -24,7 +24,7 @@ def main(program, image):
         again = run(program, copy)
         assert again == (1, listing + "note: the key is there already\n", ""), again
         absent = run(program, copy.with_name("absent.img"))
-        assert absent[0] == 1 and absent[1] == "" and absent[2] == "cannot open: no such file\n", absent
+        assert absent == (1, "", "cannot open: no such file\n"), absent
 
 
 if __name__ == "__main__":

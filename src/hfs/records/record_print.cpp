@@ -4,7 +4,7 @@
 #include "hfs/records/text_format.h"
 #include "hfs/treehfs/bytes.h"
 
-namespace VELK::tool {
+namespace VELK {
 namespace {
 
 std::string ExtentsText(const u8* extents) {
@@ -116,4 +116,4 @@ std::string DataText(u32 fileId, const u8* stored, u32 size, Blanks blanks) {
     return "hex:" + HexText(stored, size);
 }
 
-}  // namespace VELK::tool
+}  // namespace VELK
