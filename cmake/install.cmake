@@ -4,8 +4,8 @@ include(GNUInstallDirs)
 include(CMakePackageConfigHelpers)
 
 # The libraries people name. `engine`: trees, for drivers. `host`: the same with the platform's
-# functions for a program. `volume`: besides, volumes in images, records and the checker. They gather
-# the archives that the project is built in.
+# functions for a program. `volume`: besides, volumes in images, records and the checker. They
+# gather the archives that the project is built in.
 add_library(treehfs_api_engine INTERFACE)
 target_link_libraries(treehfs_api_engine INTERFACE treehfs hfs_convert hfs_names velk_platform)
 add_library(treehfs_api_host INTERFACE)

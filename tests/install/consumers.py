@@ -104,7 +104,8 @@ class Step:
                  "-fno-threadsafe-statics", "-Wall", "-Wextra", "-Werror", f"-I{ROOT / 'src'}",
                  ROOT / "examples/driver/driver.cpp",
                  ROOT / "examples/ram_volume/ram_volume.cpp",
-                 archives / "hfs/treehfs/libtreehfs_engine.a", archives / "hfs/libtreehfs_convert.a",
+                 archives / "hfs/treehfs/libtreehfs_engine.a",
+                 archives / "hfs/libtreehfs_convert.a",
                  archives / "hfs/libtreehfs_names.a", archives / "platform/libtreehfs_platform.a",
                  "-o", folder / "driver")
         self.want("", folder / "driver")
