@@ -7,6 +7,7 @@ The sources are commented for those who read them there. Here the same comments 
   a blank line or another comment share it; where they have comments of their own it is their title;
 - one that a blank line follows is a heading for those who read the source;
 - a comment behind code describes what stands before it, also inside such a group.
+Comments of C headers are read in the same way.
 """
 import re
 import sys
@@ -16,6 +17,24 @@ behind = re.compile(r'^(\s*[^\s}/].*)// (.*)$')
 opens_scope = re.compile(
     r'^\s*(class|struct|union|enum|namespace|extern "C"|template|public|private)\b')
 literal = re.compile(r'"(\\.|[^"\\])*"|\'(\\.|[^\'\\])\'')
+
+
+def in_line_comments(lines):
+    """The lines with block comments, as C has them, turned into line comments."""
+    inside = False
+    for line in lines:
+        text = line.rstrip()
+        opens = not inside and re.match(r'(.*\s|)/\*(\s|$)', text)
+        inside = inside or bool(opens)
+        ends = inside and text.endswith('*/')
+        if ends:
+            text = text[:-2].rstrip()
+        if opens:
+            line = text.replace('/*', '//', 1)
+        elif inside:
+            line = re.sub(r'^(\s*?) ?(\*|$)', r'\1//', text, count=1)
+        inside = inside and not ends
+        yield line
 
 
 def code_of(line):
@@ -33,11 +52,13 @@ def group_length(lines, first):
     declarations, depth, number = 0, 0, first
     while number < len(lines):
         code = code_of(lines[number])
-        at_edge = depth == 0 and (not code or opens_scope.match(code) or code.startswith('#'))
+        is_macro = code.startswith('#define ')
+        at_edge = depth == 0 and (not code or opens_scope.match(code) or
+                                  code.startswith('#') and not is_macro)
         depth += depth_change(code)
         if at_edge or depth < 0:
             break
-        if depth == 0 and code.endswith((';', '}')):
+        if depth == 0 and (is_macro or code.endswith((';', '}'))):
             declarations += 1
         number += 1
     return number - first if declarations > 1 else 0
@@ -87,4 +108,4 @@ def filtered(lines):
 
 if __name__ == '__main__':
     with open(sys.argv[1], encoding='utf-8') as header:
-        print('\n'.join(filtered(header.read().split('\n'))))
+        print('\n'.join(filtered(list(in_line_comments(header.read().split('\n'))))))

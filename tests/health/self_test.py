@@ -160,6 +160,11 @@ class Comments(unittest.TestCase):
         self.assertEqual(self.shown(f"\n// Both.\n{both}\nint H();"),
                          f"\n/// Both.\n/// @{{\n{both}/// @}}\n\nint H();")
 
+    def test_comments_of_c_become_line_comments(self):
+        self.assertEqual(list(doxygen_comments.in_line_comments(
+            ["/* A file", " * of C.", " */", "int a; /* A */", "/* B */", "int b; int* c; // C"])),
+            ["// A file", "// of C.", "//", "int a; // A", "// B", "int b; int* c; // C"])
+
     def test_a_comment_over_declarations_with_their_own_is_their_title(self):
         self.assertEqual(self.shown("\n// Kinds. Of a\n// node.\nint a;  // A\nint b;\n"),
                          "\n/// \\name Kinds\n/// Of a node.\n/// @{\n"
