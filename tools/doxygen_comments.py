@@ -9,6 +9,7 @@ The sources are commented for those who read them there. Here the same comments 
 - a comment behind code describes what stands before it, also inside such a group.
 Comments of C headers are read in the same way.
 """
+import os
 import re
 import sys
 
@@ -73,7 +74,14 @@ def named(comment):
         yield '/// ' + rest
 
 
-def filtered(lines):
+def without_commands(line):
+    """A comment whose backslashes and at signs Doxygen takes as they are."""
+    text = line.replace('//', '///', 1)
+    return text if re.match(r'\s*/// {4}', text) else re.sub(r'[\\@]', r'\\\g<0>', text)
+
+
+def filtered(lines, name=''):
+    """The lines of the header `name` as Doxygen wants them."""
     number = 0
     group_ends = -1  # line in front of which a group closes
     while number < len(lines):
@@ -91,14 +99,13 @@ def filtered(lines):
         is_heading = first > 0 and (number == len(lines) or not lines[number].strip())
         length = group_length(lines, number)
         if first == 0:
-            yield '/// \\file'
+            yield f'/// \\file {name}'.rstrip()
         if is_heading:
             yield from [''] * len(comment)
         elif length and behind.match(lines[number]):
             yield from named(comment)
         else:
-            for line in comment:
-                yield line.replace('//', '///', 1)
+            yield from map(without_commands, comment)
         if length:
             yield '/// @{'
             group_ends = number + length
@@ -108,4 +115,5 @@ def filtered(lines):
 
 if __name__ == '__main__':
     with open(sys.argv[1], encoding='utf-8') as header:
-        print('\n'.join(filtered(list(in_line_comments(header.read().split('\n'))))))
+        lines = list(in_line_comments(header.read().split('\n')))
+    print('\n'.join(filtered(lines, os.path.abspath(sys.argv[1]))))
