@@ -9,8 +9,8 @@
  * Handles belong to the caller until the matching close. A volume and its cursors are used by one
  * thread at a time. A null handle or pointer where one is needed gives TREEHFS_ERR_INVALID.
  *
- * Structs begin with their size, which the caller sets (TREEHFS_INIT): they may grow at their end in
- * later versions without breaking programs that were compiled before.
+ * Structs begin with their size, which the caller sets (TREEHFS_INIT): they may grow at their end
+ * in later versions without breaking programs that were compiled before.
  */
 #ifndef TREEHFS_TREEHFS_H
 #define TREEHFS_TREEHFS_H
@@ -22,6 +22,7 @@
 extern "C" {
 #endif
 
+/* Before each function that the shared library offers. */
 #if defined(__GNUC__)
 #define TREEHFS_API __attribute__((visibility("default")))
 #else
@@ -30,24 +31,24 @@ extern "C" {
 
 /* --- statuses --------------------------------------------------------------------------------- */
 
-#define TREEHFS_OK 0
+#define TREEHFS_OK 0                              /* done */
 #define TREEHFS_ERR_INVALID ((int)0xA0000101u)    /* cannot be served, or no room */
 #define TREEHFS_ERR_BAD_RECORD ((int)0xA0000106u) /* a bad-block record has the wrong size */
-#define TREEHFS_ERR_NO_MEMORY ((int)0xA0000107u)
-#define TREEHFS_ERR_NOT_FOUND ((int)0xA000010Eu) /* no such key, or the end of the records */
-#define TREEHFS_ERR_EXISTS ((int)0xA000010Fu)    /* the key is there already */
-#define TREEHFS_ERR_TOO_LARGE ((int)0xA0000115u) /* key and data are larger than a node */
-#define TREEHFS_ERR_CORRUPT ((int)0xA000011Cu)   /* the tree contradicts itself */
-#define TREEHFS_ERR_NO_SPACE ((int)0xA0000123u)  /* the volume cannot supply a node */
-#define TREEHFS_ERR_IO ((int)0xA0000201u)        /* the image could not be read or written */
-#define TREEHFS_ERR_TRUNCATED ((int)0xA0000202u) /* past the end of the image */
-#define TREEHFS_ERR_READ_ONLY ((int)0xA0000203u) /* the volume takes no changes */
-#define TREEHFS_ERR_UNMAPPED ((int)0xA0000204u)  /* past the extents of the tree file */
-#define TREEHFS_ERR_JOURNAL ((int)0xA0000205u)   /* more changes than the journal holds */
-#define TREEHFS_ERR_OPEN ((int)0xA0000206u)      /* no volume can be opened there */
-#define TREEHFS_ERR_NO_TREE ((int)0xA0000207u)   /* the volume has no such tree */
-#define TREEHFS_ERR_CLOSED ((int)0xA0000208u)    /* the volume is closed */
-#define TREEHFS_ERR_BUFFER ((int)0xA0000209u)    /* the buffer is too small; its size says how */
+#define TREEHFS_ERR_NO_MEMORY ((int)0xA0000107u)  /* out of memory */
+#define TREEHFS_ERR_NOT_FOUND ((int)0xA000010Eu)  /* no such key, or the end of the records */
+#define TREEHFS_ERR_EXISTS ((int)0xA000010Fu)     /* the key is there already */
+#define TREEHFS_ERR_TOO_LARGE ((int)0xA0000115u)  /* key and data are larger than a node */
+#define TREEHFS_ERR_CORRUPT ((int)0xA000011Cu)    /* the tree contradicts itself */
+#define TREEHFS_ERR_NO_SPACE ((int)0xA0000123u)   /* the volume cannot supply a node */
+#define TREEHFS_ERR_IO ((int)0xA0000201u)         /* the image could not be read or written */
+#define TREEHFS_ERR_TRUNCATED ((int)0xA0000202u)  /* past the end of the image */
+#define TREEHFS_ERR_READ_ONLY ((int)0xA0000203u)  /* the volume takes no changes */
+#define TREEHFS_ERR_UNMAPPED ((int)0xA0000204u)   /* past the extents of the tree file */
+#define TREEHFS_ERR_JOURNAL ((int)0xA0000205u)    /* more changes than the journal holds */
+#define TREEHFS_ERR_OPEN ((int)0xA0000206u)       /* no volume can be opened there */
+#define TREEHFS_ERR_NO_TREE ((int)0xA0000207u)    /* the volume has no such tree */
+#define TREEHFS_ERR_CLOSED ((int)0xA0000208u)     /* the volume is closed */
+#define TREEHFS_ERR_BUFFER ((int)0xA0000209u)     /* the buffer is too small; its size says how */
 
 /* "not-found", "corrupt", ...; "status" for a value that is none of these. Never null. */
 TREEHFS_API const char *treehfs_status_name(int status);
@@ -67,6 +68,7 @@ TREEHFS_API const char *treehfs_version(void);
 
 /* --- volumes ---------------------------------------------------------------------------------- */
 
+/* An open volume: opaque, from treehfs_open to treehfs_close. */
 typedef struct treehfs_volume treehfs_volume;
 
 #define TREEHFS_READ 0u    /* changes are refused */
@@ -78,8 +80,9 @@ typedef struct treehfs_volume treehfs_volume;
 #define TREEHFS_OPEN_REPLAY 4u        /* carry the journal out first */
 #define TREEHFS_OPEN_BACKUP_HEADER 8u /* start from the alternate volume header */
 
+/* How to open a volume. */
 typedef struct treehfs_open_options {
-    uint32_t struct_size;
+    uint32_t struct_size; /* sizeof this struct */
     uint32_t access;      /* TREEHFS_READ, ... */
     uint32_t flags;       /* TREEHFS_OPEN_... */
     uint32_t partition;   /* number of the partition; 0: whichever holds a volume */
@@ -94,8 +97,8 @@ TREEHFS_API int treehfs_open(const char *path, const treehfs_open_options *optio
  * returned; cursors stay to be closed. Null is allowed. */
 TREEHFS_API int treehfs_close(treehfs_volume *volume);
 
-#define TREEHFS_VOLUME_HFSX 1u
-#define TREEHFS_VOLUME_JOURNALED 2u
+#define TREEHFS_VOLUME_HFSX 1u            /* HFSX; otherwise HFS+ */
+#define TREEHFS_VOLUME_JOURNALED 2u       /* has a journal */
 #define TREEHFS_VOLUME_JOURNAL_PENDING 4u /* transactions wait in the journal */
 #define TREEHFS_VOLUME_TRUNCATED 8u       /* the image ends before the volume */
 #define TREEHFS_VOLUME_WRITABLE 16u       /* takes changes */
@@ -103,21 +106,22 @@ TREEHFS_API int treehfs_close(treehfs_volume *volume);
 
 /* Dates are seconds since 1904-01-01, UTC (create_date: local time); 0: not set. */
 typedef struct treehfs_volume_info {
-    uint32_t struct_size;
-    uint32_t flags;      /* TREEHFS_VOLUME_... */
-    uint64_t offset;     /* of the volume in the image, bytes */
-    uint32_t block_size; /* allocation block, bytes */
-    uint32_t total_blocks;
-    uint32_t free_blocks;
-    uint32_t file_count;
-    uint32_t folder_count;
-    uint32_t next_id;
-    uint32_t create_date;
-    uint32_t modify_date;
-    uint32_t backup_date;
-    uint32_t checked_date;
+    uint32_t struct_size;  /* sizeof this struct */
+    uint32_t flags;        /* TREEHFS_VOLUME_... */
+    uint64_t offset;       /* of the volume in the image, bytes */
+    uint32_t block_size;   /* allocation block, bytes */
+    uint32_t total_blocks; /* allocation blocks */
+    uint32_t free_blocks;  /* of these, in nobody's use */
+    uint32_t file_count;   /* files, as the volume header says */
+    uint32_t folder_count; /* folders but the root, as the volume header says */
+    uint32_t next_id;      /* ID that the next new file or folder gets */
+    uint32_t create_date;  /* when the volume was made; local time */
+    uint32_t modify_date;  /* last change */
+    uint32_t backup_date;  /* last backup */
+    uint32_t checked_date; /* last check */
 } treehfs_volume_info;
 
+/* Fills `info`, up to the size it names. */
 TREEHFS_API int treehfs_get_volume_info(treehfs_volume *volume, treehfs_volume_info *info);
 /* Things worth knowing although the volume opened, one by one; null behind the last. Valid until
  * the volume is closed. */
@@ -125,20 +129,22 @@ TREEHFS_API const char *treehfs_note(treehfs_volume *volume, uint32_t index);
 
 /* --- trees ------------------------------------------------------------------------------------ */
 
+/* Which tree: its file ID. */
 #define TREEHFS_EXTENTS 3u
 #define TREEHFS_CATALOG 4u
 #define TREEHFS_ATTRIBUTES 8u
 
+/* The header of a tree (docs/format.md). */
 typedef struct treehfs_tree_info {
-    uint32_t struct_size;
-    uint32_t node_size; /* bytes */
-    uint32_t depth;     /* levels; 0: the tree is empty */
-    uint32_t root_node;
-    uint32_t first_leaf;
-    uint32_t last_leaf;
-    uint32_t leaf_records;
-    uint32_t total_nodes;
-    uint32_t free_nodes;
+    uint32_t struct_size;    /* sizeof this struct */
+    uint32_t node_size;      /* bytes */
+    uint32_t depth;          /* levels; 0: the tree is empty */
+    uint32_t root_node;      /* node number; 0: the tree is empty */
+    uint32_t first_leaf;     /* node number of the leaf with the smallest keys */
+    uint32_t last_leaf;      /* node number of the leaf with the greatest keys */
+    uint32_t leaf_records;   /* records in all leaves */
+    uint32_t total_nodes;    /* nodes of the file, used or free */
+    uint32_t free_nodes;     /* of these, not in use */
     uint32_t max_key_length; /* bytes, without the length field */
     uint32_t attributes;     /* of the header record */
     uint32_t key_compare;    /* 0xBC binary, 0xCF case-insensitive, 0 before HFSX */
@@ -175,18 +181,19 @@ TREEHFS_API int treehfs_record_json(uint32_t tree, const void *key, uint32_t key
 TREEHFS_API int treehfs_find(treehfs_volume *volume, uint32_t tree, const void *key,
                              uint32_t key_size, void *data, uint32_t capacity, uint32_t *size);
 
+/* A walk in key order: opaque, from treehfs_cursor_open to treehfs_cursor_close. */
 typedef struct treehfs_cursor treehfs_cursor;
 
 /* A record under a cursor; the bytes are the cursor's, valid until its next call. */
 typedef struct treehfs_record {
-    uint32_t struct_size;
-    uint32_t id; /* parent ID of a catalog key, else the file ID */
-    const void *key;
-    const void *data;
-    uint32_t key_size;
-    uint32_t data_size;
-    uint32_t node; /* where it lies */
-    uint32_t index;
+    uint32_t struct_size; /* sizeof this struct */
+    uint32_t id;          /* parent ID of a catalog key, else the file ID */
+    const void *key;      /* as on disk, length field included */
+    const void *data;     /* as on disk */
+    uint32_t key_size;    /* bytes */
+    uint32_t data_size;   /* bytes */
+    uint32_t node;        /* number of the leaf it lies in */
+    uint32_t index;       /* which record of that leaf, from 0 */
 } treehfs_record;
 
 /* Stands before the first record whose key is not below `key`; null: before the first of all. */
@@ -210,14 +217,18 @@ TREEHFS_API void treehfs_cursor_close(treehfs_cursor *cursor);
 
 /* Marks the start of changes that belong together. TREEHFS_ERR_INVALID: others wait already. */
 TREEHFS_API int treehfs_begin(treehfs_volume *volume);
+/* Keeps all changes since the last commit, or none of them. */
 TREEHFS_API int treehfs_commit(treehfs_volume *volume);
+/* Drops all changes since the last commit. */
 TREEHFS_API int treehfs_rollback(treehfs_volume *volume);
 
+/* Adds a record; TREEHFS_ERR_EXISTS: the key is there. */
 TREEHFS_API int treehfs_insert(treehfs_volume *volume, uint32_t tree, const void *key,
                                uint32_t key_size, const void *data, uint32_t data_size);
 /* The new data may have another size. */
 TREEHFS_API int treehfs_update(treehfs_volume *volume, uint32_t tree, const void *key,
                                uint32_t key_size, const void *data, uint32_t data_size);
+/* Removes the record with this key. */
 TREEHFS_API int treehfs_delete(treehfs_volume *volume, uint32_t tree, const void *key,
                                uint32_t key_size);
 
@@ -227,38 +238,40 @@ TREEHFS_API int treehfs_delete(treehfs_volume *volume, uint32_t tree, const void
 #define TREEHFS_CHECK_FULL 2u       /* also the trees against each other and the bitmap */
 #define TREEHFS_CHECK_KEEP_GOING 4u /* go on in a tree after a node that cannot be read */
 
-#define TREEHFS_INFO 0u
-#define TREEHFS_WARNING 1u
-#define TREEHFS_ERROR 2u
+#define TREEHFS_INFO 0u    /* a remark */
+#define TREEHFS_WARNING 1u /* a number nothing relies on alone */
+#define TREEHFS_ERROR 2u   /* makes a reader go wrong */
 
+/* How thorough a check is. */
 typedef struct treehfs_check_options {
-    uint32_t struct_size;
-    uint32_t flags;      /* TREEHFS_CHECK_... */
-    uint32_t max_errors; /* stop at so many; 0: no limit */
+    uint32_t struct_size; /* sizeof this struct */
+    uint32_t flags;       /* TREEHFS_CHECK_... */
+    uint32_t max_errors;  /* stop at so many; 0: no limit */
 } treehfs_check_options;
 
 /* A broken invariant. The texts are valid during the callback. */
 typedef struct treehfs_finding {
-    uint32_t struct_size;
-    uint32_t severity; /* TREEHFS_INFO, ... */
-    const char *id;    /* "K03"; docs/check.md lists them */
-    uint32_t tree;     /* TREEHFS_CATALOG, ...; 0: the volume */
-    int32_t record;    /* index in the node; -1: none in particular */
-    int64_t node;      /* -1: none in particular */
-    uint64_t offset;   /* byte of the image; UINT64_MAX: none in particular */
-    const char *where; /* "catalog node 14 record 0" */
-    const char *text;  /* one sentence */
+    uint32_t struct_size; /* sizeof this struct */
+    uint32_t severity;    /* TREEHFS_INFO, ... */
+    const char *id;       /* "K03"; docs/check.md lists them */
+    uint32_t tree;        /* TREEHFS_CATALOG, ...; 0: the volume */
+    int32_t record;       /* index in the node; -1: none in particular */
+    int64_t node;         /* -1: none in particular */
+    uint64_t offset;      /* byte of the image; UINT64_MAX: none in particular */
+    const char *where;    /* "catalog node 14 record 0" */
+    const char *text;     /* one sentence */
 } treehfs_finding;
 
+/* What a check found. */
 typedef struct treehfs_check_summary {
-    uint32_t struct_size;
-    uint32_t errors;
-    uint32_t warnings;
-    uint32_t infos;
-    uint32_t unreadable; /* pieces that could not be read */
-    uint32_t stopped;    /* 1: the run did not come to its end */
-    uint64_t nodes;      /* visited */
-    uint64_t bytes;      /* read */
+    uint32_t struct_size; /* sizeof this struct */
+    uint32_t errors;      /* findings of that severity */
+    uint32_t warnings;    /* findings of that severity */
+    uint32_t infos;       /* findings of that severity */
+    uint32_t unreadable;  /* pieces that could not be read */
+    uint32_t stopped;     /* 1: the run did not come to its end */
+    uint64_t nodes;       /* visited */
+    uint64_t bytes;       /* read */
 } treehfs_check_summary;
 
 /* Not 0: stop the run soon. Must not call back into the volume. */

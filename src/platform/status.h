@@ -19,8 +19,9 @@ constexpr int kErrVolumeNoTree = static_cast<int>(0xA0000207u);     // the volum
 constexpr int kErrVolumeClosed = static_cast<int>(0xA0000208u);     // closed already
 constexpr int kErrVolumeBuffer = static_cast<int>(0xA0000209u);     // the caller's buffer is small
 
+// One status and its words, which are constant.
 struct StatusEntry {
-    int status;
+    int status;        // its value
     const char* name;  // one word for programs, as in "not-found"
     const char* text;  // what it means, for a person; no full stop
 };

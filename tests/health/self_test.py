@@ -160,6 +160,10 @@ class Comments(unittest.TestCase):
         self.assertEqual(self.shown(f"\n// Both.\n{both}\nint H();"),
                          f"\n/// Both.\n/// @{{\n{both}/// @}}\n\nint H();")
 
+    def test_no_comment_gives_commands(self):
+        self.assertEqual(self.shown("\n// \\u0020, @x\n//\n//     a = '\\n';\nint a;"),
+                         "\n/// \\\\u0020, \\@x\n///\n///     a = '\\n';\nint a;")
+
     def test_comments_of_c_become_line_comments(self):
         self.assertEqual(list(doxygen_comments.in_line_comments(
             ["/* A file", " * of C.", " */", "int a; /* A */", "/* B */", "int b; int* c; // C"])),

@@ -11,13 +11,15 @@
 
 namespace VELK {
 
+// A value and what it holds. Fields that its kind does not use are empty.
 struct JsonValue {
+    // What JSON knows.
     enum class Kind : u8 { kNull, kBool, kNumber, kString, kArray, kObject };
 
-    Kind kind = Kind::kNull;
-    bool isTrue = false;
-    std::string number;
-    NameUnits units;
+    Kind kind = Kind::kNull;         // which of them it is
+    bool isTrue = false;             // of a bool
+    std::string number;              // as it was written
+    NameUnits units;                 // of a string
     std::vector<JsonValue> items;    // of an array; of an object, the values of its members
     std::vector<std::string> names;  // of the members
 

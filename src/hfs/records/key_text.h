@@ -15,10 +15,11 @@ namespace VELK {
 
 // A key as the engine's operations take it: host order, length field first.
 struct SearchKey {
-    alignas(8) u8 bytes[kKeyLengthSize + kMaxKeyLength + 6] = {};
+    alignas(8) u8 bytes[kKeyLengthSize + kMaxKeyLength + 6] = {};  // the key, and slack behind it
     u32 id = 0;    // parent or file ID, which the operations want besides
     u32 size = 0;  // bytes, length field included
 
+    // The key as the engine takes it.
     const BTreeKey* Key() const { return reinterpret_cast<const BTreeKey*>(bytes); }
 };
 

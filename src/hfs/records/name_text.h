@@ -11,6 +11,7 @@
 
 namespace VELK {
 
+// What a name is written for.
 enum class NameForm {
     kText,  // escaped, one line for a person
     kRaw,   // the bytes of a path, for lists that end in NUL

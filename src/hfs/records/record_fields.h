@@ -27,33 +27,37 @@ constexpr u32 kInlineFixed = 16;
 constexpr u32 kForkAttributeSize = 88;
 constexpr u32 kExtentsAttributeSize = 72;
 
+// How a field is written.
 enum class FieldKind {
-    kNumber,
-    kHex,
-    kOctal,
+    kNumber,   // decimal
+    kHex,      // after 0x
+    kOctal,    // after 0
     kDate,     // seconds since 1904, as ISO 8601
     kCode,     // four characters, in quotes when printable
     kExtents,  // eight descriptors, [[start,count],...]
     kBlocks,   // the sum of the extents that follow it unless given
 };
 
+// One field of a record.
 struct Field {
-    const char* name;
-    u16 offset;
-    u8 width;
-    FieldKind kind;
+    const char* name;  // as in text and JSON
+    u16 offset;        // bytes from the record's start
+    u8 width;          // bytes
+    FieldKind kind;    // how it is written
 };
 
+// One kind of record.
 struct RecordKind {
     const char* name;      // as written before the braces
     const char* typeName;  // as listings show it
     u32 fileId;            // the tree it belongs to
     u32 type;              // first 16 or 32 bits; 0 in the extents tree, which has one kind
     u32 size;              // bytes without a name or a value
-    const Field* fields;
-    u32 fieldCount;
+    const Field* fields;   // its fields, in the order they are printed
+    u32 fieldCount;        // entries of `fields`
 };
 
+// All kinds, and how many there are.
 extern const RecordKind kRecordKinds[];
 extern const u32 kRecordKindCount;
 

@@ -12,6 +12,7 @@
 
 namespace VELK {
 
+// What a line holds besides the readable members.
 struct RecordJsonOptions {
     bool raw = true;       // the data as bytes besides
     bool rawKeys = false;  // the key as bytes besides

@@ -15,6 +15,7 @@
 
 namespace VELK {
 
+// What a text of data stands for.
 struct RecordData {
     bool isSame = false;     // `same`: the bytes are the record's own
     std::vector<u8> stored;  // otherwise

@@ -16,8 +16,8 @@ struct StoredRecord {
     u32 id = 0;            // parent ID of a catalog key, else the file ID
     std::vector<u8> key;   // length field included
     std::vector<u8> data;  // without the pad byte between key and data
-    u32 node = 0;          // where it lies
-    u32 index = 0;
+    u32 node = 0;          // number of the leaf it lies in
+    u32 index = 0;         // which record of that leaf
 };
 
 // Copies the record that a path stands on: kErrNotFound when it stands on none.

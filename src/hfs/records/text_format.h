@@ -25,6 +25,6 @@ std::string BinaryBytes(u64 bytes);  // binary: 512 KiB
 std::string Counted(u64 count, const char* singular, const char* plural);
 
 char* PutNumber(char* out, u64 value, u32 width);  // right-aligned
-u32 DigitCount(u64 value);
+u32 DigitCount(u64 value);                         // decimal digits
 
 }  // namespace VELK
