@@ -164,6 +164,7 @@ TREEHFS_API int treehfs_get_tree_info(treehfs_volume *volume, uint32_t tree,
 /* 2:"name" (catalog), 5:data:0 (extents), 37:"name" (attributes), hex:... (any) -> bytes. */
 TREEHFS_API int treehfs_key_parse(uint32_t tree, const char *text, void *key, uint32_t capacity,
                                   uint32_t *size);
+/* The way back. */
 TREEHFS_API int treehfs_key_text(uint32_t tree, const void *key, uint32_t key_size, char *text,
                                  uint32_t capacity, uint32_t *size);
 /* folder{id:16,...}, inline{"text"}, hex:... -> bytes. */

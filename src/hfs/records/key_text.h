@@ -37,6 +37,7 @@ std::string KeyText(u32 fileId, const u8* stored, u32 size, Blanks blanks);
 // Between the two forms. The first fails for bytes that are no key the tree could hold: they are
 // too short for the fields of its kind, too long for any, or disagree with their length field.
 bool SearchKeyFromStored(u32 fileId, const u8* stored, u32 size, SearchKey* key);
+// The stored form, length field included.
 std::vector<u8> StoredKey(u32 fileId, const SearchKey& key);
 // A key as iteration delivers it: in host order, save in the extents tree.
 std::vector<u8> StoredFromDelivered(u32 fileId, const u8* delivered, u32 size);

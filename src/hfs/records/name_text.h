@@ -24,6 +24,7 @@ constexpr u32 kNameBytesPerUnit = 6;
 // Writes `count` big-endian code units to `out`, which has room for kNameBytesPerUnit each, and
 // returns the end.
 char* PutName(char* out, const u8* unitsBe, u32 count, NameForm form);
+// The same at the end of a string, and as a string of its own in the form for a person.
 void AppendName(std::string* out, const u8* unitsBe, u32 count, NameForm form);
 std::string NameText(const u8* unitsBe, u32 count);
 

@@ -31,6 +31,7 @@ bool ParseNumber(std::string_view text, u64 most, u64* number);
 // Bytes from hexadecimal digits; blanks between them are skipped. `form` begins the text of a
 // problem: "hex:00zz".
 Problem ParseHexBytes(std::string_view digits, std::string_view form, std::vector<u8>* bytes);
+// The digits of bytes, lower case, nothing between them.
 std::string HexText(const u8* bytes, std::size_t size);
 
 }  // namespace VELK

@@ -15,17 +15,17 @@ constexpr u16 kFolderRecord = 1;
 constexpr u16 kFileRecord = 2;
 constexpr u16 kFolderThread = 3;
 constexpr u16 kFileThread = 4;
-constexpr u32 kFolderSize = 88;
-constexpr u32 kFileSize = 248;
-constexpr u32 kThreadFixed = 10;
+constexpr u32 kFolderSize = 88;   // bytes of a folder record
+constexpr u32 kFileSize = 248;    // bytes of a file record
+constexpr u32 kThreadFixed = 10;  // bytes of a thread in front of its name
 
 // First 32 bits of attribute data.
 constexpr u32 kInlineAttribute = 0x10;
 constexpr u32 kForkAttribute = 0x20;
 constexpr u32 kExtentsAttribute = 0x30;
-constexpr u32 kInlineFixed = 16;
-constexpr u32 kForkAttributeSize = 88;
-constexpr u32 kExtentsAttributeSize = 72;
+constexpr u32 kInlineFixed = 16;           // bytes of an inline attribute in front of its value
+constexpr u32 kForkAttributeSize = 88;     // bytes of an attribute with a fork
+constexpr u32 kExtentsAttributeSize = 72;  // bytes of further extents of one
 
 // How a field is written.
 enum class FieldKind {
@@ -66,6 +66,7 @@ const RecordKind* KindOfRecord(u32 fileId, const u8* stored, u32 size);
 // The kind named in text; `fileId` decides between kinds of the same name. Null: none; kinds of
 // other trees are found too.
 const RecordKind* KindByName(std::string_view name, u32 fileId);
+// The field of that name; null: none.
 const Field* FieldByName(const RecordKind& kind, std::string_view name);
 
 // Big-endian number of `width` bytes (1, 2, 4 or 8).

@@ -36,6 +36,7 @@ int InsertStored(ImageVolume* volume, u32 fileId, const SearchKey& key,
 // The new data may have another size; the record is then taken out and put in again.
 int UpdateStored(ImageVolume* volume, u32 fileId, const SearchKey& key,
                  const std::vector<u8>& data);
+// Takes the record with this key out.
 int DeleteStored(ImageVolume* volume, u32 fileId, const SearchKey& key);
 
 // Walks the records of a tree in key order. Believes nothing: a key that is not greater than the
@@ -49,6 +50,7 @@ public:
     // Stands before the first record. The volume has to outlive the cursor; a tree that cannot be
     // opened shows in Next.
     RecordCursor(ImageVolume* volume, u32 fileId) : volume_(volume), fileId_(fileId) {}
+
     RecordCursor(const RecordCursor&) = delete;
     RecordCursor& operator=(const RecordCursor&) = delete;
     ~RecordCursor() { path_.ClearPath(); }

@@ -12,7 +12,7 @@ std::string DateText(u32 date);
 // "2026-11-21T01:18:16Z"; empty for 0.
 std::string DateIso(u32 date);
 // Writes the first form, kDateWidth bytes, and returns the end; 0 is padded with blanks.
-constexpr u32 kDateWidth = 20;
+constexpr u32 kDateWidth = 20;  // bytes of that form
 char* PutDate(char* out, u32 date);
 // "2026-11-21" or "2026-11-21T01:18:16Z" or "2026-11-21 01:18:16" -> seconds since 1904.
 bool ParseDate(const std::string& text, u32* date);
