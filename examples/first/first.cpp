@@ -25,6 +25,7 @@ int main(int argc, char** argv) {
     while (cursor.Next(&record) == kOk && record.id == 2) {
         std::printf("%s\n", KeyText(kCatalogFileId, record).c_str());
     }
+    cursor.Release();  // before anything changes
     RecordData note;
     ParseKey("2:note", kAttributesFileId, &key);
     ParseData("inline{\"seen\"}", kAttributesFileId, &note);

@@ -137,6 +137,33 @@ def test_transaction_keeps_or_drops(image):
         assert caught.value.name == "read-only"
 
 
+def fill(volume):
+    data = b"\0\0\0\x10" + bytes(8) + (3000).to_bytes(4, "big") + bytes(3000)
+    for number in range(1000):
+        volume.insert(f'{1000 + number}:"a"', data, tree="attributes")
+
+
+def test_failed_change_drops_the_transaction(image):
+    with treehfs.open(image, write=True) as volume:
+        walk = volume.records("catalog")
+        next(walk)
+        with pytest.raises(treehfs.Error) as caught:
+            with volume.transaction():
+                fill(volume)
+        assert caught.value.name == "no-space"
+        assert list(volume.records("attributes")) == [] and len(list(walk)) == 5
+        assert volume.check(full=True).is_sound
+        with pytest.raises(treehfs.Error):
+            fill(volume)
+        for call in (volume.commit, volume.check, lambda: volume.delete('2:"readme"')):
+            with pytest.raises(treehfs.Error, match="roll back"):
+                call()
+        volume.rollback()
+        volume.delete('2:"readme"')
+        volume.commit()
+        assert len(list(volume)) == 5
+
+
 def test_overlay_leaves_the_image_alone(image):
     with treehfs.open(image, overlay=True) as volume:
         volume.insert('2:"x"', b"\0\0\0\x10" + bytes(11) + b"\2ab", tree="attributes")

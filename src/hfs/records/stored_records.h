@@ -28,9 +28,9 @@ std::string KeyText(u32 fileId, const StoredRecord& record);
 // By key, on tree `fileId` of a volume, which is opened when it is not yet. kErrVolumeNoTree: there
 // is no such tree. kErrNotFound: no such key.
 int FindStored(ImageVolume* volume, u32 fileId, const SearchKey& key, StoredRecord* record);
-// The three that change records keep the volume's counts of files and folders in step. Every
-// failure but kErrNotFound, kErrExists and kErrTooLarge has taken the volume back to its last
-// commit.
+// The three that change records want every cursor of the volume released. They keep the volume's
+// counts of files and folders in step. Every failure but kErrNotFound, kErrExists and kErrTooLarge
+// has taken the volume back to its last commit.
 int InsertStored(ImageVolume* volume, u32 fileId, const SearchKey& key,
                  const std::vector<u8>& data);
 // The new data may have another size; the record is then taken out and put in again.
