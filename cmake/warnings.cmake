@@ -12,8 +12,12 @@ target_compile_options(treehfs_engine_options INTERFACE -fno-exceptions -fno-rtt
 # Libraries whose objects also go into the shared library: position-independent, and with no symbol
 # of their own to offer there.
 function(treehfs_share)
-  set_target_properties(${ARGN} PROPERTIES POSITION_INDEPENDENT_CODE ON
-    CXX_VISIBILITY_PRESET hidden VISIBILITY_INLINES_HIDDEN ON)
+  set_target_properties(${ARGN} PROPERTIES POSITION_INDEPENDENT_CODE ON)
+  # An engine that is a library of its own and the tests that load it see each other's symbols.
+  if(NOT TREEHFS_ENGINE_SHARED)
+    set_target_properties(${ARGN} PROPERTIES
+      CXX_VISIBILITY_PRESET hidden VISIBILITY_INLINES_HIDDEN ON)
+  endif()
 endfunction()
 
 # A static library that is installed: as libtreehfs_NAME.a, so that its origin shows.

@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
-# lint.sh [FILE...]: everything that can be said about the code without running it. Without files
-# the whole project; findings are errors. What a tool is missing for is said and skipped.
+# lint.sh [--changed [BASE] | FILE...]: everything that can be said about the code without running
+# it. Without files the whole project; --changed: what differs from BASE (main) or is new. Findings
+# are errors. What a tool is missing for is said and skipped.
 # shellcheck disable=SC2317  # steps are called through step()
 set -uo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.." || exit 1
@@ -8,16 +9,23 @@ jobs=$(nproc 2>/dev/null || echo 2)
 failed=0
 
 step() {
-    printf '== %s\n' "$1"
+    local name=$1 started=$SECONDS
+    printf '== %s\n' "$name"
     shift
     "$@" || {
         failed=1
         printf 'lint: findings above\n'
     }
+    printf '   %s: %d s\n' "$name" $((SECONDS - started))
 }
 have() { command -v "$1" >/dev/null || ! printf 'lint: no %s here, skipped\n' "$1"; }
 
-if [ $# -gt 0 ]; then
+if [ "${1:-}" = --changed ]; then
+    mapfile -t sources < <({
+        git diff --name-only --diff-filter=d "${2:-main}" -- '*.cpp' '*.h'
+        git ls-files -o --exclude-standard '*.cpp' '*.h'
+    } | sort -u)
+elif [ $# -gt 0 ]; then
     sources=("$@")
 else
     mapfile -t sources < <(git ls-files -co --exclude-standard '*.cpp' '*.h')
@@ -34,7 +42,10 @@ known = {os.path.relpath(entry["file"]) for entry in json.load(open(sys.argv[1])
 print("\n".join(unit for unit in sys.argv[2:] if unit in known))' "$1" "${units[@]}"
 }
 
-have clang-format && step "clang-format" clang-format --dry-run --Werror "${sources[@]}"
+format() {
+    [ "${#sources[@]}" -eq 0 ] || clang-format --dry-run --Werror "${sources[@]}"
+}
+have clang-format && step "clang-format" format
 
 configure() {
     cmake -S . -B "build/lint-$1" -G Ninja -DCMAKE_CXX_COMPILER="$1" -DCMAKE_BUILD_TYPE=Debug \
@@ -42,6 +53,7 @@ configure() {
 }
 # Compiles every unit for its warnings alone, with the options of the build.
 syntax() {
+    [ "${#units[@]}" -gt 0 ] || return 0
     python3 tests/syntax_only.py "build/lint-$1/compile_commands.json" "$jobs" "${units[@]}"
 }
 for compiler in g++ clang++; do
@@ -54,14 +66,16 @@ for compiler in g++ clang++; do
 done
 
 tidy() {
-    known_units build/lint-clang++/compile_commands.json |
-        grep '^src/' | xargs -r -P "$jobs" -n 1 clang-tidy --quiet -p build/lint-clang++ 2>/dev/null
+    known_units build/lint-clang++/compile_commands.json | sed -n '/^src\//p' |
+        xargs -r -P "$jobs" -n 1 clang-tidy --quiet -p build/lint-clang++ \
+            2> >(grep -vE '^[0-9]+ warnings? generated' >&2)
 }
 [ -f build/lint-clang++/compile_commands.json ] && have clang-tidy && step "clang-tidy" tidy
 
 check_cpp() {
     local own
-    mapfile -t own < <(printf '%s\n' "${units[@]}" | grep '^src/')
+    mapfile -t own < <(printf '%s\n' "${units[@]}" | sed -n '/^src\//p')
+    [ "${#own[@]}" -gt 0 ] || return 0
     cppcheck --quiet --std=c++20 --language=c++ -j "$jobs" -I src --inline-suppr \
         --enable=warning,performance,portability --error-exitcode=1 \
         --suppressions-list=tests/cppcheck.txt \

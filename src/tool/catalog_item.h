@@ -25,7 +25,8 @@ struct CatalogKeyView {
     const u8* Name() const { return bytes + kCatKeyName; }
 };
 
-// A folder or file record as stored; invalid for anything else, or when it is too short.
+// A folder or file record as stored; invalid for anything else, or when it is too short. One that
+// is invalid has zeros in all its fields.
 class CatalogItem {
 public:
     CatalogItem() = default;
@@ -33,10 +34,10 @@ public:
         const u32 type = size >= 2 ? GetBe16(data) : 0;
         const bool whole = (type == kFolderRecord && size >= kFolderSize) ||
                            (type == kFileRecord && size >= kFileSize);
-        data_ = whole ? data : nullptr;
+        data_ = whole ? data : kNothing;
     }
 
-    bool IsValid() const { return data_ != nullptr; }
+    bool IsValid() const { return data_ != kNothing; }
     bool IsFolder() const { return GetBe16(data_) == kFolderRecord; }
     u32 Id() const { return GetBe32(data_ + 8); }
     u32 Flags() const { return GetBe16(data_ + 2); }
@@ -56,7 +57,9 @@ public:
 private:
     static u64 GetBe64(const u8* bytes) { return u64{GetBe32(bytes)} << 32 | GetBe32(bytes + 4); }
 
-    const u8* data_ = nullptr;
+    static constexpr u8 kNothing[kFileSize] = {};
+
+    const u8* data_ = kNothing;
 };
 
 // The two folders in the root in which the native system keeps linked and open files.

@@ -41,14 +41,11 @@ public:
     }
     bool Next(std::string* line) {
         line->clear();
-        char piece[65536];
-        while (std::fgets(piece, sizeof piece, file_) != nullptr) {
-            *line += piece;
+        // Unit by unit, as a line may hold zeros, where calls for whole lines would end it.
+        for (int unit = 0; unit != '\n' && (unit = getc_unlocked(file_)) != EOF;) {
+            line->push_back(static_cast<char>(unit));
             if (line->size() > kMostLine) {
                 ThrowFailed(path_, "line " + std::to_string(number_ + 1) + " is too long", "");
-            }
-            if (line->back() == '\n') {
-                break;
             }
         }
         number_ += line->empty() ? 0u : 1u;

@@ -34,7 +34,7 @@ void EngineLog::OnTrace(void* self, const char* text) {
     const char* comma = std::strrchr(text, ',');
     if (log->keep_ && comma != nullptr &&
         std::strncmp(text, kAssertionStart, sizeof kAssertionStart - 1) == 0) {
-        log->entries_.push_back({true, 0, std::atoi(comma + 1)});
+        log->entries_.push_back({true, 0, static_cast<int>(std::strtol(comma + 1, nullptr, 10))});
     }
 }
 

@@ -26,7 +26,8 @@ void PrintReport(void*, unsigned code, const char*, int line) {
 void PrintTrace(void*, const char* text) {
     const char* comma = std::strrchr(text, ',');
     if (std::strncmp(text, kAssertionStart, sizeof kAssertionStart - 1) == 0 && comma != nullptr) {
-        std::fprintf(stderr, "  ! assert %d\n", std::atoi(comma + 1));
+        std::fprintf(stderr, "  ! assert %d\n",
+                     static_cast<int>(std::strtol(comma + 1, nullptr, 10)));
         return;
     }
     const std::size_t length = std::strlen(text);

@@ -28,7 +28,7 @@ void ThrowProblem(const std::string& subject, const Problem& problem) {
     error.subject = subject;
     error.problem = problem;
     error.exitCode = problem ? static_cast<int>(problem.exitClass) : int{kExitFailed};
-    throw error;
+    throw ToolError(std::move(error));
 }
 
 void ThrowFailed(const std::string& subject, std::string what, std::string advice) {
@@ -46,7 +46,7 @@ void ThrowArgument(const std::string& subject, std::string what, std::string adv
 void ThrowUsage(const std::string& command, std::string what, std::string advice) {
     ToolError error = MakeError("", kExitUsage, std::move(what), std::move(advice));
     error.command = command;
-    throw error;
+    throw ToolError(std::move(error));
 }
 
 std::string ErrorLine(const ToolError& error) {

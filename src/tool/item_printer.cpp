@@ -1,6 +1,7 @@
 // Lines and JSON of catalog items.
 #include "tool/item_printer.h"
 
+#include <algorithm>
 #include <cstring>
 
 #include "hfs/names_text.h"
@@ -145,9 +146,8 @@ void ItemPrinter::PrintBare(const ListedItem& listed) {
 void ItemPrinter::PrintLong(const ListedItem& listed) {
     char columns[kTypeWidth + 1 + 20 + 1 + 20 + 2 + kDateWidth + 2];
     const char* type = ItemKindName(listed.item.Kind());
-    const std::size_t typeLength = std::strlen(type);
-    std::memset(columns, ' ', kTypeWidth);
-    std::memcpy(columns, type, typeLength);
+    std::fill_n(columns, kTypeWidth, ' ');
+    std::copy_n(type, std::strlen(type), columns);
     char* at = columns + kTypeWidth;
     at = PutNumber(at, listed.item.Id(), idWidth_);
     *at++ = ' ';

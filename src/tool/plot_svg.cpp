@@ -56,11 +56,11 @@ const char* KindWord(NodeState state) {
 }  // namespace
 
 SvgPicture::SvgPicture(double width, double height, const std::string& title,
-                       const std::string& subtitle) {
-    out_ = fmt::format(
-        "<svg xmlns=\"http://www.w3.org/2000/svg\" width=\"{0:.0f}\" height=\"{1:.0f}\" "
-        "viewBox=\"0 0 {0:.0f} {1:.0f}\" role=\"img\">\n<title>{2}</title>\n",
-        width, height, Escaped(title));
+                       const std::string& subtitle)
+    : out_(fmt::format(
+          "<svg xmlns=\"http://www.w3.org/2000/svg\" width=\"{0:.0f}\" height=\"{1:.0f}\" "
+          "viewBox=\"0 0 {0:.0f} {1:.0f}\" role=\"img\">\n<title>{2}</title>\n",
+          width, height, Escaped(title))) {
     out_ += kStyle;
     out_ +=
         fmt::format("<rect class=\"page\" width=\"{:.0f}\" height=\"{:.0f}\"/>\n", width, height);

@@ -1,6 +1,8 @@
 // The volume in words.
 #include "tool/volume_text.h"
 
+#include <algorithm>
+
 #include "hfs/records/text_format.h"
 #include "tool/catalog_paths.h"
 #include "tool/errors.h"
@@ -142,7 +144,7 @@ void VolumeMembers(Session* session, JsonWriter* json) {
     json->Member("version", header.version);
     json->Member("attributes", header.attributes);
     std::string created = DateIso(header.createDate);
-    created = created.substr(0, created.find('Z'));  // in local time, which has no zone
+    created.resize(std::min(created.find('Z'), created.size()));  // in local time: without a zone
     json->Member("created_local", created);
     json->Member("modified", DateIso(header.modifyDate));
     json->Member("unmounted_cleanly", UnmountText(header)[0] == 'u');

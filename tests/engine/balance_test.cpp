@@ -290,6 +290,44 @@ TEST_F(BrokenBalance, RecordsThatEndBeforeTheBalance) {
     EXPECT_TRUE(bench_.IsUnchanged());
 }
 
+// The offset table of this many records reaches into the descriptor, whose links are small numbers.
+TEST_F(BrokenBalance, OffsetTableInTheDescriptor) {
+    Bytes bad = Full();
+    Put16(&bad, 10, 254);
+    Expect(Empty(), bad, {Reported(kReasonNode, 9220)},
+           {Reported(kReasonNode, 1856), Reported(kErrCorrupt, 2062)});
+}
+
+TEST_F(BrokenBalance, FreeSpaceAtAnOddOffset) {
+    Bytes bad = Full();
+    Put16(&bad, SlotAt(9), 465);
+    Expect(Empty(), bad, {Reported(kReasonNode, 9220)}, {Reported(kReasonNode, 9221)});
+}
+
+// The free space claims the whole node, so a record takes more than is in use.
+TEST_F(BrokenBalance, RecordsLargerThanWhatIsInUse) {
+    Bytes bad = LeafOf(512, Even(2, 200));
+    Put16(&bad, SlotAt(2), 20);
+    bench_.LoadRaw(Empty(), bad, kLeft);
+    EXPECT_EQ(bench_.Left(2, Sized(99, 50)).status, kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(), Events{Reported(kReasonNode, 9220)});
+    EXPECT_TRUE(bench_.IsUnchanged());
+}
+
+TEST_F(BrokenBalance, ANodeThatIsItsOwnSibling) {
+    NodeBench bench{Geometry{512, 512}};
+    const auto node = bench.Node(LeafOf(512, Even(4, 50)));
+    const Bytes before = node->Content();
+    const Bytes record = Sized(3, 50);
+    const BTreeKey* key = reinterpret_cast<const BTreeKey*>(record.data());
+    Outcome out;
+    EXPECT_EQ(bench.tree._RotateLeft(node->Get(), node->Get(), 2, key, record.data() + 6, 44,
+                                     &out.index, &out.nodeNum, &out.rotated, &out.moved, nullptr),
+              kErrCorrupt);
+    EXPECT_EQ(bench.capture.Take(), Events{Reported(kReasonNode, 9220)});
+    EXPECT_EQ(node->Content(), before);
+}
+
 TEST_F(BrokenBalance, DamageBeyondTheMovedRecordsIsRefusedToo) {
     Bytes bad = Full();
     Put16(&bad, SlotAt(7), 365);  // odd; a left move does not reach it

@@ -193,6 +193,19 @@ TEST_P(NodeBytesTest, CopyBetweenRefusesWhatLeavesEitherNode) {
     EXPECT_EQ(node_.Content(), flat_);
 }
 
+TEST_P(NodeBytesTest, ABlockIsDirtyWhereItWasMarked) {
+    const LooseNode clean(flat_, MapBlock(), 1, false);
+    EXPECT_TRUE(View().IsDirty(NodeSize() - 1));
+    EXPECT_FALSE(NodeBytes(clean.Hdr(), clean.Get()).IsDirty(0));
+    EXPECT_FALSE(View().IsDirty(NodeSize()));
+}
+
+TEST_P(NodeBytesTest, CopyBetweenRefusesBeforeTheFirstPiece) {
+    const LooseNode other(Pattern(NodeSize(), 77), MapBlock(), 2, true);
+    CopyBetween(View(), NodeSize() - 10, NodeBytes(other.Hdr(), other.Get()), MapBlock() - 4, 12);
+    EXPECT_EQ(node_.Content(), flat_);
+}
+
 INSTANTIATE_GEOMETRIES(NodeBytesTest, AllGeometries);
 
 TEST(BigEndian, GetAndPutAtOddAddresses) {

@@ -336,6 +336,23 @@ TEST_P(CacheTest, EmptyingANodeThatWasNeverWrittenIsTraced) {
     EXPECT_EQ(bench_.capture.Take(), expected);
 }
 
+TEST_P(CacheTest, EmptyingANodeThatWasNeverWrittenSaysNothingWithoutTraces) {
+    MakeNew(5);
+    HfsNode* node = Get(5, true);
+    node->bufs[0].data[20] = 9;
+    bench_.capture.Take();
+    Get(5, true);
+    EXPECT_EQ(node->bufs[0].data[20], 0);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// Only a request to read such a node is asserted; whether it can be had is the volume's business.
+TEST_P(CacheTest, AnEmptyNodePastTheTreeIsAskedOfTheVolume) {
+    HfsNode* node = nullptr;
+    EXPECT_EQ(bench_->GetINode(bench_->header.totalNodes, &node, true), kMemNoRange);
+    EXPECT_EQ(bench_.capture.Take(), Events{Reported(kMemNoRange, 2620)});
+}
+
 TEST_P(CacheTest, AJournalThatRefusesEmptyingIsAssertedAndIgnored) {
     bench_.faults.Fail(Call::kWriteAccess, 1, kFaultStatus, true);
     const HfsNode* node = Get(1, true);

@@ -255,6 +255,8 @@ TEST_P(CreateTreePieces, NodeSmallerThanAMapBlockIsRefused) {
     MakeSmallVolume(kAttributesFileId);
     volume->fs.mapBlockShift = 10;
     volume->fs.mapBlockSize = 1024;
+    EXPECT_EQ(Tree().Create(9, 0, nullptr), kErrInvalid);
+    EXPECT_EVENTS(Reported(kReasonInvalid, 5317));
     capture.TraceAll();
     EXPECT_EQ(Tree().Create(9, 0, nullptr), kErrInvalid);
     EXPECT_EVENTS(Traced("r=8: node size 200 < map block 400\n"), Reported(kReasonInvalid, 5317));

@@ -1,5 +1,7 @@
 // DeleteRecord: what becomes of leaves, separators, chains and the root, and what is refused.
+#include <algorithm>
 #include <memory>
+#include <utility>
 
 #include "geometry.h"
 #include "node_bench.h"
@@ -298,6 +300,28 @@ TEST_F(DeleteAtPath, LevelsOutsideThePathAreRefused) {
     Tree().findData.path[1].index = -1;
     ExpectRefused(Tree().DeleteTree(1, &Tree().findData), kErrInvalid,
                   {Reported(kReasonInvalid, 9267)});
+}
+
+TEST_F(DeleteAtPath, ParentsThatDoNotLeadThereAreRefused) {
+    const Events refused = {Reported(kReasonInvalid, 9267)};
+    Open(Image(512, 9, 3));
+    Find(3);  // the first record of its leaf, so the parent would have to change
+    HfsFindData& path = Tree().findData;
+    ASSERT_EQ(path.path[1].index, 0);
+    u8* parent = path.path[2].node->bufs[0].data;
+    const Bytes before(parent, parent + 512);
+    parent[kDescKind] = static_cast<u8>(kBTMapNode);
+    ExpectRefused(Tree().DeleteTree(1, &path), kErrInvalid, refused);
+    parent[kDescKind] = before[kDescKind];
+    const u32 slot = 512 - 2 * (static_cast<u32>(path.path[2].index) + 1);
+    parent[slot] = 0xFF;
+    EXPECT_EQ(Tree().DeleteTree(1, &path), kErrInvalid);
+    EXPECT_EQ(tree_->capture.Take().back(), refused[0]);
+    std::copy(before.begin(), before.end(), parent);
+    const u16 depth = std::exchange(Tree().header.treeDepth, u16{0});
+    ExpectRefused(Tree().DeleteTree(1, &path), kErrInvalid, refused);
+    Tree().header.treeDepth = depth;
+    EXPECT_EQ(Tree().DeleteTree(1, &path), kOk);
 }
 
 // A lookup leaves a node it rejected in the path.

@@ -5,6 +5,7 @@
 #include <cstring>
 
 #include "bench.h"
+#include "platform/heap.h"
 
 namespace VELK::test {
 namespace {
@@ -80,6 +81,62 @@ TEST_F(FindAgain, AnIndexNodeEmptiedMeanwhileIsMet) {
     EXPECT_EQ(bench_.capture.Take(),
               (Events{Reported(kReasonTree, 2916), Reported(kErrCorrupt, 2982),
                       Reported(kErrCorrupt, 3126)}));
+}
+
+TEST_F(FindAgain, APathClearedMeanwhileIsWalkedAgain) {
+    EXPECT_EQ(Find(1), kOk);
+    bench_->findData.ClearPath();
+    EXPECT_EQ(Find(1), kOk);
+    EXPECT_NE(bench_->findData.path[1].node, nullptr);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// One leaf of two blocks in which the key of record 11 lies in both.
+class FindAgainOverBlocks : public FindAgain {
+protected:
+    FindAgainOverBlocks() : wide_(Blocks(512)) {
+        wide_->compareKeys = CompareCatKeysCaseIns;
+        wide_->header.maxKeyLength = kCatMaxKeyLength;
+        wide_->header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
+        const unsigned long long size = 64 * 1024;
+        EXPECT_EQ(wide_->Create(10, 0, &size), kOk);
+    }
+    ~FindAgainOverBlocks() override { wide_.capture.Take(); }
+    void Insert(u32 from, u32 to) {
+        for (u32 n = from; n < to; ++n) {
+            const HostKey key = NthHostKey(4, n);
+            const Bytes data = Pattern(24, n);
+            EXPECT_EQ(wide_->InsertRecord(key.Get(), key.id, data.data(), 24), kOk);
+        }
+    }
+    int FindWide(u32 n) {
+        const HostKey key = NthHostKey(4, n);
+        return wide_->FindRecord(key.Get(), key.id, nullptr, 0, nullptr, nullptr);
+    }
+
+    Bench wide_;
+};
+
+TEST_F(FindAgainOverBlocks, ALastKeyInTwoBlocksIsNoShortcut) {
+    Insert(0, 12);
+    wide_.Forget();
+    for (const u32 n : {11u, 3u, 11u}) {
+        EXPECT_EQ(FindWide(n), kOk);
+        EXPECT_EQ(wide_->findData.path[1].index, static_cast<s32>(n));
+    }
+    EXPECT_EQ(wide_.capture.Take(), Events{});
+}
+
+TEST_F(FindAgainOverBlocks, NoMemoryOnTheShortcutIsTriedAgainOnTheWayDown) {
+    Insert(0, 16);
+    EXPECT_EQ(FindWide(3), kOk);
+    velk_heap_free(wide_->scratch);
+    wide_->scratch = wide_->scratchHalf = nullptr;
+    wide_.Forget();
+    wide_.heap.FailNth(1);
+    EXPECT_EQ(FindWide(11), kOk);
+    EXPECT_TRUE(wide_.heap.HasFailed());
+    EXPECT_EQ(wide_.capture.Take(), Events{});
 }
 
 }  // namespace

@@ -213,7 +213,74 @@ TEST_P(FindDamage, EveryAllocationFailsOnceAndNothingLeaks) {
     }
 }
 
+TEST_P(FindDamage, WithoutTracesOnlyTheReportsTell) {
+    image_.Patch8(kIndex, 8, 0xFF);
+    bench_.Open(image_);
+    const HostKey key = NthHostKey(4, 0);
+    EXPECT_EQ(bench_->FindRecord(key.Get(), key.id, nullptr, 0, nullptr, &path_), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Reported(kReasonTree, 2934), Reported(kErrCorrupt, 2982),
+                      Reported(kErrCorrupt, 3126)}));
+}
+
+// A count as large as the offset table can be at all: the probes in the upper half meet the last
+// record, those below the real ones.
+TEST_P(FindDamage, AnIndexNodeThatCountsTooManyRecordsIsReadWithCare) {
+    const u32 count = NodeSize() / 2 - 1;
+    image_.Patch16(kIndex, 10, count);
+    const Bytes node = image_.Node(kIndex);
+    const u32 lastSlot = NodeSize() - 2 * 4;
+    const u32 start = Get16(node, lastSlot);
+    const u32 end = Get16(node, lastSlot - 2);
+    for (u32 probe = (count - 1) / 2; probe > 4; probe = (probe - 1) / 2) {
+        image_.Patch16(kIndex, NodeSize() - 2 * (probe + 1), start);
+        image_.Patch16(kIndex, NodeSize() - 2 * (probe + 2), end);
+    }
+    EXPECT_EQ(Find(), kOk);
+    EXPECT_EQ(path_.path[2].index, 0);
+    EXPECT_EQ(path_.path[1].node->nodeNum, kLeaf);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// A record that starts on the last byte of a block: its length field lies in two.
+TEST_P(FindDamage, ARecordAtABlocksLastByteIsReadWithCare) {
+    if (NodeSize() == MapBlock()) {
+        return;
+    }
+    image_.Patch16(kLeaf, NodeSize() - 2, MapBlock() - 1);
+    image_.Patch16(kLeaf, NodeSize() - 4, MapBlock() + 40);
+    EXPECT_EQ(Find(), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Asserted(2671), Reported(kReasonNode, 9020), Reported(kErrCorrupt, 3005)}));
+}
+
+// Whoever fetched an index node by its number gave it no hints.
+TEST_P(FindDamage, AnIndexNodeFetchedByNumberLeadsDownAllTheSame) {
+    bench_.Open(image_);
+    HfsNode* index = nullptr;
+    ASSERT_EQ(bench_->GetINode(kIndex, &index, false), kOk);
+    const HostKey key = NthHostKey(4, 0);
+    for (u32 requests = 3; requests <= 6; requests += 3) {
+        EXPECT_EQ(bench_->FindRecord(key.Get(), key.id, nullptr, 0, nullptr, &path_), kOk);
+        EXPECT_EQ(path_.path[2].node, index);
+        EXPECT_EQ(path_.path[1].node->nodeNum, kLeaf);
+    }
+    bench_->PutINode(index, false);
+}
+
 INSTANTIATE_GEOMETRIES(FindDamage, FewGeometries);
+
+// ---- data in three blocks
+
+TEST(FindLongData, IsAssertedAtEachProbe) {
+    Bench bench(Blocks(512));
+    TreeShape shape;
+    shape.nodeSize = 4096;
+    bench.Open(BuildTree(shape, NthRecords(4, 2, 1040)));
+    const HostKey key = NthHostKey(4, 0);
+    EXPECT_EQ(bench->FindRecord(key.Get(), key.id, nullptr, 0, nullptr, nullptr), kOk);
+    EXPECT_EQ(bench.capture.Take(), Events{Asserted(505)});
+}
 
 // ---- keys that a comparator could not read safely
 

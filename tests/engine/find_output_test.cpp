@@ -209,5 +209,13 @@ TEST_F(FindOutput, FindRecordReportsAFailure) {
                       Reported(kFaultStatus, 2982), Reported(kFaultStatus, 3126)}));
 }
 
+TEST_F(FindOutput, NoRoomForTheRecordGetsNothingOfIt) {
+    bench_->convert.DataToMemory = nullptr;
+    record_[0] = 0x77;
+    EXPECT_EQ(Find(0, 20), kOk);
+    EXPECT_EQ(recordSize_, 0u);
+    EXPECT_EQ(record_[0], 0x77);
+}
+
 }  // namespace
 }  // namespace VELK::test

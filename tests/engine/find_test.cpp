@@ -259,13 +259,13 @@ TEST(FindLongData, DataLongerThanHalfANodeIsGathered) {
 
 // ---- the scratch buffer
 
-// One leaf of two blocks; the key of record 16 lies in both.
-class FindScratch : public ::testing::Test {
+// One leaf of two blocks, read, and no scratch buffer.
+class LeafOfTwoBlocks : public ::testing::Test {
 protected:
-    FindScratch() : bench_(Blocks(512)) {
+    LeafOfTwoBlocks(u32 records, u32 dataSize) : bench_(Blocks(512)) {
         TreeShape shape;
         shape.nodeSize = 1024;
-        bench_.Open(BuildTree(shape, NthRecords(4, 31, 10)));
+        bench_.Open(BuildTree(shape, NthRecords(4, records, dataSize)));
         bench_->findData = HfsFindData();
         HfsNode* leaf = nullptr;
         bench_->GetINode(1, &leaf, false);
@@ -281,6 +281,21 @@ protected:
     Bench bench_;
 };
 
+// The key of record 16 lies in both blocks.
+class FindScratch : public LeafOfTwoBlocks {
+protected:
+    FindScratch() : LeafOfTwoBlocks(31, 10) {}
+};
+
+// The data of record 14 lies in both blocks.
+class FindDataScratch : public LeafOfTwoBlocks {
+protected:
+    FindDataScratch() : LeafOfTwoBlocks(28, 14) {}
+
+    u8 record_[14] = {};
+    u32 size_ = 0;
+};
+
 TEST_F(FindScratch, IsMadeWhenAKeyNeedsIt) {
     EXPECT_EQ(Find(15), kOk);
     EXPECT_EQ(bench_->scratch, nullptr);
@@ -293,6 +308,32 @@ TEST_F(FindScratch, NoMemoryForItIsReportedByFindRecordOnly) {
     EXPECT_EQ(Find(16), kErrNoMemory);
     EXPECT_EQ(bench_.capture.Take(), Events{Reported(kErrNoMemory, 3126)});
     EXPECT_EQ(Find(16), kOk);
+}
+
+TEST_F(FindScratch, NoMemoryForTheKeyOfAStepIsNotReported) {
+    u8 record[10];
+    alignas(8) u8 keyOut[64];
+    u32 size = 0;
+    u32 keySize = 0;
+    ASSERT_EQ(Find(15), kOk);
+    bench_.heap.FailNth(1);
+    EXPECT_EQ(bench_->IncPos(1, record, 10, &size, keyOut, 64, &keySize, nullptr), kErrNoMemory);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+TEST_F(FindDataScratch, NoMemoryForItIsReportedByFindRecordOnly) {
+    const HostKey key = NthHostKey(4, 14);
+    bench_.heap.FailNth(1);
+    EXPECT_EQ(bench_->FindRecord(key.Get(), key.id, record_, 14, &size_, nullptr), kErrNoMemory);
+    EXPECT_EQ(bench_.capture.Take(), Events{Reported(kErrNoMemory, 3126)});
+}
+
+TEST_F(FindDataScratch, NoMemoryForAStepIsNotReported) {
+    ASSERT_EQ(Find(14), kOk);
+    bench_.heap.FailNth(1);
+    EXPECT_EQ(bench_->IncPos(0, record_, 14, &size_, nullptr, 0, nullptr, nullptr), kErrNoMemory);
+    EXPECT_EQ(size_, 0u);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
 // ---- depth

@@ -29,6 +29,19 @@ protected:
     Bench bench_;
 };
 
+// ---- FlushINode
+
+// The number after the highest one would be 0 again.
+TEST_F(FlushTest, TheHighestNumberDoesNotMoveTheInitialisedPart) {
+    const u32 valid = bench_->validNodes;
+    HfsNode* node = Change(3, 20, 0x33, 1);
+    node->nodeNum = 0xFFFFFFFF;
+    EXPECT_EQ(bench_->FlushINode(node), kOk);
+    EXPECT_EQ(bench_->validNodes, valid);
+    node->nodeNum = 3;
+    EXPECT_EQ(OnDisk(3, 20), 0x33);
+}
+
 // ---- Clear
 
 TEST_F(FlushTest, ClearHandsOverInListOrderAndFreesTheUnreferenced) {

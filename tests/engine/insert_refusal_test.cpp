@@ -321,6 +321,7 @@ TEST_F(InsertStep, PathsThatDoNotLeadThereAreRefusedBeforeAnyChange) {
     OpenAt(0);
     ExpectRefused(InsertTree(nullptr, 0, 1), kErrInvalid, refused);
     ExpectRefused(InsertTree(path_.path[2].node, 0, 1), kErrInvalid, refused);
+    ExpectRefused(InsertTree(nullptr, 0, 4), kErrInvalid, refused);  // no node there in the path
     ExpectRefused(InsertTree(path_.path[1].node, 0, 0), kErrInvalid, refused);
     ExpectRefused(InsertTree(path_.path[1].node, 0, 16), kErrInvalid, refused);
     path_.path[2].index = 1;  // another leaf
@@ -353,6 +354,13 @@ TEST_F(InsertStep, NodeThatThePathDoesNotHoldIsAssertedAndRefused) {
     ExpectRefused(InsertLevel(path_.path[2].node, 0, 1), kErrInvalid,
                   {Asserted(4632), Reported(kReasonInvalid, 9246)});
     ExpectRefused(InsertLevel(nullptr, 0, 4), kErrInvalid, {Reported(kReasonInvalid, 9246)});
+}
+
+TEST_F(InsertStep, NodeOfAnotherHeightIsRefused) {
+    OpenAt(0);
+    path_.path[1].node->bufs[0].data[kDescHeight] = 2;
+    ExpectRefused(InsertLevel(path_.path[1].node, 0, 1), kErrInvalid,
+                  {Reported(kReasonInvalid, 9246)});
 }
 
 TEST_F(InsertStep, LeafOfTheWrongKindIsAsserted) {
@@ -449,6 +457,14 @@ TEST_F(InsertOne, NumberOfNeitherNodeIsRefused) {
     OpenAt(0);
     ExpectRefused(InsertNode(path_.path[1].node, 5, 0, 8), kErrInvalid,
                   {Reported(kReasonInvalid, 9235)});
+}
+
+TEST_F(InsertOne, NumberOfNeitherNodeIsRefusedBesideANewOneToo) {
+    OpenAt(0);
+    ASSERT_EQ(Tree().GetINode(2, &newNode_, false), kOk);
+    ExpectRefused(InsertNode(path_.path[1].node, 5, 0, 8), kErrInvalid,
+                  {Reported(kReasonInvalid, 9235)});
+    EXPECT_EQ(newNode_, nullptr);
 }
 
 TEST_F(InsertOne, HeightOneMustBeALeaf) {

@@ -349,6 +349,20 @@ TEST_P(IterateOutput, MissingHooksCopyTheBytes) {
     EXPECT_EQ(Bytes(record_, record_ + 8), Pattern(8, 3));
 }
 
+TEST_P(IterateTest, NoRecordIsWantedAndNoneIsDelivered) {
+    StandOn(3);
+    bench_->convert.DataToMemory = nullptr;
+    EXPECT_EQ(bench_->IncPos(1, nullptr, 0, &recordSize_, keyOut_, 20, &keySize_, &path_), kOk);
+    EXPECT_EQ(recordSize_, 0u);
+    EXPECT_EQ(keySize_, 20u);
+}
+
+TEST_P(IterateTest, ALevelReadWithoutAPathIsThatOfTheTree) {
+    EXPECT_EQ(bench_->ReadLevel(1, 3, nullptr), kOk);
+    EXPECT_EQ(bench_->findData.path[1].node->nodeNum, 3u);
+    EXPECT_EQ(bench_->findData.path[1].index, 0);
+}
+
 INSTANTIATE_GEOMETRIES(IterateTest, FewGeometries);
 INSTANTIATE_GEOMETRIES(IterateOutput, FewGeometries);
 

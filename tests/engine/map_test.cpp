@@ -312,6 +312,7 @@ TEST_P(MapAllocate, OffsetTableThatWouldReachTheMapIsRefused) {
     for (const u32 count : {4u, 0x7FFFu, 0xFFFFu}) {
         Open(20, 3);
         Poke16(0, kDescNumRecords, count);
+        Poke16(0, NodeSize() - 10, count == 4 ? 0xFFFE : 0);  // map bits where slot 4 would be
         EXPECT_EQ(Allocate(), kErrCorrupt);
         EXPECT_EVENTS(Reported(kReasonNode, 9402), Reported(kErrCorrupt, 3698));
         ExpectUntouched(17);

@@ -26,6 +26,35 @@ protected:
     Capture capture_;
 };
 
+// ---- GetKey
+
+TEST_P(NodeAccess, OnlyTheMapRecordOfTheHeaderNodeHasNoKey) {
+    const NodeImage image{.kind = kBTHeaderNode,
+                          .height = 0,
+                          .records = {Record(Bytes{0, 2, 1, 1}, Bytes(6)),
+                                      Record(Bytes{0, 2, 1, 1}, Bytes(6)), Bytes(8, 0xFF)}};
+    const LooseNode node(image.Build(NodeSize()), MapBlock(), 0);
+    NodeKey record{};
+    EXPECT_EQ(node->GetKey(node.Hdr(), 0, &record), kOk);
+    EXPECT_EQ(record.keySize, 4u);
+    EXPECT_EQ(node->GetKey(node.Hdr(), 2, &record), kOk);
+    EXPECT_EQ(record.keySize, 0u);
+    EXPECT_EQ(record.size, 8u);
+}
+
+// A node of a block and two bytes has blocks for one: data in the two bytes lies nowhere.
+TEST_P(NodeAccess, DataPastTheNodesBlocksIsRefused) {
+    Bytes content(MapBlock());
+    Put16(&content, 10, 2);
+    Put16(&content, MapBlock() - 2, 14);
+    Put16(&content, MapBlock() - 4, MapBlock() + 1);
+    LooseNode node(content, MapBlock());
+    node.header.nodeSize = MapBlock() + 2;
+    NodeKey record{};
+    EXPECT_EQ(node->GetKey(node.Hdr(), 1, &record), kErrCorrupt);
+    EXPECT_EQ(capture_.Take(), (Events{Reported(kReasonNode, 9007)}));
+}
+
 // ---- GetPtr
 
 TEST_P(NodeAccess, PtrDescribesAByteAndTheBlockAfterIt) {

@@ -161,6 +161,8 @@ TEST(OpenBlocks, ANodeSizeBelow512IsRefused) {
     Bench bench(Blocks(256));
     bench.Load(SmallTree(512));
     Put16(&bench.volume.Disk(4), 32, 256);
+    EXPECT_EQ(bench->Init(), kErrCorrupt);
+    EXPECT_EQ(bench.capture.Take(), Events{Reported(kReasonHeader, kAnySite)});
     bench.capture.TraceAll();
     EXPECT_EQ(bench->Init(), kErrCorrupt);
     EXPECT_EQ(bench.capture.Take(),

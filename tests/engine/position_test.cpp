@@ -1,6 +1,8 @@
 // Positions as 64-bit numbers: GetPos and SetPos.
 #include <gtest/gtest.h>
 
+#include <utility>
+
 #include "bench.h"
 
 namespace VELK::test {
@@ -54,6 +56,19 @@ TEST_P(PositionTest, ConvertsTheCallersKey) {
     std::copy(host.bytes, host.bytes + sizeof key.bytes, key.bytes);
     EXPECT_EQ(bench_->GetPos(&path_, &key, &copy), Position(4, 1));
     EXPECT_EQ(Bytes(copy.bytes, copy.bytes + 20), NthDiskKey(4, 7));
+}
+
+TEST_P(PositionTest, WithoutACopyOrAHookNoKeyIsConverted) {
+    StandOn(7);
+    CatalogKey key{};
+    CatalogKey copy{};
+    EXPECT_EQ(bench_->GetPos(&path_, &key, nullptr), Position(4, 1));
+    const auto hook = std::exchange(bench_->convert.KeyToDisk, nullptr);
+    key.bytes[1] = 20;
+    EXPECT_EQ(bench_->GetPos(&path_, &key, &copy), Position(4, 1));
+    EXPECT_EQ(copy.bytes[1], 0);
+    bench_->convert.KeyToDisk = hook;
+    EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
 TEST_P(PositionTest, OfAnEmptyPathIsAllOnes) {

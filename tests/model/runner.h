@@ -57,11 +57,11 @@ private:
     Outcome Restore();
     // Whether a reading operation may have failed with this status.
     Outcome Expect(const char* what, int status, int wanted);
-    Outcome Audit(bool whole);
+    Outcome Audit();
     Outcome CompareAll();
     Outcome Check(const Bytes& file) const;
     Bytes Present() const;
-    Outcome CheckAssertions();
+    Outcome CheckEvents(bool quiet);
 
     bool Faulted() const { return faults_->HasFailed() || heap_.HasFailed(); }
     u32 DataSize(u32 size) const;
@@ -77,6 +77,7 @@ private:
     HfsFindData cursor_;
     BTReserve reserve_{};
     bool reserved_ = false;
+    bool refused_ = false;  // the operation at hand ended in a restore
     TreeModel model_;
     TreeModel committed_;
     MemVolume::Snapshot snapshot_;

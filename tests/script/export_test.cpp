@@ -130,6 +130,15 @@ TEST_F(Export, OrderOfNamesThatDiffersIsSaid) {
               "the digest may differ\n");
 }
 
+// A zero ends no line, wherever it stands.
+TEST_F(Export, LinesWithZerosAreNamed) {
+    const std::string zero(1, '\0');
+    EXPECT_EQ(Imported(zero + "\n", {"--new", "1M"}).err,
+              "treehfs: FILE: line 1: expected a value at character 1\n");
+    EXPECT_EQ(Imported("{\"a\":" + zero + "1}\n{}\n", {"--new", "1M"}).err,
+              "treehfs: FILE: line 1: expected a value at character 6\n");
+}
+
 TEST_F(Export, WrongLinesAreNamed) {
     EXPECT_EQ(Imported("{\"a\":", {"--new", "1M"}).err,
               "treehfs: FILE: line 1: expected a value at character 6\n");

@@ -1,5 +1,6 @@
 // The header node of a tree: its shape, and its fields against each other and against the fork.
 #include <algorithm>
+#include <iterator>
 
 #include "hfs/check/check_tree.h"
 
@@ -149,10 +150,10 @@ void CheckDepthAndEmptiness(CheckTree* tree) {
                                           : "more than 16, the most that opens"),
                          kMaxPathDepth, header.treeDepth);
     }
-    const u32 zeros = u32{header.treeDepth == 0} + u32{header.rootNode == 0} +
-                      u32{header.leafRecords == 0} + u32{header.firstLeafNode == 0} +
-                      u32{header.lastLeafNode == 0};
-    if (zeros != 0 && zeros != 5) {
+    const u32 fields[] = {header.treeDepth, header.rootNode, header.leafRecords,
+                          header.firstLeafNode, header.lastLeafNode};
+    const auto zeros = std::count(std::begin(fields), std::end(fields), 0u);
+    if (zeros != 0 && zeros != std::ssize(fields)) {
         tree->run->Error(CheckId::H10, tree->HeaderPlace(kHeadTreeDepth),
                          CheckPrint("treeDepth %u, rootNode %u, leafRecords %u, firstLeafNode %u, "
                                     "lastLeafNode %u: some are 0, some are not",

@@ -84,12 +84,12 @@ void CheckInlineAttribute(const CheckTree& tree, const CheckNode& node, u32 inde
                           const CheckRecord& record) {
     const u32 valueSize = Load32(record.data + kAttrInlineSize);
     const u64 wanted = u64{kAttrInlineData} + valueSize;
-    if (wanted != record.dataSize && wanted + wanted % 2 != record.dataSize) {
-        tree.run->Error(
-            CheckId::R04, DataPlace(tree, node, index, record, kAttrInlineSize),
-            CheckPrint("a value of %u bytes takes a record of %llu, the record has %u", valueSize,
-                       static_cast<unsigned long long>(wanted + wanted % 2), record.dataSize),
-            wanted + wanted % 2, record.dataSize);
+    const unsigned long long padded = wanted + wanted % 2;
+    if (wanted != record.dataSize && padded != record.dataSize) {
+        tree.run->Error(CheckId::R04, DataPlace(tree, node, index, record, kAttrInlineSize),
+                        CheckPrint("a value of %u bytes takes a record of %llu, the record has %u",
+                                   valueSize, padded, record.dataSize),
+                        padded, record.dataSize);
     }
 }
 

@@ -15,11 +15,6 @@ constexpr char kSourceId[] = "src/hfs/treehfs 1.0";
     VELKError(static_cast<unsigned>(code), kSourceId, site);
 }
 
-[[gnu::cold, gnu::noinline]] int Fail(int status, u32 reason, int site) {
-    VELKError(reason, kSourceId, site);
-    return status;
-}
-
 [[gnu::cold, gnu::noinline]] void AssertFailed(int site) {
     _VELKTrace("***** velk_assert src/hfs/treehfs, %d\n", site);
 }

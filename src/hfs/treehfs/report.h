@@ -19,9 +19,13 @@ namespace VELK {
 
 // Reports `code` (a reason or a status) at `site`.
 void Report(int code, int site);
-// Reports `reason` at `site` and returns `status`.
-int Fail(int status, u32 reason, int site);
 void AssertFailed(int site);
+
+// Reports `reason` at `site` and returns `status`.
+inline int Fail(int status, u32 reason, int site) {
+    Report(static_cast<int>(reason), site);
+    return status;
+}
 
 // Name of the tree with this file ID in traces: "ExtTree", "CatTree", "AttTree", else "Unknown".
 const char* TreeName(u32 fileId);

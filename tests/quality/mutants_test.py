@@ -1,0 +1,76 @@
+#!/usr/bin/env python3
+"""The mutation tester can fail: a library of two functions, of which the tests try only one."""
+
+import pathlib
+import os
+import shutil
+import subprocess
+import sys
+import tempfile
+import unittest
+
+HERE = pathlib.Path(__file__).resolve().parent
+TRIED = "int Larger(int a, int b) {\n    if (a > b) {\n        return a;\n    }\n    return b;\n}\n"
+UNTRIED = "int Sign(int a) {\n    if (a < 0) {\n        return -1;\n    }\n    return 1;\n}\n"
+SHOULD = """
+int Larger(int a, int b);
+int main() { return Larger(1, 2) == 2 && Larger(4, 3) == 4 && Larger(5, 5) == 5 ? 0 : 1; }
+"""
+
+
+class Mutants(unittest.TestCase):
+    def setUp(self):
+        self.folder = pathlib.Path(tempfile.mkdtemp())
+        self.addCleanup(shutil.rmtree, self.folder)
+
+    def run_on(self, source, program=SHOULD, listed=""):
+        source_folder = self.folder / "source"
+        source_folder.mkdir()
+        (source_folder / "lib.cpp").write_text(source, encoding="utf-8")
+        (self.folder / "test.cpp").write_text(program, encoding="utf-8")
+        (self.folder / "equivalent.list").write_text(listed, encoding="utf-8")
+        compiler = os.environ.get("CXX", "g++")
+        flags = ["-g", "-O0", "-fcf-protection=none"]
+        subprocess.run([compiler, *flags, "-shared", "-fPIC", "source/lib.cpp", "-o", "libx.so"],
+                       cwd=self.folder, check=True)
+        subprocess.run([compiler, *flags, "test.cpp", "-L.", "-lx", "-o", "test"],
+                       cwd=self.folder, check=True)
+        done = subprocess.run(
+            [sys.executable, HERE / "mutants.py", "libx.so", "source", str(self.folder / "test"),
+             "--count", "0", "--spare", "1", "--equivalent", "equivalent.list"],
+            cwd=self.folder, capture_output=True, text=True, check=False)
+        return done.returncode, done.stdout + done.stderr
+
+    def test_a_tested_function_leaves_no_survivor(self):
+        status, text = self.run_on(TRIED)
+        self.assertEqual(status, 0, text)
+        self.assertIn("2 killed, 0 survived, 0 equivalent, of 2: 100.0% killed", text)
+
+    def test_an_untested_function_survives_with_its_line_and_fails_the_run(self):
+        status, text = self.run_on(TRIED + UNTRIED)
+        self.assertEqual(status, 1, text)
+        self.assertIn("2 killed, 2 survived, 0 equivalent, of 4: 50.0% killed", text)
+        self.assertRegex(text, r"survived: lib\.cpp:8: jump \w+ reversed in .*: if \(a < 0\) \{")
+        self.assertRegex(text, r"survived: lib\.cpp:8: jump \w+ removed in .*: if \(a < 0\) \{")
+
+    def test_listed_mutants_are_left_out_of_the_score(self):
+        status, text = self.run_on(TRIED + UNTRIED,
+                                   listed="lib.cpp: if (a < 0) {\n    any: nobody asks\n")
+        self.assertEqual(status, 0, text)
+        self.assertIn("2 killed, 0 survived, 2 equivalent, of 4: 100.0% killed", text)
+
+    def test_endless_mutants_are_killed(self):
+        loop = "int Larger(int a, int b) {\n    while (a == 77) {\n    }\n"
+        status, text = self.run_on(TRIED.replace("int Larger(int a, int b) {\n", loop))
+        self.assertIn("limit 1 s", text)
+        self.assertNotRegex(text, r"survived: lib\.cpp:2: jump \w+ reversed")
+        self.assertEqual(status, 1, "without the test at 77 the removed loop survives")
+
+    def test_tests_that_fail_by_themselves_are_refused(self):
+        status, text = self.run_on(TRIED, "int main() { return 3; }\n")
+        self.assertEqual(status, 1)
+        self.assertIn("fails without a mutant: status 3", text)
+
+
+if __name__ == "__main__":
+    unittest.main()
