@@ -38,7 +38,7 @@ make_base() {
     from=$(mirror)
     [ -n "$from" ] || die "this system installs from no $suite mirror: name one in MIRROR"
     say "making a bare $suite root (kept in build/fresh/base.tar)"
-    rm -rf "$root"
+    rm -rf --one-file-system "$root"
     mkdir -p "$root"
     debootstrap --variant=minbase "$suite" "$root" "$from" >"$work/debootstrap.log" 2>&1 ||
         die "debootstrap failed: see build/fresh/debootstrap.log"
@@ -60,7 +60,7 @@ inside() {
 mkdir -p "$work"
 [ -f "$base" ] || make_base
 say "unpacking the bare root and a copy of the last commit"
-rm -rf "$root"
+rm -rf --one-file-system "$root"
 mkdir -p "$root"
 tar -C "$root" -xf "$base"
 cp /etc/resolv.conf "$root/etc/resolv.conf"
@@ -87,5 +87,5 @@ for word in "$@" "$separator"; do
     command=()
     [ "$status" -eq 0 ] || break
 done
-[ -n "${FRESH_KEEP:-}" ] || rm -rf "$root"
+[ -n "${FRESH_KEEP:-}" ] || rm -rf --one-file-system "$root"
 exit "$status"
