@@ -38,6 +38,7 @@ public:
     }
 
     bool IsValid() const { return data_ != kNothing; }
+    const u8* Bytes() const { return data_; }
     bool IsFolder() const { return GetBe16(data_) == kFolderRecord; }
     u32 Id() const { return GetBe32(data_ + 8); }
     u32 Flags() const { return GetBe16(data_ + 2); }

@@ -4,6 +4,8 @@
 #include "tool/key_argument.h"
 #include "tool/leaf_cursor.h"
 #include "tool/progress.h"
+#include "tool/record_filter.h"
+#include "tool/reverse_walk.h"
 
 namespace VELK::tool {
 
@@ -11,6 +13,8 @@ namespace {
 
 struct DumpOptions {
     bool nodes = false;
+    bool reverse = false;
+    std::vector<std::string> where;
     std::string order = "leaf";
     DumpStyle style;
     std::string values = "short";
@@ -42,7 +46,23 @@ private:
     u64 left_;
 };
 
-void DumpByKey(Session* session, Invocation* call, DumpPrinter* printer, Progress* progress) {
+void DumpBackwards(Session* session, Invocation* call, const RecordFilter& filter,
+                   DumpPrinter* printer, Progress* progress) {
+    const u32 fileId = call->trees[0];
+    const KeyRange range = RangeArgument(session, fileId, call->range);
+    Window window(*call);
+    u64 done = 0;
+    WalkBackwards(session, fileId, range, call->keepGoing, [&](const NodeRecord& record) {
+        progress->Update(++done);
+        if (!window.IsOver() && filter.Holds(record, true) && window.Takes()) {
+            printer->Record(record, true);
+        }
+        return !window.IsOver();
+    });
+}
+
+void DumpByKey(Session* session, Invocation* call, const RecordFilter& filter, DumpPrinter* printer,
+               Progress* progress) {
     const u32 fileId = call->trees[0];
     const CBTreeHfs* tree = session->Tree(fileId);
     const KeyRange range = RangeArgument(session, fileId, call->range);
@@ -61,7 +81,7 @@ void DumpByKey(Session* session, Invocation* call, DumpPrinter* printer, Progres
         if (place > 0) {
             break;
         }
-        if (place == 0 && window.Takes()) {
+        if (place == 0 && filter.Holds(record, true) && window.Takes()) {
             printer->Record(record, true);
         }
     }
@@ -69,7 +89,8 @@ void DumpByKey(Session* session, Invocation* call, DumpPrinter* printer, Progres
 
 // Records of one node, as far as they can be located.
 void DumpNodeRecords(Session* session, Invocation* call, const HeldNode& node,
-                     const KeyRange& range, Window* window, DumpPrinter* printer) {
+                     const KeyRange& range, const RecordFilter& filter, Window* window,
+                     DumpPrinter* printer) {
     const u32 fileId = call->trees[0];
     CBTreeHfs* tree = session->Tree(fileId);
     const bool isLeaf = node.Kind() == kBTLeafNode;
@@ -94,14 +115,15 @@ void DumpNodeRecords(Session* session, Invocation* call, const HeldNode& node,
             }
             continue;
         }
-        if (range.Place(*tree, record.key) == 0 && window->Takes()) {
+        if (range.Place(*tree, record.key) == 0 && filter.Holds(record, isLeaf) &&
+            window->Takes()) {
             printer->Record(record, isLeaf);
         }
     }
 }
 
-void DumpByNode(Session* session, Invocation* call, const DumpOptions& dump, DumpPrinter* printer,
-                Progress* progress) {
+void DumpByNode(Session* session, Invocation* call, const DumpOptions& dump,
+                const RecordFilter& filter, DumpPrinter* printer, Progress* progress) {
     const u32 fileId = call->trees[0];
     const KeyRange range = RangeArgument(session, fileId, call->range);
     Window window(*call);
@@ -112,7 +134,7 @@ void DumpByNode(Session* session, Invocation* call, const DumpOptions& dump, Dum
             return false;
         }
         if (!dump.nodes) {
-            DumpNodeRecords(session, call, node, range, &window, printer);
+            DumpNodeRecords(session, call, node, range, filter, &window, printer);
         } else if (window.Takes()) {
             printer->Node(node);
         }
@@ -127,6 +149,9 @@ void Declare(Invocation* call, DumpOptions* dump) {
     options.Flag("--nodes", &dump->nodes, "a line per node instead of one per record");
     options.Choice("--order", &dump->order, {"leaf", "bfs", "dfs", "disk"},
                    "by key; by level; each node before its children; as in the file");
+    options.Flag("--reverse", &dump->reverse, "records from the last key to the first");
+    options.List("--where", &dump->where, "CONDITION",
+                 "only records with type=file, size>=64K, name=*.txt, ...; all must hold");
     options.Choice("--values", &dump->values, {"none", "short", "full"},
                    "how much of the data is shown");
     options.Flag("--hide-names", &dump->style.hideNames, "n and the ID in place of each name");
@@ -139,25 +164,49 @@ void Declare(Invocation* call, DumpOptions* dump) {
     call->DeclareOutputFile();
 }
 
-int RunDump(Invocation* call) {
-    DumpOptions dump;
-    Declare(call, &dump);
-    call->Parse();
+void CheckCombination(Invocation* call, const DumpOptions& dump) {
     if (call->json + dump.style.hex + dump.style.raw > 1) {
         ThrowUsage("dump", "--json, --hex and --raw exclude each other", "");
     }
     if (dump.style.raw && call->out.IsTerminal()) {
         ThrowUsage("dump", "--raw would write bytes to the terminal", "add -o FILE, or use --hex");
     }
-    if (dump.nodes && !call->range.empty()) {
-        ThrowUsage("dump", "--range chooses records, --nodes lists nodes", "leave one out");
+    const bool choosesRecords = !call->range.empty() || !dump.where.empty();
+    if (dump.nodes && choosesRecords) {
+        ThrowUsage("dump",
+                   fmt::format("{} chooses records, --nodes lists nodes",
+                               call->range.empty() ? "--where" : "--range"),
+                   "leave one out");
     }
+    if (dump.reverse && (dump.nodes || dump.order != "leaf")) {
+        ThrowUsage("dump", "--reverse goes by key: not with --nodes or another --order", "");
+    }
+}
+
+// A tree named by --where tree=... is the one dumped.
+void ChooseTree(Invocation* call, DumpOptions* dump) {
+    const u32 named = RecordFilter::TakeTree(&dump->where);
+    if (named != 0 && call->treesGiven && named != call->trees[0]) {
+        ThrowUsage("dump", "--tree and --where name different trees", "leave one out");
+    }
+    if (named != 0) {
+        call->trees[0] = named;
+    }
+}
+
+int RunDump(Invocation* call) {
+    DumpOptions dump;
+    Declare(call, &dump);
+    call->Parse();
+    ChooseTree(call, &dump);
+    CheckCombination(call, dump);
     dump.style.json = call->json;
     dump.style.values = dump.values == "none"   ? DumpStyle::Values::kNone
                         : dump.values == "full" ? DumpStyle::Values::kFull
                                                 : DumpStyle::Values::kShort;
-    Session session(*call, Session::Truncated::kRefuse);
     const u32 fileId = call->trees[0];
+    const RecordFilter filter(fileId, dump.where);
+    Session session(*call, Session::Truncated::kRefuse);
     const CBTreeHfs* tree = session.Tree(fileId);
     DumpPrinter printer(&session, &call->out, fileId, dump.style);
     const bool byKey = dump.order == "leaf" && !dump.nodes;
@@ -165,10 +214,12 @@ int RunDump(Invocation* call) {
                       byKey ? tree->header.leafRecords : tree->header.totalNodes,
                       byKey ? 0 : tree->header.nodeSize);
     printer.Begin(dump.nodes);
-    if (byKey) {
-        DumpByKey(&session, call, &printer, &progress);
+    if (dump.reverse) {
+        DumpBackwards(&session, call, filter, &printer, &progress);
+    } else if (byKey) {
+        DumpByKey(&session, call, filter, &printer, &progress);
     } else {
-        DumpByNode(&session, call, dump, &printer, &progress);
+        DumpByNode(&session, call, dump, filter, &printer, &progress);
     }
     printer.End();
     return session.PassedOver() != 0 ? kExitFailed : kExitDone;
@@ -182,8 +233,10 @@ const Command kDumpCommand = {
     "IMAGE",
     "records or nodes of a tree, readable, as JSON or as bytes",
     "--order disk reads every node of the file and does not trust the index: it shows records of\n"
-    "nodes that are no longer in use, too.",
-    {"dump -t catalog --range '2:a..2:b' disk.img", "dump -t extents --json disk.img",
+    "nodes that are no longer in use, too. --where compares (= != < <= > >=) a field that "
+    "--values\n"
+    "full or --json shows, besides type, node, record, bytes and the fields of the key.",
+    {"dump -t catalog --range '2:a..2:b' disk.img", "dump --where 'size>=64K' --json disk.img",
      "dump --nodes --order disk disk.img"},
     RunDump,
 };

@@ -5,6 +5,7 @@
 #include "tool/errors.h"
 #include "tool/item_printer.h"
 #include "tool/key_search.h"
+#include "tool/name_collisions.h"
 #include "tool/name_glob.h"
 
 namespace VELK::tool {
@@ -24,6 +25,8 @@ struct FindOptions {
     std::optional<std::string> nearest;
     bool tracePath = false;
     bool orphans = false;
+    bool collisions = false;
+    std::optional<std::string> format;
     PrintStyle style;
 };
 
@@ -65,6 +68,10 @@ void Declare(Invocation* call, FindOptions* find) {
     options.Text("--nearest", &find->nearest, "KEY", "where this key would be inserted");
     options.Flag("--trace-path", &find->tracePath, "with a key: the way down the tree");
     options.Flag("--orphans", &find->orphans, "items whose folder cannot be placed");
+    options.Flag("--collisions", &find->collisions,
+                 "names that are one but for case and spelling, folder by folder");
+    options.Text("--format", &find->format, "PATTERN",
+                 "a line of your own for each: '{id}\\t{path}\\n'");
     options.Flag("-l,--long", &find->style.longForm, "type, ID, size, date before the path");
     options.Flag("-0,--null", &find->style.zeroEnds, "end paths with NUL, escape nothing");
     options.Flag("--nfc", &find->style.composed, "names in composed form");
@@ -151,13 +158,23 @@ u64 FindMany(Session* session, const Invocation& call, const FindOptions& find,
         }
         scope.folderId = start.Item().Id();
     }
-    ListCatalog(session, call, scope, [&](const ListedItem& listed) {
-        if (conditions.Hold(listed) && matched++ >= call.skipRecords) {
+    const auto print = [&](const ListedItem& listed) {
+        if (matched++ >= call.skipRecords) {
             printer->Print(listed);
             printed += 1;
         }
         return printed < call.limit;
+    };
+    CollisionFinder collisions(print);
+    ListCatalog(session, call, scope, [&](const ListedItem& listed) {
+        if (!conditions.Hold(listed)) {
+            return true;
+        }
+        return find.collisions ? collisions.Add(listed) : print(listed);
     });
+    if (printed < call.limit) {
+        collisions.Finish();
+    }
     return printed;
 }
 
@@ -194,6 +211,12 @@ int RunFind(Invocation* call) {
     if (find.tracePath && !byKey) {
         ThrowUsage("find", "--trace-path wants --key or --nearest", "");
     }
+    if (find.format && (call->json || byKey || find.block)) {
+        ThrowUsage("find", "--format is for lists of paths: not with --json, --key or --block", "");
+    }
+    if (find.format) {
+        find.style.format = std::make_shared<const ItemFormat>("find", *find.format);
+    }
     Session session(*call, Session::Truncated::kReadOn);
     if (find.block) {
         return FindBlock(&session, call, *find.block);
@@ -213,7 +236,8 @@ const Command kFindCommand = {
     "find",
     "IMAGE [PATH]",
     "search by name, ID, kind, size, date or block; or by exact key",
-    "Conditions are combined: all must hold. Exit code 1 when nothing matches.",
+    "Conditions are combined: all must hold. Exit code 1 when nothing matches. The fields of\n"
+    "--format: path name id parent type size rsize modified created mode flags node record.",
     {"find disk.img --name 'file_1?.txt' --limit 2", "find disk.img --type file --larger 64K -l",
      "find disk.img --key '2:file_1.txt' --trace-path"},
     RunFind,

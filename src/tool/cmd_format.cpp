@@ -6,6 +6,7 @@
 #include "tool/command.h"
 #include "tool/errors.h"
 #include "tool/format_args.h"
+#include "tool/wrap_volume.h"
 
 namespace VELK::tool {
 
@@ -23,6 +24,7 @@ struct FormatArguments {
     std::string name;
     std::string date;
     std::string uuid;
+    std::string wrap = "none";
     bool caseSensitive = false;
     bool withAttributes = false;
     bool empty = false;
@@ -42,6 +44,8 @@ struct FormatArguments {
         options.Flag("--empty", &empty, "no records at all: for import");
         options.Text("--date", &date, "ISO", "written to every date: 2026-11-21T00:00:00Z (now)");
         options.Text("--uuid", &uuid, "HEX", "volume identifier of 16 digits (random)");
+        options.Choice("--wrap", &wrap, {"none", "apm", "gpt"},
+                       "a partition map around the volume, which makes the file a little larger");
         options.Flag("--force", &call->force, "replace a file that exists");
     }
 };
@@ -104,11 +108,20 @@ int RunFormat(Invocation* call) {
     }
     const FormatOptions options = OptionsOf(arguments);
     Problem problem;
-    std::unique_ptr<BlockDevice> device =
-        FileDevice::Open(call->image, FileDevice::Mode::kCreate, *arguments.size, &problem);
+    const WrapScheme scheme = arguments.wrap == "apm"   ? WrapScheme::kApm
+                              : arguments.wrap == "gpt" ? WrapScheme::kGpt
+                                                        : WrapScheme::kNone;
+    std::unique_ptr<BlockDevice> device = FileDevice::Open(
+        call->image, FileDevice::Mode::kCreate, WrappedSize(scheme, *arguments.size), &problem);
     if (!device) {
         ThrowProblem(call->image, problem);
     }
+    const IoResult mapped =
+        WriteMap(scheme, device.get(), {*arguments.size, options.caseSensitive, options.uuid});
+    if (!mapped.Ok()) {
+        ThrowFailed(call->image, "cannot write: " + IoErrorText(mapped.error), "");
+    }
+    device = VolumeWithin(scheme, std::move(device), *arguments.size);
     const std::unique_ptr<ImageVolume> volume = MakeVolume(std::move(device), options, &problem);
     if (!volume) {
         if (!exists) {

@@ -92,12 +92,13 @@ ItemPrinter::ItemPrinter(Session* session, Output* out, const PrintStyle& style)
 }
 
 NameForm ItemPrinter::Form() const {
-    return style_.json ? NameForm::kJson : style_.zeroEnds ? NameForm::kRaw : NameForm::kText;
+    const bool isRaw = style_.zeroEnds || (style_.format && style_.format->WantsRawNames());
+    return style_.json ? NameForm::kJson : isRaw ? NameForm::kRaw : NameForm::kText;
 }
 
 void ItemPrinter::PutPath(const ListedItem& listed, std::string* text) const {
     text->clear();
-    if (style_.wholePaths || style_.json) {
+    if (style_.wholePaths || style_.json || style_.format) {
         *text = *listed.folderPath;
     }
     AppendName(text, listed.name, listed.nameLength, Form());
@@ -109,6 +110,13 @@ void ItemPrinter::PutPath(const ListedItem& listed, std::string* text) const {
 void ItemPrinter::Print(const ListedItem& listed) {
     if (style_.json) {
         PrintJson(listed);
+        return;
+    }
+    if (style_.format) {
+        PutPath(listed, &text_);
+        std::string line;
+        style_.format->Append(listed, text_, &line);
+        out_->Write(line);
         return;
     }
     if (style_.longForm) {

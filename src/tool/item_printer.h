@@ -1,9 +1,11 @@
 // Prints catalog items for ls and find: bare paths, long lines, JSON.
 #pragma once
 
+#include <memory>
 #include <string>
 
 #include "tool/catalog_list.h"
+#include "tool/item_format.h"
 
 namespace VELK::tool {
 
@@ -13,8 +15,9 @@ struct PrintStyle {
     bool zeroEnds = false;    // items end in NUL and are not escaped
     bool composed = false;    // names in the form most people type
     bool json = false;
-    bool attributes = false;  // names of extended attributes below each item
-    bool extents = false;     // where the forks lie
+    bool attributes = false;                   // names of extended attributes below each item
+    bool extents = false;                      // where the forks lie
+    std::shared_ptr<const ItemFormat> format;  // instead of all of these but `composed`
 };
 
 class ItemPrinter {

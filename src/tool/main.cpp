@@ -22,13 +22,19 @@ extern const Command kNodeCommand;
 extern const Command kStatsCommand;
 extern const Command kPlotCommand;
 extern const Command kBadBlocksCommand;
+extern const Command kDiffCommand;
+extern const Command kScanCommand;
 extern const Command kFormatCommand;
 extern const Command kCreateTreeCommand;
+extern const Command kRebuildCommand;
 extern const Command kDemoCommand;
 extern const Command kApplyCommand;
 extern const Command kShellCommand;
 extern const Command kExportCommand;
 extern const Command kImportCommand;
+extern const Command kMetadumpCommand;
+extern const Command kUndoCommand;
+extern const Command kBenchCommand;
 extern const Command kCompletionCommand;
 extern const Command kHelpCommand;
 extern const Command kVersionCommand;
@@ -43,13 +49,19 @@ const Command* const kCommands[] = {
     &kStatsCommand,
     &kPlotCommand,
     &kBadBlocksCommand,
+    &kDiffCommand,
+    &kScanCommand,
     &kFormatCommand,
     &kCreateTreeCommand,
+    &kRebuildCommand,
     &kDemoCommand,
     &kApplyCommand,
     &kShellCommand,
     &kExportCommand,
     &kImportCommand,
+    &kMetadumpCommand,
+    &kUndoCommand,
+    &kBenchCommand,
     &kCompletionCommand,
     &kHelpCommand,
     &kVersionCommand,

@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cstring>
 
+#include "hfs/treehfs/noderef.h"
 #include "tool/errors.h"
 
 namespace VELK::tool {
@@ -90,10 +91,15 @@ int HeldNode::Open(u32 number) {
 }
 
 void HeldNode::Release() {
-    if (node_ != nullptr) {
-        tree_->PutINode(node_, false);
-        node_ = nullptr;
+    if (node_ == nullptr) {
+        return;
     }
+    if (afterUse_ == AfterUse::kKeepCached || !node_->modifiedLink.IsEmpty()) {
+        ReleaseNode(node_);
+    } else {
+        tree_->PutINode(node_, false);
+    }
+    node_ = nullptr;
 }
 
 u32 HeldNode::FreeBytes() const {

@@ -34,10 +34,14 @@ private:
     std::vector<u8> data_;
 };
 
-// One node, held while the object lives.
+// One node, held while the object lives. Walks over a whole tree drop what they have seen, so that
+// memory stays small; a node with changes that no flush has kept stays in any case.
 class HeldNode {
 public:
-    explicit HeldNode(CBTreeHfs* tree) : tree_(tree) {}
+    enum class AfterUse { kDrop, kKeepCached };
+
+    explicit HeldNode(CBTreeHfs* tree, AfterUse afterUse = AfterUse::kDrop)
+        : tree_(tree), afterUse_(afterUse) {}
     HeldNode(const HeldNode&) = delete;
     HeldNode& operator=(const HeldNode&) = delete;
     ~HeldNode() { Release(); }
@@ -62,6 +66,7 @@ private:
     const u8* Start() const { return node_->bufs[0].data; }
 
     CBTreeHfs* tree_;
+    AfterUse afterUse_;
     HfsNode* node_ = nullptr;
 };
 

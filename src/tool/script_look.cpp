@@ -5,45 +5,12 @@
 
 #include "hfs/check/check.h"
 #include "hfs/treehfs/bytes.h"
+#include "tool/node_reader.h"
 #include "tool/record_digest.h"
 #include "tool/script_run.h"
 
 namespace VELK::tool {
 namespace {
-
-// A node held for as long as it is looked at; it stays cached afterwards.
-class HeldNode {
-public:
-    HeldNode(CBTreeHfs* tree, u32 number) { status_ = tree->GetINode(number, &node_, false); }
-    HeldNode(const HeldNode&) = delete;
-    HeldNode& operator=(const HeldNode&) = delete;
-    ~HeldNode() {
-        if (status_ == kOk) {
-            node_->refCount -= 1;
-        }
-    }
-    int Status() const { return status_; }
-    const HfsNode* Get() const { return node_; }
-
-private:
-    HfsNode* node_ = nullptr;
-    int status_;
-};
-
-const char* KindName(s8 kind) {
-    switch (kind) {
-        case kBTLeafNode:
-            return "leaf";
-        case kBTIndexNode:
-            return "index";
-        case kBTHeaderNode:
-            return "header";
-        case kBTMapNode:
-            return "map";
-        default:
-            return "unknown";
-    }
-}
 
 void PutHeader(const CBTreeHfs& tree, u8* node) {
     const BTHeaderMem& header = tree.header;
@@ -70,21 +37,22 @@ struct LevelWalk {
 // Follows one level from its first node along the forward links; bounded by the nodes there are.
 int WalkLevel(CBTreeHfs* tree, u32 number, LevelWalk* walk, u32* firstChild) {
     while (number != 0 && walk->nodes < tree->header.totalNodes) {
-        const HeldNode node(tree, number);
-        if (node.Status() != kOk) {
-            return node.Status();
+        HeldNode node(tree, HeldNode::AfterUse::kKeepCached);
+        int status = node.Open(number);
+        if (status != kOk) {
+            return status;
         }
-        const NodeBytes bytes(&tree->header, node.Get());
+        const NodeBytes bytes = node.Bytes();
         unsigned freeBytes = 0;
-        const int status = node.Get()->GetNodeFreeSize(&tree->header, &freeBytes);
+        status = node.Get()->GetNodeFreeSize(&tree->header, &freeBytes);
         if (status != kOk) {
             return status;
         }
         if (walk->nodes == 0 && bytes.U8(kDescHeight) > 1) {
             unsigned child = 0;
-            const int childStatus = node.Get()->GetChildNodeNum(&tree->header, 0, &child);
-            if (childStatus != kOk) {
-                return childStatus;
+            status = node.Get()->GetChildNodeNum(&tree->header, 0, &child);
+            if (status != kOk) {
+                return status;
             }
             *firstChild = child;
         }
@@ -131,12 +99,12 @@ int DigestTree(CBTreeHfs* tree, RecordDigest* digest) {
     int status = kOk;
     u32 number = tree->header.firstLeafNode;
     for (u32 hops = 0; number != 0 && hops < tree->header.totalNodes && status == kOk; ++hops) {
-        const HeldNode node(tree, number);
-        status = node.Status();
+        HeldNode node(tree, HeldNode::AfterUse::kKeepCached);
+        status = node.Open(number);
         if (status != kOk) {
             break;
         }
-        const NodeBytes bytes(&tree->header, node.Get());
+        const NodeBytes bytes = node.Bytes();
         std::vector<u8> copy;
         for (u32 i = 0; i < bytes.U16(kDescNumRecords) && status == kOk; ++i) {
             NodeKey record{};
@@ -178,22 +146,21 @@ ScriptRunner::Outcome ScriptRunner::Node(const std::string_view* words) {
     if (number >= tree->validNodes && number < tree->header.totalNodes) {
         return {kOk, " unused=yes"};  // asking the engine for it would make it a fresh node
     }
-    const HeldNode node(tree, static_cast<u32>(number));
-    if (node.Status() != kOk) {
-        return {node.Status(), {}};
+    HeldNode node(tree, HeldNode::AfterUse::kKeepCached);
+    int status = node.Open(static_cast<u32>(number));
+    if (status != kOk) {
+        return {status, {}};
     }
-    const NodeBytes bytes(&tree->header, node.Get());
+    const NodeBytes bytes = node.Bytes();
     std::vector<u8> copy(tree->header.nodeSize);
     bytes.CopyOut(copy.data(), 0, tree->header.nodeSize);
     RecordDigest digest;
     digest.Add(copy.data(), static_cast<u32>(copy.size()), nullptr, 0);
     unsigned freeBytes = 0;
-    const int status = node.Get()->GetNodeFreeSize(&tree->header, &freeBytes);
-    return {status,
-            fmt::format(" kind={} height={} records={} flink={} blink={} free={} bytes={}",
-                        KindName(static_cast<s8>(bytes.U8(kDescKind))), bytes.U8(kDescHeight),
-                        bytes.U16(kDescNumRecords), bytes.U32(kDescFLink), bytes.U32(kDescBLink),
-                        freeBytes, digest.Text())};
+    status = node.Get()->GetNodeFreeSize(&tree->header, &freeBytes);
+    return {status, fmt::format(" kind={} height={} records={} flink={} blink={} free={} bytes={}",
+                                NodeKindName(node.Kind()), node.Height(), node.RecordCount(),
+                                node.FLink(), node.BLink(), freeBytes, digest.Text())};
 }
 
 ScriptRunner::Outcome ScriptRunner::Check(u32 count) {

@@ -9,6 +9,7 @@
 #include "hfs/volume/make_volume.h"
 #include "tool/errors.h"
 #include "tool/options.h"
+#include "tool/undo_file.h"
 
 namespace VELK::tool {
 namespace {
@@ -116,6 +117,8 @@ void TargetOptions::DeclareForImage(Invocation* call) {
     call->DeclarePlace();
     call->options.Text("--save", &saveFile, "FILE", "write the volume to FILE afterwards");
     call->options.Flag("--write", &write, "let changes reach the image");
+    call->options.Text("--undo", &undoFile, "FILE",
+                       "with --write: keep what is overwritten, for the command undo");
     call->options.Flag("--force", &force,
                        "write to a volume with a journal or not unmounted; replace FILE");
 }
@@ -123,6 +126,28 @@ void TargetOptions::DeclareForImage(Invocation* call) {
 std::string TargetOptions::Subject(const Invocation& call) const {
     return newVolume.empty() ? call.image : "new volume";
 }
+
+namespace {
+
+std::unique_ptr<ImageVolume> OpenWithUndo(const Invocation& call, const TargetOptions& target,
+                                          const OpenOptions& options, Problem* problem) {
+    if (!target.write) {
+        ThrowUsage(call.command.name, "--undo is for --write: without it the image stays as it is",
+                   "");
+    }
+    if (!target.force && access(target.undoFile.c_str(), F_OK) == 0) {
+        ThrowFailed("", target.undoFile + " exists", "--force replaces it");
+    }
+    std::unique_ptr<BlockDevice> device =
+        FileDevice::Open(call.image, FileDevice::Mode::kReadWrite, 0, problem);
+    if (device != nullptr) {
+        device = UndoDevice::Open(std::move(device), target.undoFile, problem);
+    }
+    return device == nullptr ? nullptr
+                             : ImageVolume::Open(std::move(device), options, nullptr, problem);
+}
+
+}  // namespace
 
 std::unique_ptr<ImageVolume> OpenTarget(const Invocation& call, const TargetOptions& options) {
     if (!options.newVolume.empty()) {
@@ -142,7 +167,8 @@ std::unique_ptr<ImageVolume> OpenTarget(const Invocation& call, const TargetOpti
     open.mapBlockSize = call.mapBlockSize;
     Problem problem;
     std::unique_ptr<ImageVolume> volume =
-        ImageVolume::OpenFile(call.image, open, nullptr, &problem);
+        options.undoFile.empty() ? ImageVolume::OpenFile(call.image, open, nullptr, &problem)
+                                 : OpenWithUndo(call, options, open, &problem);
     if (!volume) {
         ThrowProblem(call.image, problem);
     }

@@ -14,6 +14,7 @@ namespace VELK::tool {
 struct TargetOptions {
     std::string newVolume;  // SIZE[,block=N][,map=N][,node=N][,clump=N][,case][,empty]
     std::string saveFile;
+    std::string undoFile;
     bool write = false;
     bool force = false;
 

@@ -38,8 +38,8 @@ void LendVolume(ImageVolume* volume) {
     g_lentVolume = volume;
 }
 
-Session::Session(const Invocation& call, Truncated truncated)
-    : image_(call.image), quiet_(call.quiet), json_(call.json) {
+Session::Session(const Invocation& call, const std::string& image, Truncated truncated)
+    : image_(image), quiet_(call.quiet), json_(call.json) {
     if (call.trace) {
         TraceEngine();
     }

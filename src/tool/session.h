@@ -23,8 +23,9 @@ public:
         kRefuse,  // stops, unless --keep-going is given
     };
 
-    // Opens read-only. Throws ToolError.
-    Session(const Invocation& call, Truncated truncated);
+    // Opens read-only: the call's image, or another one in the same way. Throws ToolError.
+    Session(const Invocation& call, Truncated truncated) : Session(call, call.image, truncated) {}
+    Session(const Invocation& call, const std::string& image, Truncated truncated);
     Session(const Session&) = delete;
     Session& operator=(const Session&) = delete;
 
