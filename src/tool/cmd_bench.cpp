@@ -1,6 +1,8 @@
 // bench: how fast the engine's operations are here.
 #include <algorithm>
 
+#include "hfs/check/check.h"
+#include "hfs/records/json_writer.h"
 #include "hfs/records/name_text.h"
 #include "hfs/records/text_format.h"
 #include "tool/bench_run.h"
@@ -9,8 +11,6 @@
 #include "tool/leaf_cursor.h"
 #include "tool/script_run.h"
 #include "tool/tree_survey.h"
-
-#include "hfs/check/check.h"
 
 namespace VELK::tool {
 

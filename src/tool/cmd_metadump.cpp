@@ -2,6 +2,7 @@
 #include <unistd.h>
 
 #include <cstdio>
+#include <filesystem>
 
 #include "hfs/records/name_text.h"
 #include "hfs/records/text_format.h"
@@ -58,7 +59,8 @@ int RunMetadump(Invocation* call) {
         ThrowUsage("metadump", "where is the image to go?", "give -o FILE");
     }
     Session session(*call, Session::Truncated::kRefuse);
-    if (access(path.c_str(), F_OK) == 0 && call->force && session.Image() == path) {
+    std::error_code none;
+    if (std::filesystem::equivalent(path, session.Image(), none)) {
         ThrowFailed(path, "is the image itself", "choose another name");
     }
     const u64 size = MetaDump::VolumeBytes(&session);

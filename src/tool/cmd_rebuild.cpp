@@ -6,6 +6,7 @@
 #include "hfs/check/check.h"
 #include "hfs/records/text_format.h"
 #include "tool/errors.h"
+#include "tool/node_reader.h"
 #include "tool/progress.h"
 #include "tool/record_digest.h"
 #include "tool/script_run.h"

@@ -1,6 +1,7 @@
 // scan: records that lie outside the trees.
 #include <array>
 
+#include "hfs/records/key_text.h"
 #include "hfs/records/name_text.h"
 #include "hfs/records/record_view.h"
 #include "hfs/records/text_format.h"

@@ -1,6 +1,7 @@
 // undo: puts back what a command with --undo FILE has overwritten.
 #include "hfs/records/name_text.h"
 #include "hfs/records/text_format.h"
+#include "tool/command.h"
 #include "tool/errors.h"
 #include "tool/undo_file.h"
 

@@ -6,7 +6,6 @@
 #include <algorithm>
 #include <cstring>
 
-#include "hfs/treehfs/noderef.h"
 #include "tool/errors.h"
 
 namespace VELK::tool {
@@ -95,7 +94,7 @@ void HeldNode::Release() {
         return;
     }
     if (afterUse_ == AfterUse::kKeepCached || !node_->modifiedLink.IsEmpty()) {
-        ReleaseNode(node_);
+        node_->refCount -= 1;  // the plain release: the node stays cached
     } else {
         tree_->PutINode(node_, false);
     }

@@ -25,7 +25,8 @@ constexpr std::string_view kStyle = R"(<style>
 .map{fill:#b78be0;stroke:#e0c8f5}
 .f0{fill:#1b3350}.f1{fill:#1e3f63}.f2{fill:#224c77}.f3{fill:#285a8b}.f4{fill:#30699f}
 .f5{fill:#3c7ab2}.f6{fill:#4f8ec4}.f7{fill:#6aa5d6}.f8{fill:#8dbde5}.f9{fill:#b8d8f3}
-.index{stroke:#f2a65e}.dot{fill:#6aa5d6}.bar{fill:#4f8ec4}}
+.index{stroke:#f2a65e}.i0,.i1,.i2,.i3,.i4{fill:#4a2a0e}.i5,.i6,.i7{fill:#a85a17}
+.i8,.i9{fill:#f2a65e}.dot{fill:#6aa5d6}.bar{fill:#4f8ec4}}
 </style>
 )";
 
@@ -100,7 +101,7 @@ void SvgPicture::LegendItem(double* x, double y, std::string_view style, std::st
 
 void SvgPicture::FillLegend(double* x, double y) {
     Text(*x, y, "soft label", "leaf, empty");
-    *x += 68;
+    *x += 74;
     for (u32 step = 0; step < 10; ++step) {
         Box(*x, y - kSample + 2, kSample, kSample, fmt::format("leaf f{}", step),
             fmt::format("{} to {}% full", 10 * step, 10 * step + 10));

@@ -95,7 +95,8 @@ private:
             }
             const double x = parent.x + share * i;
             next->push_back({child, x, share});
-            if (share > 3) {
+            // Where the lines would run together, those to the first and last child stand for all.
+            if (share > 3 || i == 0 || i + 1 == count) {
                 picture_.Line(parent.x + parent.width / 2, y + kBoxHeight, x + share / 2,
                               y + kRowHeight, "rule");
             }

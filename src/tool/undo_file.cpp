@@ -35,7 +35,7 @@ bool WriteEntry(std::FILE* file, u64 offset, u32 size, u64 sum, const u8* bytes)
     PutBe32(head + 8, size);
     PutBe64(head + 12, sum);
     return std::fwrite(head, 1, sizeof head, file) == sizeof head &&
-           std::fwrite(bytes, 1, size, file) == size;
+           (size == 0 || std::fwrite(bytes, 1, size, file) == size);
 }
 
 // Adds the bytes of one sector to a running sum.

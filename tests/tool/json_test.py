@@ -19,6 +19,18 @@ whole = vb.volume(extents=bad)
 broken = bytearray(whole)
 struct.pack_into(">I", broken, vb.CATALOG_BLOCK * vb.BLOCK + 16, 900)
 (folder / "root.img").write_bytes(broken)
+leaves = vb.plain_leaves()
+leaves[0][2] = vb.file(2, "alpha", 16, 6, [(20, 1)])
+leaves[0][3:4] = []
+leaves[0][4:4] = [vb.file(2, "delta", 30)]
+leaves[0].sort(key=lambda record: (record[2:6], record[8:]))
+(folder / "other.img").write_bytes(vb.volume(catalog=vb.leaf_tree(leaves)))
+nodes = vb.leaf_tree(vb.plain_leaves())
+gap = vb.file(2, "left", 78)
+nodes[1] = nodes[1][:2000] + gap + nodes[1][2000 + len(gap):]
+(folder / "gap.img").write_bytes(vb.volume(catalog=nodes))
+(folder / "good.jsonl").write_text(harness.text("export", "good.img", cwd=folder)[1], "utf-8")
+(folder / "one.tr").write_text('insert 2:a folder{id:16}\nget 2:b\nstate\n')
 
 COMMANDS = {
     "treehfs.info/1": [["info", "good.img"], ["info", "root.img"]],
@@ -30,8 +42,22 @@ COMMANDS = {
     "treehfs.check/1": [["check", "order.img"]],
     "treehfs.stats/1": [["stats", "good.img"]],
     "treehfs.badblocks/1": [["badblocks", "good.img"]],
+    "treehfs.dump/1": [["dump", "good.img"], ["dump", "--nodes", "good.img"],
+                       ["dump", "--order", "bfs", "good.img"],
+                       ["dump", "--values", "full", "good.img"]],
+    "treehfs.node/1": [["node", "good.img", "header", "root", "first"]],
+    "treehfs.records/1": [["export", "good.img"], ["export", "-t", "extents", "good.img"]],
+    "treehfs.import/1": [["import", "--new", "1M,empty", "good.jsonl"]],
+    "treehfs.apply/1": [["apply", "--new", "1M", "one.tr", "--trace"]],
+    "treehfs.diff/1": [["diff", "good.img", "other.img"]],
+    "treehfs.scan/1": [["scan", "gap.img"]],
+    "treehfs.metadump/1": [["metadump", "good.img", "-o", "meta.img"]],
+    "treehfs.rebuild/1": [["rebuild", "good.img", "-q"]],
+    "treehfs.bench/1": [["bench", "--records", "100"], ["bench", "good.img"]],
     "treehfs.error/1": [["ls", "root.img"], ["ls", "nope.img"], ["ls"]],
 }
+WITH_RECORDS = {"treehfs.dump/1", "treehfs.node/1", "treehfs.records/1", "treehfs.diff/1",
+                "treehfs.scan/1"}
 # Names of record kinds are keys of an object, too.
 KINDS = {"file", "folder", "thread-file", "thread-folder", "extents"}
 
@@ -55,17 +81,35 @@ def members(value):
     return set()
 
 
+def record_fields():
+    """Members of keys and records, wherever a schema has them: the table of docs/json.md, and the
+    fields that docs/records.md lists."""
+    bullets = (harness.ROOT / "docs" / "records.md").read_text("utf-8").split("## JSON Lines")[0]
+    fields = re.findall(r"`(\w+)`", "".join(re.findall(r"^- .*(?:\n  .*)*", bullets, re.M)))
+    return described(text, "Keys and records")[0] | set(fields)
+
+
+def without_fields(value):
+    """Script operations have fields of their own, which docs/script.md describes."""
+    return {key: inner for key, inner in value.items() if key != "fields"} | (
+        {"fields": None} if "fields" in value else {})
+
+
 text = (harness.ROOT / "docs" / "json.md").read_text("utf-8")
 for schema, commands in COMMANDS.items():
     seen = set()
     for command in commands:
         code, out, err = harness.text(*command, "--json", cwd=folder)
+        if command[0] == "export":
+            code, out, err = harness.text(*command, cwd=folder)
         lines = (err if "error" in schema else out).splitlines()
         checks.equal(json.loads(lines[0])["schema"], schema, " ".join(command))
         for line in lines:
-            seen |= members(json.loads(line))
+            value = json.loads(line)
+            seen |= members(without_fields(value) if schema == "treehfs.apply/1" else value)
     known, always = described(text, schema)
     extra = KINDS if schema == "treehfs.stats/1" else set()
+    extra |= record_fields() if schema in WITH_RECORDS else set()
     checks.equal(sorted(seen - known - extra), [], schema + ": members docs/json.md lacks")
     checks.equal(sorted(always - seen), [], schema + ": members that have vanished")
 checks.finish()
