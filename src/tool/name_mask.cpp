@@ -17,9 +17,9 @@ struct UnitClass {
     char16_t from, to;
 };
 constexpr UnitClass kClasses[] = {
-    {0x0000, 0x002D, u'!', u'-'},     {u'.', u'.', u'.', u'.'}, {u'/', u'/', u'/', u'/'},
-    {u'0', u'@', u'0', u'9'},         {u'A', u'`', u'A', u'Z'}, {u'a', 0x007F, u'a', u'z'},
-    {0x0080, 0xFFFF, 0x4E00, 0x9FA5},
+    {0x0000, 0x002D, u'!', u'-'}, {u'.', u'.', u'.', u'.'},         {u'/', u'/', u'/', u'/'},
+    {u'0', u'@', u'0', u'9'},     {u'A', u'Z', u'A', u'Z'},         {u'[', u'`', u'[', u'`'},
+    {u'a', 0x007F, u'a', u'z'},   {0x0080, 0xFFFF, 0x4E00, 0x9FA5},
 };
 constexpr char16_t kFirstBeyondAscii = 0x0080;
 

@@ -90,9 +90,8 @@ def record_fields():
 
 
 def without_fields(value):
-    """Script operations have fields of their own, which docs/script.md describes."""
-    return {key: inner for key, inner in value.items() if key != "fields"} | (
-        {"fields": None} if "fields" in value else {})
+    """Script operations have fields and statuses of their own, which docs/script.md describes."""
+    return {key: None if key in ("fields", "statuses") else inner for key, inner in value.items()}
 
 
 text = (harness.ROOT / "docs" / "json.md").read_text("utf-8")

@@ -5,7 +5,7 @@ import struct
 
 BLOCK = 4096
 NODE = 4096
-DATE = 0xE0000000  # 2023-01-26 01:53:20
+DATE = 0xE0000000  # 2023-02-01 11:39:44
 
 
 def node(kind, height, records, flink=0, blink=0, size=NODE):

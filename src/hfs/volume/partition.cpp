@@ -154,7 +154,7 @@ Problem NoPartitionTaken(BlockDevice* image, const VolumeScan& scan) {
         }
     }
     for (const PartitionEntry& entry : scan.partitions) {
-        if (IsHfsType(entry)) {
+        if (IsHfsType(entry) && entry.content != Content::kOther) {
             return HeaderGone(image, entry.offset);
         }
     }
