@@ -129,7 +129,10 @@ u64 DiffTree(Session* before, Session* after, Invocation* call, const DiffOption
     } else if (printer.LeftOut(counts.Differences())) {
         call->out.Write("... the others are only counted (--limit)\n");
     }
-    if (!call->json) {
+    if (!call->json && counts.Differences() == 0) {
+        call->out.Print("{}: no difference in {}\n", ForkName(fileId),
+                        Counted(counts.equal, "record", "records"));
+    } else if (!call->json) {
         call->out.Print("{}: {} only in {}, {} only in {}, {} changed, {} equal\n",
                         ForkName(fileId), Grouped(counts.removed), EscapedText(before->Image()),
                         Grouped(counts.added), EscapedText(after->Image()), Grouped(counts.changed),

@@ -76,10 +76,10 @@ int RunMetadump(Invocation* call) {
             "\"volume_bytes\":{}}}\n",
             dump.Names(), dump.Nodes(), dump.Bytes(), size);
     } else {
-        call->out.Print("{}: {} and {}, {} B of metadata in a sparse file of {} B\n",
+        call->out.Print("{}: {} copied, {} replaced, {} B of metadata in a sparse file of {} B\n",
                         EscapedText(path), Counted(dump.Nodes(), "node", "nodes"),
-                        Counted(dump.Names(), "name replaced", "names replaced"),
-                        Grouped(dump.Bytes()), Grouped(size));
+                        Counted(dump.Names(), "name", "names"), Grouped(dump.Bytes()),
+                        Grouped(size));
     }
     return session.PassedOver() != 0 ? kExitFailed : kExitDone;
 }

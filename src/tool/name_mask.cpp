@@ -49,6 +49,11 @@ void NameMask::Add(u32 group, const u8* unitsBe, u32 count, bool keep) {
     names_.push_back({group, OrderOf(unitsBe, count), {}, keep});
 }
 
+u64 NameMask::Names() const {
+    return static_cast<u64>(std::count_if(names_.begin(), names_.end(),
+                                          [](const Name& name) { return !name.order.empty(); }));
+}
+
 bool NameMask::Prepare() {
     std::sort(names_.begin(), names_.end(), [](const Name& a, const Name& b) {
         return a.group != b.group   ? a.group < b.group

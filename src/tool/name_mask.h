@@ -25,7 +25,8 @@ public:
     bool Prepare();
     // Writes the other name over one that was added.
     void Replace(u32 group, u8* unitsBe, u32 count) const;
-    u64 Names() const { return names_.size(); }
+    // How many names were added, the empty ones of thread records left out.
+    u64 Names() const;
 
     static constexpr u32 kLongestName = 255;
 

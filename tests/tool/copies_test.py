@@ -71,7 +71,7 @@ build("case.img", "--case-sensitive")
 copy = (folder / "a.img").read_bytes()
 (folder / "b.img").write_bytes(copy)
 out = ask("diff", "a.img", "b.img")
-checks.check(out.startswith("catalog: 0 only in a.img, 0 only in b.img, 0 changed, "),
+checks.check(out.startswith("catalog: no difference in "),
              "equal volumes: " + out)
 ask("apply", "b.img", script("change.tr", [
     "delete 2:alpha", "insert 2:omega file{id:9000}", "replace 2:Zulu file{id:1002,size:5}"]),
