@@ -20,6 +20,21 @@ namespace {
 
 std::atomic<bool> g_interrupted{false};
 
+// A line for a program. False: the reader went away.
+bool Report(int fd, const std::string& what, u64 done, u64 total) {
+    std::string name = what;
+    std::replace(name.begin(), name.end(), ' ', '.');
+    const std::string line = fmt::format("{} {} {}\n", name, done, total);
+    return write(fd, line.data(), line.size()) >= 0;
+}
+
+// The last line says how far the work came, however short it was.
+void ReportEnd(int fd, const std::string& what, u64 done, u64 total) {
+    if (fd >= 0 && done != 0) {
+        Report(fd, what, done, total);
+    }
+}
+
 void OnInterrupt(int) {
     g_interrupted.store(true, std::memory_order_relaxed);
 }
@@ -54,10 +69,12 @@ Progress::Progress(const Invocation& call, std::string what, std::string unit, u
 
 Progress::~Progress() {
     Erase();
+    ReportEnd(fd_, what_, done_, total_);
 }
 
 void Progress::Restart(std::string what, u64 total) {
     Erase();
+    ReportEnd(fd_, what_, done_, total_);
     what_ = std::move(what);
     total_ = total;
     done_ = 0;
@@ -76,13 +93,8 @@ void Progress::Look() {
     }
     last_ = now;
     if (fd_ >= 0) {
-        std::string name = what_;
-        std::replace(name.begin(), name.end(), ' ', '.');
-        const std::string line = fmt::format("{} {} {}\n", name, done_, total_);
         // A reader that went away is no reason to stop the work.
-        if (write(fd_, line.data(), line.size()) < 0) {
-            fd_ = -1;
-        }
+        fd_ = Report(fd_, what_, done_, total_) ? fd_ : -1;
     }
     const double seconds = std::chrono::duration<double>(now - start_).count();
     if (onTerminal_ && seconds >= 1.0) {

@@ -183,12 +183,6 @@ void FinishTarget(const Invocation& call, const TargetOptions& options, ImageVol
         if (status != kOk) {
             ThrowFailed(options.Subject(call),
                         "the last changes could not be kept: " + StatusWithCode(status), "");
-            const bool isTooMuch = status == kErrVolumeJournal;
-            ThrowFailed(
-                options.Subject(call),
-                "the last changes could not be kept: " +
-                    (isTooMuch ? "they are more than the journal holds" : StatusWithCode(status)),
-                isTooMuch ? "flush more often" : "");
         }
     }
     if (!options.saveFile.empty()) {

@@ -46,10 +46,10 @@ def build(image, *options):
     lines = []
     item = 1000
     for number in range(16, 26):
-        lines += ["flush", "insert 2:%s folder{id:%d,valence:%d}" % (quoted("Folder %d" % number), number,
-                                                            len(names[number])),
-                  "insert %d:\"\" thread{parent:2,name:%s}" % (number,
-                                                              quoted("Folder %d" % number))]
+        name = quoted("Folder %d" % number)
+        lines += ["flush",
+                  "insert 2:%s folder{id:%d,valence:%d}" % (name, number, len(names[number])),
+                  "insert %d:\"\" thread{parent:2,name:%s}" % (number, name)]
     for parent, each in names.items():
         for name in each:
             item += 1
@@ -58,7 +58,8 @@ def build(image, *options):
                       "insert %d:\"\" thread-file{parent:%d,name:%s}" % (item, parent,
                                                                        quoted(name))]
     ask("format", image, "--size", "4M", "--node-size", "1024", "--with-attributes", "--date",
-        "2026-11-21", "--catalog-size", "512K", "--uuid", "5ec7e7", "--name", "Secret Volume", *options)
+        "2026-11-21", "--catalog-size", "512K", "--uuid", "5ec7e7", "--name", "Secret Volume",
+        *options)
     lines += ["use attributes", 'insert 1001:"com.secret.tag" inline{"the secret value"}',
               'insert 1001:"com.secret.other" inline{"more of it"}']
     ask("apply", image, script("fill.tr", lines), "--write", "-q")

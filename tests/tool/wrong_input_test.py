@@ -166,8 +166,8 @@ for (command, image), (code, out, err) in found.items():
         checks.equal(err, "", what + ": standard error")
     elif text is not None:
         checks.check(text in err, "%s: %r is not in %r" % (what, text, err))
-    checks.check(code in (0, 1, 4) or len(err.splitlines()) == (text != ""), "%s: more than one line: %s"
-                 % (what, err))
+    checks.check(code in (0, 1, 4) or len(err.splitlines()) == (text != ""),
+                 "%s: more than one line: %s" % (what, err))
 for image, row in DAMAGED.items():
     checks.equal(sorted(set(IMAGE_COMMANDS) - set(row) - {"undo"}), [],
                  image + ": commands left out")
