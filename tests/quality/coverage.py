@@ -112,6 +112,11 @@ class Source:
             self.texts[name] = text.splitlines()
         return self.texts[name][number - 1].strip()
 
+    def occurrence(self, name, number):
+        """1 where the text of this line stands in its file for the first time, and so on."""
+        code = self.line(name, number)
+        return sum(1 for text in self.texts[name][:number] if text.strip() == code)
+
 
 def unreachable_sites():
     """Sites that sites_reached.py says nothing leads to."""
@@ -128,7 +133,9 @@ def judge(files, excuses, sites, source):
         for (number, index), count in sorted(files[name].outcomes.items()):
             code = source.line(name, number)
             place = f"{name}:{number}: outcome {index} of: {code}"
-            why = excuses.find(name.removeprefix(ENGINE), code, str(index))
+            short = name.removeprefix(ENGINE)
+            why = (excuses.find(short, code, str(index)) or
+                   excuses.find(f"{short}#{source.occurrence(name, number)}", code, str(index)))
             if count and why is not None:
                 complaints.append(f"{place}\n    was seen, although engine.list says: {why}")
             elif not count and why is None:

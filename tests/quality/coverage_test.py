@@ -47,6 +47,11 @@ class Judge(unittest.TestCase):
         complaints, _ = self.judge([1, 2, 3, 4], LINE + "    3: b is never negative\n")
         self.assertIn("was seen, although engine.list says: b is never negative", complaints[0])
 
+    def test_one_of_several_equal_lines_can_be_meant(self):
+        listed = LINE.replace("a.cpp:", "a.cpp#%d:") + "    3: b is never negative\n"
+        self.assertEqual(self.judge([1, 2, 0, 4], listed % 1), ([], 1))
+        self.assertEqual(len(self.judge([1, 2, 0, 4], listed % 2)[0]), 2)
+
     def test_a_listed_line_that_is_not_there_is_named(self):
         complaints, _ = self.judge([1, 2, 3, 4], "a.cpp: return 7;\n    1: gone\n")
         self.assertEqual(complaints, ["a.cpp: no outcome 1 of: return 7;"])
