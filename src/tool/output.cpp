@@ -8,6 +8,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <utility>
 
 #include "tool/errors.h"
 #include "tool/progress.h"
@@ -57,7 +58,7 @@ void Output::OpenFile(const std::string& path, const std::string& image, bool re
     if (exists && !replace) {
         ToolError error;
         error.problem = Failure(path + " exists", "--force replaces it");
-        throw error;
+        throw ToolError(std::move(error));
     }
     if (exists && !S_ISREG(present.st_mode)) {
         ThrowFailed(path, "is not a regular file", "choose another name");

@@ -4,7 +4,8 @@
         what: why
 
 `what` says which of the things on that line is meant; a line that stands more than once in the
-file is meant wherever it stands, or with file.cpp#2 only where it stands the second time. An empty line or one that starts with # says nothing."""
+file is meant wherever it stands, or with file.cpp#2 only where it stands the second time. An
+empty line or one that starts with # says nothing."""
 
 import pathlib
 
