@@ -10,7 +10,7 @@ add_library(treehfs_api_engine INTERFACE)
 target_link_libraries(treehfs_api_engine INTERFACE treehfs hfs_convert hfs_names velk_platform)
 add_library(treehfs_api_host INTERFACE)
 target_link_libraries(treehfs_api_host
-  INTERFACE treehfs_api_engine $<LINK_GROUP:RESCAN,treehfs,velk_host>)
+  INTERFACE treehfs_api_engine $<LINK_GROUP:RESCAN,treehfs::treehfs,treehfs::velk_host>)
 add_library(treehfs_api_volume INTERFACE)
 target_link_libraries(treehfs_api_volume
   INTERFACE hfs_records hfs_volume hfs_check treehfs_api_host)

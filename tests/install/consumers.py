@@ -77,7 +77,8 @@ class Step:
         image = self.image()
 
         def flags(name):
-            return self.run("pkg-config", "--define-prefix", "--cflags", "--libs", name,
+            return self.run("pkg-config", f"--define-variable=prefix={self.prefix}", "--cflags",
+                            "--libs", name,
                             PKG_CONFIG_PATH=str(folder)).split()
 
         program = self.work / "by_pkgconfig"
