@@ -1,4 +1,5 @@
 // format: a new volume in a file, its trees made by the engine.
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include "hfs/records/text_format.h"
@@ -31,7 +32,8 @@ struct FormatArguments {
 
     void Declare(Invocation* call) {
         OptionSet& options = call->options;
-        options.Size("--size", &size, "BYTES", "of the volume: 64M; needed unless the file exists");
+        options.Size("--size", &size, "BYTES",
+                     "of the volume: 64M; not for a device, which it fills");
         options.Text("--name", &name, "NAME", "of the volume (Untitled)");
         options.Size("--block-size", &blockSize, "BYTES", "allocation block, 512 to 65536 (4096)");
         options.Text("--node-size", &nodeSizes, "BYTES",
@@ -46,7 +48,7 @@ struct FormatArguments {
         options.Text("--uuid", &uuid, "HEX", "volume identifier of 16 digits (random)");
         options.Choice("--wrap", &wrap, {"none", "apm", "gpt"},
                        "a partition map around the volume, which makes the file a little larger");
-        options.Flag("--force", &call->force, "replace a file that exists");
+        options.Flag("--force", &call->force, "replace a file that exists, or what a device holds");
     }
 };
 
@@ -69,7 +71,6 @@ FormatOptions OptionsOf(const FormatArguments& arguments) {
     options.withAttributes = arguments.withAttributes;
     options.withRoot = !arguments.empty;
     options.journalSize = arguments.journal.value_or(0);
-    options.deviceIsZero = true;
     ReadNodeSizes(arguments.nodeSizes, &options);
     options.date = arguments.date.empty() ? HfsNow() : ReadDate(arguments.date);
     options.uuid = arguments.uuid.empty() ? RandomUuid() : ReadUuid(arguments.uuid);
@@ -90,38 +91,66 @@ std::string TreeSentence(ImageVolume* volume, u32 fileId) {
                        Grouped(tree->header.nodeSize));
 }
 
+bool IsBlockDevice(const std::string& path) {
+    struct stat info;
+    return stat(path.c_str(), &info) == 0 && S_ISBLK(info.st_mode);
+}
+
+// Opens the device, or makes the file.
+std::unique_ptr<FileDevice> OpenPlace(const Invocation& call, WrapScheme scheme,
+                                      const std::optional<u64>& size) {
+    Problem problem;
+    if (!IsBlockDevice(call.image) && !size) {
+        ThrowUsage("format", "how large is the volume to be?", "give --size, for example 64M");
+    }
+    if (size && *size < kSmallestVolume) {
+        ThrowUsage("format", fmt::format("--size {} is too small", Grouped(*size)),
+                   "a volume takes 64K at least");
+    }
+    std::unique_ptr<FileDevice> device = FileDevice::Open(
+        call.image, FileDevice::Mode::kCreate, size ? WrappedSize(scheme, *size) : 0, &problem);
+    if (!device) {
+        ThrowProblem(call.image, problem);
+    }
+    if (size && device->Size() != WrappedSize(scheme, *size)) {
+        ThrowUsage("format",
+                   fmt::format("--size {}: the device {} has {} bytes", Grouped(*size), call.image,
+                               Grouped(device->Size())),
+                   "leave it out: the volume takes all of a device");
+    }
+    return device;
+}
+
 int RunFormat(Invocation* call) {
     FormatArguments arguments;
-    call->options.Argument("IMAGE", &call->image, "file to make");
+    call->options.Argument("IMAGE", &call->image, "file to make, or block device");
     arguments.Declare(call);
     call->Parse();
     const bool exists = access(call->image.c_str(), F_OK) == 0;
+    const bool isDevice = IsBlockDevice(call->image);
     if (exists && !call->force) {
-        ThrowFailed("", call->image + " exists", "--force replaces it");
+        ThrowFailed("", call->image + (isDevice ? " is a device" : " exists"),
+                    isDevice ? "--force replaces what it holds" : "--force replaces it");
     }
-    if (!arguments.size) {
-        ThrowUsage("format", "how large is the volume to be?", "give --size, for example 64M");
-    }
-    if (*arguments.size < kSmallestVolume) {
-        ThrowUsage("format", fmt::format("--size {} is too small", Grouped(*arguments.size)),
-                   "a volume takes 64K at least");
-    }
-    const FormatOptions options = OptionsOf(arguments);
+    FormatOptions options = OptionsOf(arguments);
+    options.deviceIsZero = !isDevice;
     Problem problem;
     const WrapScheme scheme = arguments.wrap == "apm"   ? WrapScheme::kApm
                               : arguments.wrap == "gpt" ? WrapScheme::kGpt
                                                         : WrapScheme::kNone;
-    std::unique_ptr<BlockDevice> device = FileDevice::Open(
-        call->image, FileDevice::Mode::kCreate, WrappedSize(scheme, *arguments.size), &problem);
-    if (!device) {
-        ThrowProblem(call->image, problem);
+    if (isDevice && scheme != WrapScheme::kNone) {
+        ThrowUsage("format", "--wrap makes a map in a file, not on a device",
+                   "name a partition of the device");
     }
-    const IoResult mapped =
-        WriteMap(scheme, device.get(), {*arguments.size, options.caseSensitive, options.uuid});
-    if (!mapped.Ok()) {
-        ThrowFailed(call->image, "cannot write: " + IoErrorText(mapped.error), "");
+    std::unique_ptr<BlockDevice> device = OpenPlace(*call, scheme, arguments.size);
+    if (!isDevice) {
+        const IoResult mapped =
+            WriteMap(scheme, device.get(), {*arguments.size, options.caseSensitive, options.uuid});
+        if (!mapped.Ok()) {
+            ThrowFailed(call->image, "cannot write: " + IoErrorText(mapped.error), "");
+        }
+        device = VolumeWithin(scheme, std::move(device), *arguments.size);
     }
-    device = VolumeWithin(scheme, std::move(device), *arguments.size);
     const std::unique_ptr<ImageVolume> volume = MakeVolume(std::move(device), options, &problem);
     if (!volume) {
         if (!exists) {
@@ -144,7 +173,8 @@ const Command kFormatCommand = {
     "format",
     "IMAGE --size BYTES",
     "a new volume whose trees the engine makes",
-    "With --date and --uuid two runs give identical bytes.",
+    "IMAGE is a file to make, or a block device. With --date and --uuid two runs give identical "
+    "bytes.",
     {"format new.img --size 64M --name Test",
      "format new.img --size 1G --node-size c=8192,e=4096,a=8192 --with-attributes",
      "format new.img --size 16M --case-sensitive --date 2026-11-21T00:00:00Z --uuid 1"},

@@ -76,9 +76,11 @@ public:
 
     u32 NodeSize() const { return nodeSize_; }
 
-    // The tree that the header names, made where it is missing.
-    void OpenTree(ImageVolume* volume) {
+    // The tree that the header names, made where it is missing. `isWritten`: what is committed
+    // reaches the image.
+    void OpenTree(ImageVolume* volume, bool isWritten) {
         volume_ = volume;
+        isWritten_ = isWritten;
         if (!volume_->HasTree(fileId_)) {
             const int status = volume_->CreateTree(fileId_, Log2Of(nodeSize_), nullptr);
             if (status != kOk) {
@@ -131,8 +133,12 @@ public:
     CBTreeHfs* Tree() const { return tree_; }
 
 private:
+    // Says up to where the image has the records, where it has any of them.
     [[noreturn]] void Wrong(const std::string& what) const {
-        ThrowFailed(source_, "line " + std::to_string(reader_.Number()) + ": " + what, "");
+        ThrowFailed(source_, "line " + std::to_string(reader_.Number()) + ": " + what,
+                    volume_ == nullptr              ? ""
+                    : keptLine_ == 0 || !isWritten_ ? "nothing was kept"
+                                                    : "kept up to line " + Grouped(keptLine_));
     }
 
     static u32 Log2Of(u32 size) {
@@ -185,18 +191,23 @@ private:
         }
         if (status != kOk) {
             volume_->RestoreAfter(status);
-            Wrong(StatusWithCode(status) + "; what was put in since the last batch is dropped");
+            Wrong(StatusText(status));
         }
         ++sinceFlush_;
         volume_->TrimCache();
-        if (sinceFlush_ >= batch_) {
-            sinceFlush_ = 0;
-            status = volume_->Commit(0);
-            if (status != kOk) {
-                Wrong("the batch could not be kept: " + StatusWithCode(status));
-            }
+        if (sinceFlush_ >= batch_ || volume_->IsCommitDue()) {
+            KeepBatch();
         }
         return true;
+    }
+
+    void KeepBatch() {
+        const int status = volume_->Commit(0);
+        if (status != kOk) {
+            Wrong("the changes could not be kept: " + CommitProblem(volume_, status).Text());
+        }
+        sinceFlush_ = 0;
+        keptLine_ = reader_.Number();
     }
 
     int Insert(const SearchKey& key, const std::vector<u8>& stored) {
@@ -235,6 +246,7 @@ private:
     }
 
     ImageVolume* volume_ = nullptr;
+    bool isWritten_ = false;
     const Invocation& call_;
     LineReader reader_;
     std::string source_;
@@ -248,6 +260,7 @@ private:
     ImportCounts counts_;
     std::string sourceDigest_;
     u64 sinceFlush_ = 0;
+    u64 keptLine_ = 0;  // the last one whose record a commit has kept
 };
 
 int Report(Invocation* call, const Importer& importer, bool isComplete) {
@@ -324,7 +337,7 @@ int Run(Invocation* call) {
                       std::max<u64>(1, batch.value_or(kDefaultBatch)));
     const std::unique_ptr<ImageVolume> volume = OpenForNodes(call, &target, importer.NodeSize());
     const u64 before = volume->HandedOverBlocks();
-    importer.OpenTree(volume.get());
+    importer.OpenTree(volume.get(), target.write);
     const bool isComplete = importer.Run();
     const int exitCode = Report(call, importer, isComplete);
     call->out.Flush();

@@ -51,6 +51,25 @@ bool ChangesTree(ScriptOp op) {
     }
 }
 
+// Whether nothing such an operation does depends on where the tree stands.
+bool IgnoresPosition(ScriptOp op, u32 count) {
+    switch (op) {
+        case ScriptOp::kUse:
+        case ScriptOp::kInsert:
+        case ScriptOp::kReplace:
+        case ScriptOp::kFind:
+        case ScriptOp::kSeek:
+        case ScriptOp::kGoto:
+            return true;
+        case ScriptOp::kUpdate:
+            return count == 2;
+        case ScriptOp::kDelete:
+            return count == 1;
+        default:
+            return false;
+    }
+}
+
 // The key of the item that a stored thread record names.
 bool KeyOfThread(const std::vector<u8>& thread, SearchKey* key) {
     const RecordKind* kind =
@@ -171,6 +190,13 @@ int ScriptRunner::TakeKey(std::string_view word, SearchKey* key) {
 ScriptRunner::Outcome ScriptRunner::Execute(ScriptOp op, const std::string_view* words, u32 count) {
     if (ChangesTree(op) && !volume_->IsWritable()) {
         return {kErrVolumeReadOnly, " readonly=yes"};
+    }
+    // A commit lets go of positions, so it waits for an operation that needs none.
+    if (IgnoresPosition(op, count) && volume_->IsCommitDue()) {
+        const Outcome kept = KeepAll(0);
+        if (kept.status != kOk) {
+            return kept;
+        }
     }
     switch (op) {
         case ScriptOp::kUse:

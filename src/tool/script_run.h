@@ -74,6 +74,8 @@ private:
     // After a changing operation: takes the volume back if `status` says so.
     void Settle(Outcome* outcome);
     void NoteRestored(Outcome* outcome) const;
+    // Commits; on failure the volume is back at the last commit.
+    Outcome KeepAll(unsigned long mode);
     int TakeKey(std::string_view word, SearchKey* key);
 
     // script_change.cpp

@@ -3,6 +3,7 @@
 
 #include "tool/command.h"
 #include "tool/script_run.h"
+#include "tool/script_volume.h"
 #include "tool/script_words.h"
 
 namespace VELK::tool {
@@ -72,16 +73,23 @@ ScriptRunner::Outcome ScriptRunner::Extend(const std::string_view* words, u32 co
     return outcome;
 }
 
-ScriptRunner::Outcome ScriptRunner::Flush(u32 count) {
-    const u64 before = volume_->HandedOverBlocks();
+ScriptRunner::Outcome ScriptRunner::KeepAll(unsigned long mode) {
     Outcome outcome;
-    outcome.status = volume_->Commit(count != 0 ? 4 : 0);
-    outcome.fields = fmt::format(" written={}", volume_->HandedOverBlocks() - before);
+    outcome.status = volume_->Commit(mode);
     if (outcome.status != kOk) {
         // The commit has restored already; what was reserved went with it.
         held_.clear();
         NoteRestored(&outcome);
+        Remark("the changes could not be kept: " + CommitProblem(volume_, outcome.status).Text());
     }
+    return outcome;
+}
+
+ScriptRunner::Outcome ScriptRunner::Flush(u32 count) {
+    const u64 before = volume_->HandedOverBlocks();
+    Outcome outcome = KeepAll(count != 0 ? 4 : 0);
+    outcome.fields =
+        fmt::format(" written={}", volume_->HandedOverBlocks() - before) + outcome.fields;
     return outcome;
 }
 

@@ -9,6 +9,7 @@
 #include "hfs/volume/make_volume.h"
 #include "tool/errors.h"
 #include "tool/options.h"
+#include "tool/text_format.h"
 #include "tool/undo_file.h"
 
 namespace VELK::tool {
@@ -104,6 +105,19 @@ void Save(const TargetOptions& options, ImageVolume* volume) {
     }
 }
 
+// What a person should know before changes are made: among it what was done to the journal.
+void TellNotes(const std::string& image, const ImageVolume& volume) {
+    for (const Problem& note : volume.Notes()) {
+        PrintNote(image, note);
+    }
+    const u32 replayed = volume.Journal().replayed;
+    if (replayed != 0) {
+        PrintNote(image, Failure(fmt::format("the journal held {}",
+                                             Counted(replayed, "transaction", "transactions")),
+                                 "carried out before anything else"));
+    }
+}
+
 }  // namespace
 
 void TargetOptions::Declare(Invocation* call) {
@@ -172,7 +186,15 @@ std::unique_ptr<ImageVolume> OpenTarget(const Invocation& call, const TargetOpti
     if (!volume) {
         ThrowProblem(call.image, problem);
     }
+    if (!call.quiet) {
+        TellNotes(call.image, *volume);
+    }
     return volume;
+}
+
+Problem CommitProblem(ImageVolume* volume, int status) {
+    const Problem& io = volume->LastIoProblem();
+    return io && io.status == status ? io : Failure(StatusText(status), "");
 }
 
 void FinishTarget(const Invocation& call, const TargetOptions& options, ImageVolume* volume,
@@ -181,8 +203,9 @@ void FinishTarget(const Invocation& call, const TargetOptions& options, ImageVol
     if (keeps && volume->IsWritable()) {
         const int status = volume->Commit(0);
         if (status != kOk) {
-            ThrowFailed(options.Subject(call),
-                        "the last changes could not be kept: " + StatusWithCode(status), "");
+            Problem problem = CommitProblem(volume, status);
+            problem.what = "the last changes could not be kept: " + problem.what;
+            ThrowProblem(options.Subject(call), problem);
         }
     }
     if (!options.saveFile.empty()) {

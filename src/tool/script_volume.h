@@ -28,6 +28,9 @@ struct TargetOptions {
 // Throws a ToolError when there is no such volume, or when changing it would be unsafe.
 std::unique_ptr<ImageVolume> OpenTarget(const Invocation& call, const TargetOptions& options);
 
+// Why a commit failed: what the volume says of its medium or its journal, else the status.
+Problem CommitProblem(ImageVolume* volume, int status);
+
 // After the last operation: keeps the changes of a volume that is written to or saved, writes the
 // copy, and says what becomes of changes that nothing keeps.
 void FinishTarget(const Invocation& call, const TargetOptions& options, ImageVolume* volume,

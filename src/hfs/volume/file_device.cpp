@@ -7,10 +7,10 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdio>
 #include <cstring>
 
 #include "hfs/volume/block_device.h"
+#include "hfs/volume/host_use.h"
 
 #if defined(__linux__)
 #include <linux/fs.h>
@@ -33,7 +33,9 @@ std::string IoErrorText(int error) {
 
 namespace {
 
-constexpr HostCalls kHostCalls = {pread, pwrite, fsync};
+// Of a file's own attributes only the size matters to whoever reads it later, and that is kept by
+// fdatasync; times are not worth a write of their own for every commit.
+constexpr HostCalls kHostCalls = {pread, pwrite, fdatasync};
 const HostCalls* g_calls = &kHostCalls;
 
 Problem CannotOpen(int error) {
@@ -85,29 +87,6 @@ bool SizeOf(int handle, u64* size, bool* isFile, Problem* problem) {
 
 namespace {
 
-// Where a block device is mounted, empty when nowhere (or when the host does not tell).
-std::string MountPoint(const std::string& path) {
-    struct stat device;
-    std::string found;
-    std::FILE* table = stat(path.c_str(), &device) == 0 && S_ISBLK(device.st_mode)
-                           ? std::fopen("/proc/self/mounts", "re")
-                           : nullptr;
-    if (table == nullptr) {
-        return found;
-    }
-    char source[512];
-    char target[512];
-    struct stat mounted;
-    while (found.empty() && std::fscanf(table, "%511s %511s%*[^\n]", source, target) == 2) {
-        if (stat(source, &mounted) == 0 && S_ISBLK(mounted.st_mode) &&
-            mounted.st_rdev == device.st_rdev) {
-            found = target;
-        }
-    }
-    std::fclose(table);
-    return found;
-}
-
 // A device that will be written must be ours alone.
 Problem Claim(int handle) {
     if (flock(handle, LOCK_EX | LOCK_NB) == 0) {
@@ -119,34 +98,56 @@ Problem Claim(int handle) {
     return errno == ENOLCK || errno == EOPNOTSUPP ? Problem{} : CannotOpen(errno);
 }
 
-// Empties a file and gives it `size` bytes of zeros.
-Problem SetFreshSize(int handle, u64 size) {
-    if (ftruncate(handle, 0) == 0 && ftruncate(handle, static_cast<off_t>(size)) == 0) {
-        return {};
+// Empties a file and gives it `size` bytes of zeros, which are there after a cut, and so is its
+// name: what is written into it later could not be found otherwise.
+Problem SetFreshSize(int handle, const std::string& path, u64 size) {
+    if (ftruncate(handle, 0) != 0 || ftruncate(handle, static_cast<off_t>(size)) != 0) {
+        return Failure(std::string("cannot set the size: ") + std::strerror(errno), "");
     }
-    return Failure(std::string("cannot set the size: ") + std::strerror(errno), "");
+    if (fsync(handle) != 0) {
+        return Failure(std::string("cannot sync: ") + std::strerror(errno), "");
+    }
+    const std::size_t slash = path.find_last_of('/');
+    const std::string folder = slash == std::string::npos ? "." : path.substr(0, slash + 1);
+    const int folderHandle = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    if (folderHandle >= 0) {
+        fsync(folderHandle);  // not every file system can: then there is nothing to do
+        close(folderHandle);
+    }
+    return {};
+}
+
+Problem OpenProblem(int error, bool isBlockDevice) {
+    if (error == EISDIR) {
+        return Failure("is a folder", "name an image file or a block device");
+    }
+    // A device, or a part of it, that is mounted, swapped to or part of something larger.
+    return error == EBUSY && isBlockDevice ? Failure("in use by the system", "release it first")
+                                           : CannotOpen(error);
 }
 
 }  // namespace
 
 std::unique_ptr<FileDevice> FileDevice::Open(const std::string& path, Mode mode, u64 size,
                                              Problem* problem) {
+    struct stat before;
+    const bool exists = stat(path.c_str(), &before) == 0;
+    const bool isBlockDevice = exists && S_ISBLK(before.st_mode);
     // Non-blocking: a FIFO must not hold us up before it is refused.
     int flags = O_CLOEXEC | O_NONBLOCK | (mode == Mode::kRead ? O_RDONLY : O_RDWR);
-    if (mode == Mode::kCreate) {
+    if (mode == Mode::kCreate && !isBlockDevice) {
         flags |= O_CREAT;
     }
     if (mode != Mode::kRead) {
-        const std::string mounted = MountPoint(path);
-        if (!mounted.empty()) {
-            *problem = Failure("mounted on " + mounted, "unmount it first");
+        flags |= isBlockDevice ? O_EXCL : 0;
+        *problem = exists ? CheckNotInUse(before, HostTables{}) : Problem{};
+        if (*problem) {
             return nullptr;
         }
     }
     const int handle = open(path.c_str(), flags, 0666);
     if (handle < 0) {
-        *problem = errno == EISDIR ? Failure("is a folder", "name an image file or a block device")
-                                   : CannotOpen(errno);
+        *problem = OpenProblem(errno, isBlockDevice);
         return nullptr;
     }
     std::unique_ptr<FileDevice> device(new FileDevice(handle, 0, mode != Mode::kRead));
@@ -155,7 +156,7 @@ std::unique_ptr<FileDevice> FileDevice::Open(const std::string& path, Mode mode,
     }
     *problem = mode != Mode::kRead ? Claim(handle) : Problem{};
     if (!*problem && mode == Mode::kCreate && device->isFile_) {
-        *problem = SetFreshSize(handle, size);
+        *problem = SetFreshSize(handle, path, size);
         device->size_ = size;
     }
     return *problem ? nullptr : std::move(device);

@@ -45,9 +45,9 @@ inline u32 MappedBlocks(const HfsRuns& runs) {
 }
 
 // Appends the extents of one record to `runs` at fork block `*next`, which moves on. Stops at the
-// first unused extent. False: an extent leaves the volume, the fork would hold more than `limit`
-// blocks, or out of memory; `runs` then keeps what was appended.
-bool AppendExtents(HfsRuns* runs, const HfsExtent* extents, u32 totalBlocks, u32 limit, u32* next);
+// first unused extent. kErrInvalid: an extent leaves the volume, or the fork would hold more than
+// `limit` blocks; `runs` then keeps what was appended. Else 0 or kErrNoMemory.
+int AppendExtents(HfsRuns* runs, const HfsExtent* extents, u32 totalBlocks, u32 limit, u32* next);
 
 // Sets the fork's eight extents from its runs; the rest belongs to overflow records.
 void SetInlineExtents(const HfsRuns& runs, HfsFork* fork);

@@ -161,8 +161,12 @@ u64 ImageVolume::HandedOverBlocks() const {
 }
 
 bool ImageVolume::IsCommitDue() const {
-    return state_->journalSink != nullptr &&
-           state_->grantedBytes >= state_->journalSink->Largest() / 2;
+    if (state_->journalSink == nullptr || state_->grantedBytes == 0) {
+        return false;
+    }
+    const u64 most = state_->journalSink->Largest();
+    return state_->grantedBytes >= most / 2 ||
+           state_->grantedBytes + state_->LargestOperation() >= most;
 }
 
 u64 ImageVolume::CommittedBytes() const {

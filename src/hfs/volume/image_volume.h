@@ -145,8 +145,9 @@ public:
     void SetModifyDate(u32 date);  // seconds since 1904; written with the next commit
     u64 HandedOverBlocks() const;  // map blocks the trees have handed over since mount
     u64 CommittedBytes() const;    // bytes that commits have written since mount
-    // Whether the changes since the last commit take half of what the journal holds, or more: time
-    // to commit. Never without a journal.
+    // Whether the changes since the last commit take half of what the journal holds, or so much
+    // that an operation on one record may no longer fit beside them: time to commit. Never without
+    // a journal.
     bool IsCommitDue() const;
 
     // Writes the whole image as it stands after the last commit.

@@ -259,26 +259,36 @@ IoResult JournalSink::Carry(const OverlayDevice& staged, BlockDevice* home, u64*
     return result;
 }
 
+// A volume whose journal was carried out may say that it is in use although nothing was committed.
 IoResult JournalSink::Finish(BlockDevice* home) {
-    if (!hasBegun_ || hasFailed_) {
+    if (hasFailed_ || (!hasBegun_ && !options_.endsClean)) {
         return {};
     }
-    hasBegun_ = false;
-    u8 header[kHeaderSize];
-    IoResult result = Empty(home);
+    IoResult result;
+    if (hasBegun_) {
+        result = Empty(home);
+        hasBegun_ = false;
+    }
     if (result.Ok() && options_.endsClean) {
-        result = home->Read(HeaderOffset(), header, sizeof header);
-        if (result.Ok()) {
-            u8* attributes = header + kAttributesInHeader;
-            StoreBe32(attributes, Be32(attributes) | kVolUnmounted);
-            result = home->Write(HeaderOffset(), header, sizeof header);
-        }
-        if (result.Ok()) {
-            result = home->Sync();
-        }
+        result = MarkClean(home);
     }
     hasFailed_ = !result.Ok();
     return result;
+}
+
+IoResult JournalSink::MarkClean(BlockDevice* home) {
+    u8 header[kHeaderSize];
+    IoResult result = home->Read(HeaderOffset(), header, sizeof header);
+    if (!result.Ok()) {
+        return result;
+    }
+    const u32 attributes = Be32(header + kAttributesInHeader);
+    if ((attributes & kVolUnmounted) != 0) {
+        return result;
+    }
+    StoreBe32(header + kAttributesInHeader, attributes | kVolUnmounted);
+    result = home->Write(HeaderOffset(), header, sizeof header);
+    return result.Ok() ? home->Sync() : result;
 }
 
 }  // namespace VELK

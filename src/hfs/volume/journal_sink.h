@@ -41,6 +41,7 @@ private:
     IoResult Begin(BlockDevice* home, u64* bytesWritten);
     IoResult Initialise(BlockDevice* home);
     IoResult Empty(BlockDevice* home);
+    IoResult MarkClean(BlockDevice* home);
     IoResult Log(const OverlayDevice& staged, const std::vector<Stretch>& stretches,
                  BlockDevice* home, u64* bytesWritten);
     IoResult WriteHome(const OverlayDevice& staged, const std::vector<Stretch>& stretches,

@@ -59,22 +59,6 @@ std::vector<u8> ThreadRecord(const std::u16string& name) {
     return record;
 }
 
-// Sets the journal bit and the info block in the header at `offset`.
-IoResult Announce(BlockDevice* device, u64 offset, u32 infoBlock) {
-    u8 bytes[kHeaderSize];
-    IoResult result = device->Read(offset, bytes, sizeof bytes);
-    if (result.Ok()) {
-        VolumeHeader header;
-        DecodeHeader(bytes, &header);
-        header.attributes |= kVolJournaled;
-        header.journalInfoBlock = infoBlock;
-        header.lastMountedVersion = kKeeperCode;
-        EncodeHeader(header, bytes);
-        result = device->Write(offset, bytes, sizeof bytes);
-    }
-    return result;
-}
-
 }  // namespace
 
 int InsertJournalFiles(
@@ -111,15 +95,6 @@ IoResult StartJournal(BlockDevice* device, const JournalBlocks& blocks, u32 bloc
     }
     if (result.Ok()) {
         result = WriteJournalHeader(device, place);
-    }
-    if (result.Ok()) {
-        result = device->Sync();
-    }
-    if (result.Ok()) {
-        result = Announce(device, device->Size() - kAltHeaderFromEnd, blocks.first);
-    }
-    if (result.Ok()) {
-        result = Announce(device, kHeaderOffset, blocks.first);
     }
     return result.Ok() ? device->Sync() : result;
 }

@@ -28,8 +28,8 @@ int InsertJournalFiles(
     const JournalBlocks& blocks, u32 blockSize, u32 date,
     const std::function<int(u32, const std::u16string&, const std::vector<u8>&)>& insert);
 
-// Writes info block and journal header and, when they are on the medium, announces the journal in
-// both volume headers. REQUIRES: the volume begins with the device.
+// Writes info block and journal header and syncs them; no volume header names them yet.
+// REQUIRES: the volume begins with the device.
 IoResult StartJournal(BlockDevice* device, const JournalBlocks& blocks, u32 blockSize);
 
 }  // namespace VELK

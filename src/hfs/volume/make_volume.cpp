@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "hfs/volume/convert.h"
+#include "hfs/volume/journal_format.h"
 #include "hfs/volume/make_journal.h"
 #include "hfs/volume/volume_header.h"
 #include "hfs/volume/wire.h"
@@ -83,7 +84,7 @@ Problem MakePlan(u64 size, const FormatOptions& options, Plan* plan) {
     const u64 blockSize = options.blockSize;
     header.signature = options.caseSensitive ? kSignatureHfsx : kSignatureHfsPlus;
     header.version = options.caseSensitive ? kVersionHfsx : kVersionHfsPlus;
-    header.attributes = kVolUnmounted;
+    header.attributes = 0;  // in the making: a cut leaves a volume that nobody takes for whole
     header.createDate = options.date;
     header.modifyDate = options.date;
     header.checkedDate = options.date;
@@ -128,15 +129,20 @@ Problem MakePlan(u64 size, const FormatOptions& options, Plan* plan) {
     return {};
 }
 
+// What the device held before is gone, and known to be gone, before anything else of it is written
+// over.
 IoResult WritePlan(BlockDevice* device, const Plan& plan) {
     u8 bytes[kHeaderSize];
     EncodeHeader(plan.header, bytes);
     const u64 size = device->Size();
     const u64 bitmapAt =
         u64{plan.header.allocationFile.extents[0].startBlock} * plan.header.blockSize;
-    IoResult result = device->Zero(0, kHeaderOffset);
+    IoResult result = device->Zero(0, kHeaderOffset + kHeaderSize);
     if (result.Ok()) {
         result = device->Zero(size - kAltHeaderFromEnd, kAltHeaderFromEnd);
+    }
+    if (result.Ok()) {
+        result = device->Sync();
     }
     if (result.Ok()) {
         result = device->Write(bitmapAt, plan.bitmap.data(), plan.bitmap.size());
@@ -148,6 +154,41 @@ IoResult WritePlan(BlockDevice* device, const Plan& plan) {
         result = device->Write(kHeaderOffset, bytes, sizeof bytes);
     }
     return result;
+}
+
+// Makes the header at `offset` that of a whole volume, with its journal if it has one.
+IoResult Proclaim(BlockDevice* device, u64 offset, const JournalBlocks& journal) {
+    u8 bytes[kHeaderSize];
+    const IoResult result = device->Read(offset, bytes, sizeof bytes);
+    if (!result.Ok()) {
+        return result;
+    }
+    VolumeHeader header;
+    DecodeHeader(bytes, &header);
+    header.attributes |= kVolUnmounted;
+    if (journal.count != 0) {
+        header.attributes |= kVolJournaled;
+        header.journalInfoBlock = journal.first;
+        header.lastMountedVersion = kKeeperCode;
+    }
+    EncodeHeader(header, bytes);
+    return device->Write(offset, bytes, sizeof bytes);
+}
+
+// Everything a volume needs is there: its journal, then its headers.
+// REQUIRES: what was written so far is synced.
+IoResult Complete(BlockDevice* device, const JournalBlocks& journal, u32 blockSize) {
+    IoResult result;
+    if (journal.count != 0) {
+        result = StartJournal(device, journal, blockSize);
+    }
+    if (result.Ok()) {
+        result = Proclaim(device, device->Size() - kAltHeaderFromEnd, journal);
+    }
+    if (result.Ok()) {
+        result = Proclaim(device, kHeaderOffset, journal);
+    }
+    return result.Ok() ? device->Sync() : result;
 }
 
 // Zeroes the blocks of a tree file on the device itself. They belong to nobody yet, so this need
@@ -277,63 +318,57 @@ Problem WriteProblem(const IoResult& result) {
                                    "");
 }
 
+// `isWhole`: it has been completed.
 std::unique_ptr<ImageVolume> MountNew(std::unique_ptr<BlockDevice> device,
-                                      const FormatOptions& options, Problem* problem) {
+                                      const FormatOptions& options, bool isWhole,
+                                      Problem* problem) {
     OpenOptions open;
+    open.force = !isWhole;
     open.access = Access::kWrite;
     open.offset = 0;
     open.mapBlockSize = options.mapBlockSize != 0 ? options.mapBlockSize : SmallestNode(options);
     return ImageVolume::Open(std::move(device), open, nullptr, problem);
 }
 
-// Mounts `device`, whose bytes are those of `home`, and makes what the plan left out.
-std::unique_ptr<ImageVolume> MountAndFill(std::unique_ptr<BlockDevice> device, BlockDevice* home,
-                                          const FormatOptions& options, const Plan& plan,
-                                          Problem* problem) {
-    std::unique_ptr<ImageVolume> volume = MountNew(std::move(device), options, problem);
-    if (!volume) {
-        return nullptr;
+// Makes what the plan left out, in one commit.
+Problem Fill(BlockDevice* device, const FormatOptions& options, const Plan& plan) {
+    Problem problem;
+    auto view = std::make_unique<SliceDevice>(device, 0, device->Size());
+    const std::unique_ptr<ImageVolume> volume = MountNew(std::move(view), options, false, &problem);
+    if (!volume || options.emptyTrees) {
+        return problem;
     }
-    if (!options.emptyTrees) {
-        *problem = MakeTrees(home, volume.get(), options, plan.journal);
-    }
-    if (!*problem) {
+    problem = MakeTrees(device, volume.get(), options, plan.journal);
+    if (!problem) {
         const int status = volume->Commit(0);
         if (status != kOk) {
-            *problem = volume->LastIoProblem()
-                           ? volume->LastIoProblem()
-                           : Failure("cannot write the volume: " + StatusWithCode(status), "");
+            problem = volume->LastIoProblem()
+                          ? volume->LastIoProblem()
+                          : Failure("cannot write the volume: " + StatusText(status), "");
         }
     }
-    return *problem ? nullptr : std::move(volume);
+    return problem;
 }
 
 }  // namespace
 
 std::unique_ptr<ImageVolume> MakeVolume(std::unique_ptr<BlockDevice> device,
                                         const FormatOptions& options, Problem* problem) {
-    BlockDevice* home = device.get();
     Plan plan;
-    *problem = CheckOptions(home->Size(), options);
+    *problem = CheckOptions(device->Size(), options);
     if (!*problem) {
-        *problem = MakePlan(home->Size(), options, &plan);
+        *problem = MakePlan(device->Size(), options, &plan);
     }
     if (!*problem) {
-        *problem = WriteProblem(WritePlan(home, plan));
+        *problem = WriteProblem(WritePlan(device.get(), plan));
     }
-    if (*problem) {
-        return nullptr;
+    if (!*problem) {
+        *problem = Fill(device.get(), options, plan);
     }
-    if (plan.journal.count == 0) {
-        return MountAndFill(std::move(device), home, options, plan, problem);
+    if (!*problem) {
+        *problem = WriteProblem(Complete(device.get(), plan.journal, options.blockSize));
     }
-    // The journal is announced when everything it will protect is there.
-    auto view = std::make_unique<SliceDevice>(home, 0, home->Size());
-    if (!MountAndFill(std::move(view), home, options, plan, problem)) {
-        return nullptr;
-    }
-    *problem = WriteProblem(StartJournal(home, plan.journal, options.blockSize));
-    return *problem ? nullptr : MountNew(std::move(device), options, problem);
+    return *problem ? nullptr : MountNew(std::move(device), options, true, problem);
 }
 
 std::unique_ptr<ImageVolume> MakeMemoryVolume(u64 size, const FormatOptions& options,

@@ -4,6 +4,7 @@
 // A buffer belongs to the node that mapped it and to nobody else, since a tree caches each node
 // once; so there is nothing to look up here, and releasing a buffer forgets what was not handed
 // over.
+#include <algorithm>
 #include <cstring>
 #include <new>
 
@@ -211,6 +212,24 @@ int ImageVolume::State::Grant(u32 bytes) {
     }
     grantedBytes += bytes;
     return kOk;
+}
+
+// Bytes of the journal that an operation on one record rarely goes beyond: on each level a node and
+// the one it is shared with or split into, the neighbours of both leaves, header and map; besides a
+// list, the volume header and a sector of the bitmap.
+u64 ImageVolume::State::LargestOperation() const {
+    constexpr u32 kNodesPerLevel = 2;
+    constexpr u32 kOtherNodes = 4;
+    u64 most = 0;
+    for (const TreeSlot& slot : trees) {
+        if (slot.isOpen) {
+            const BTHeaderMem& tree =
+                std::launder(reinterpret_cast<const CBTreeHfs*>(slot.storage))->header;
+            const u64 nodes = u64{kNodesPerLevel} * (tree.treeDepth + 1u) + kOtherNodes;
+            most = std::max(most, nodes * tree.nodeSize);
+        }
+    }
+    return most + journalPlace.header.listSize + 2 * kSectorSize;
 }
 
 void ImageVolume::State::InstallJournal() {

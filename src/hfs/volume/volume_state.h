@@ -140,6 +140,7 @@ struct ImageVolume::State {
     void InstallServices();
     void InstallJournal();
     int Grant(u32 bytes);
+    u64 LargestOperation() const;
     int ReadBytes(const HfsRuns& runs, u32 fileId, u64 offset, void* target, u64 bytes);
     int WriteBytes(const HfsRuns& runs, u32 fileId, u64 offset, const void* source, u64 bytes);
     int ZeroBytes(const HfsRuns& runs, u32 fileId, u64 offset, u64 bytes);

@@ -184,16 +184,16 @@ int ImageVolume::State::MapFork(u32 fileId) {
         file->problem = problem;
     }
     u32 blocks = 0;
-    bool sound =
+    int status =
         AppendExtents(file->runs, fork->extents, fs.totalBlocks, fork->totalBlocks, &blocks);
-    while (sound && blocks < fork->totalBlocks) {
+    while (status == kOk && blocks < fork->totalBlocks) {
         OverflowRecord record{};
         CBTreeHfs* extentsTree = fileId != kExtentsFileId ? Open(kExtentsFileId) : nullptr;
         if (extentsTree == nullptr || ReadOverflow(extentsTree, fileId, blocks, &record) != 0 ||
             record.extents[0].blockCount == 0) {
             break;
         }
-        sound =
+        status =
             AppendExtents(file->runs, record.extents, fs.totalBlocks, fork->totalBlocks, &blocks);
         file->overflow.push_back(record);
         if (bitmap.Size() != 0) {
@@ -202,7 +202,14 @@ int ImageVolume::State::MapFork(u32 fileId) {
             }
         }
     }
-    if (!file->problem && (!sound || blocks != fork->totalBlocks)) {
+    if (status == kErrNoMemory) {
+        // Nothing is wrong with the fork: the next one who asks may have more luck.
+        file->runs->Clear();
+        file->overflow.clear();
+        file->isMapped = false;
+        return status;
+    }
+    if (!file->problem && (status != kOk || blocks != fork->totalBlocks)) {
         file->problem = ForkProblem(fileId, "extents for " + Grouped(blocks) + " of " +
                                                 Grouped(fork->totalBlocks) + " blocks found");
     }
@@ -228,8 +235,13 @@ CBTreeHfs* ImageVolume::State::Open(u32 fileId) {
         slot->problem.fileId = fileId;
         return nullptr;
     }
+    if (MapFork(fileId) == kErrNoMemory) {
+        slot->problem = Failure(name + " tree: " + StatusText(kErrNoMemory), "");
+        slot->problem.status = kErrNoMemory;
+        slot->problem.fileId = fileId;
+        return nullptr;
+    }
     slot->wasTried = true;
-    MapFork(fileId);
     CBTreeHfs* tree = slot->Get();
     lastIo = Problem{};
     const int status = tree->Init();
