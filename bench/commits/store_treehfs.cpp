@@ -13,7 +13,7 @@ namespace {
 
 using namespace VELK;
 
-constexpr u64 kVolumeSize = u64{1} << 30;
+constexpr u64 kVolumeSize = u64{768} << 20;
 constexpr u32 kClump = 4u << 20;
 
 struct alignas(4) NumberKey {
@@ -45,6 +45,7 @@ public:
             std::fprintf(stderr, "treehfs: %s\n", problem.Text().c_str());
             std::exit(1);
         }
+        ownRecords_ = tree_->header.leafRecords;
     }
 
     bool Put(std::uint32_t number, const std::uint8_t* data) override {
@@ -65,13 +66,12 @@ public:
     }
     bool Commit() override { return volume_->Commit(0) == kOk; }
     bool IsCommitDue() const override { return volume_->IsCommitDue(); }
-    std::uint64_t Count() override { return tree_->header.leafRecords - kOwnRecords; }
+    std::uint64_t Count() override { return tree_->header.leafRecords - ownRecords_; }
 
 private:
-    static constexpr u32 kOwnRecords = 6;  // root folder and journal files, with their threads
-
     std::unique_ptr<ImageVolume> volume_;
     CBTreeHfs* tree_ = nullptr;
+    u32 ownRecords_ = 0;  // root folder and journal files, with their threads
 };
 
 }  // namespace

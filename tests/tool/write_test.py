@@ -95,7 +95,7 @@ for journal in ([], ["--journal", "64K"]):
     run("apply", image, some, "--write")
     checks.equal(len(names_in(image)), 50, "names kept by apply %s" % journal)
     run("create-tree", image, "--write")
-    checks.check(re.search("^attributes +[1-9]", run("info", image)[0], re.M), "attributes tree made")
+    checks.check(re.search("^attributes +[1-9]", run("info", image)[0], re.M), "create-tree")
     checks.check(is_clean(image), "clean after writing, %s" % journal)
     sound(image)
     exported, _ = run("export", image)
@@ -118,18 +118,18 @@ out, _ = run("import", copy, "records.jsonl", "--write")
 checks.check("digest equals the source" in out, "import through a small journal: " + out)
 sound(copy)
 
-# One that cannot be cut: positions have to stay. Nothing of it is kept, and the volume is as before.
+# One that cannot be cut: positions have to stay. Nothing of it is kept.
 whole = script("whole.tr", "seek first\nnext 8\nrepeat 2900\nupdate same\nnext\nend\n")
 shutil.copy(folder / image, folder / "whole.img")
 before = names_in("whole.img")
 _, err = run("apply", "whole.img", whole, "--write", code=8)
-checks.check(re.search(r"^treehfs: whole\.img: the last changes could not be kept: the changes take "
-                       r"[\d,]+ bytes of the journal, which holds 31,744: commit more often$",
+checks.check(re.search(r"^treehfs: whole\.img: the last changes could not be kept: the changes "
+                       r"take [\d,]+ bytes of the journal, which holds 31,744: commit more often$",
                        err, re.M), "too large: " + err)
 checks.equal(names_in("whole.img"), before, "names after a transaction too large")
 checks.check(is_clean("whole.img"), "clean after a transaction too large")
 
-# --- import tells up to where the records are kept -----------------------------------------------
+# --- import tells up to where the records are kept -------------------------------------------
 lines = exported.splitlines()
 (folder / "broken.jsonl").write_text("\n".join(lines[:2000] + ["{"] + lines[2000:]) + "\n")
 copy = volume("e.img", "--empty")
@@ -155,8 +155,8 @@ shutil.copy(folder / waiting, folder / "foreign.img")
 shutil.copy(folder / waiting, folder / "damaged.img")
 out, err = run("apply", waiting, find, "--write")
 checks.check("found=yes" in out, "the transaction is carried out: " + out)
-checks.equal(err, "treehfs: waiting.img: the journal held 1 transaction: carried out before anything "
-             "else\n", "replay is told")
+checks.equal(err, "treehfs: waiting.img: the journal held 1 transaction: carried out before "
+             "anything else\n", "replay is told")
 checks.check(is_clean(waiting), "clean after the replay")
 sound(waiting)
 
@@ -173,8 +173,8 @@ sound("foreign.img")
 at = struct.unpack_from(">I", header("damaged.img"), 12)[0] * 4096 + 4096 + 512
 patch("damaged.img", at + 4, b"\xff\xff")
 _, err = run("apply", "damaged.img", find, "--write", code=8)
-checks.check(re.fullmatch(r"treehfs: damaged\.img: the journal is damaged at [\d,]+: .+: run check, "
-                          r"then --force\n", err), "damaged journal: " + err)
+checks.check(re.fullmatch(r"treehfs: damaged\.img: the journal is damaged at [\d,]+: .+: run "
+                          r"check, then --force\n", err), "damaged journal: " + err)
 
 # --- volumes that say no -------------------------------------------------------------------------
 plain = volume("plain.img")
@@ -243,8 +243,8 @@ for journal in (["--journal", "64K"], []):
                           preexec_fn=limit_file_size, restore_signals=False, capture_output=True,
                           text=True, timeout=120)
     checks.equal(done.returncode, 8, "a write that fails: exit code " + done.stderr)
-    checks.check(re.fullmatch(r"treehfs: full\.img: the last changes could not be kept: write error "
-                              r"at 0x[0-9a-f]+ \(.+\): File too large\n", done.stderr),
+    checks.check(re.fullmatch(r"treehfs: full\.img: the last changes could not be kept: write "
+                              r"error at 0x[0-9a-f]+ \(.+\): File too large\n", done.stderr),
                  "a write that fails: " + done.stderr)
     if journal:
         run("apply", full, "none.tr", "--write")
@@ -257,8 +257,9 @@ for journal in (["--journal", "64K"], []):
 
 # --- interrupted ---------------------------------------------------------------------------------
 image = volume("stopped.img", "--journal", "32K")
-worker = subprocess.Popen([harness.tool(), "apply", image, more, "--write", "-q"], cwd=folder,
-                          stdout=subprocess.PIPE, stderr=subprocess.PIPE)
+worker = subprocess.Popen([harness.tool(), "apply", image, script("long.tr", INSERTS % 60000),
+                           "--write", "-q"], cwd=folder, stdout=subprocess.PIPE,
+                          stderr=subprocess.PIPE)
 for _ in range(200):
     worker.stdout.readline()
 worker.send_signal(signal.SIGINT)
@@ -270,7 +271,8 @@ sound(image)
 
 # --- devices of the host -------------------------------------------------------------------------
 def host(*words):
-    return subprocess.run(words, capture_output=True, text=True, check=False, stdin=subprocess.DEVNULL)
+    return subprocess.run(words, capture_output=True, text=True, check=False,
+                          stdin=subprocess.DEVNULL)
 
 
 def loop_device(path):

@@ -89,6 +89,36 @@ int InsertBeforeAll(ImageVolume* volume) {
     return Catalog(volume)->InsertRecord(key, 0, data, sizeof data);
 }
 
+// The highest number there is; found with everything working.
+u32 g_highest = 0;
+
+int FindHighest(ImageVolume* volume, u32 from) {
+    g_highest = from;
+    while (g_highest > kFirstNumber && !HasNumber(volume, g_highest)) {
+        g_highest -= 1;
+    }
+    return kOk;
+}
+
+int DeleteHighest(ImageVolume* volume) {
+    return DeleteNumber(volume, g_highest);
+}
+
+// As high as it takes, and then emptied from the right until one deletion more would bring it down.
+int PrepareCollapse(ImageVolume* volume) {
+    const u32 depth = Depth(volume);
+    int status = kOk;
+    while (status == kOk && Depth(volume) == depth) {
+        status = Committed(volume, InsertBetween(volume));
+    }
+    g_highest = kFirstNumber + kNumberStep * kRecords;
+    const auto deleteNext = [](ImageVolume* on) {
+        FindHighest(on, g_highest);
+        return DeleteHighest(on);
+    };
+    return status == kOk ? UpToTheLastBefore(volume, deleteNext, Depth) : status;
+}
+
 int DeleteFirst(ImageVolume* volume) {
     const u32 gone = kOwnRecords + kRecords - Catalog(volume)->header.leafRecords;
     return DeleteNumber(volume, kFirstNumber + kNumberStep * gone);
@@ -116,7 +146,7 @@ int InsertAttribute(ImageVolume* volume) {
 int Iterate(ImageVolume* volume) {
     HfsFindData path;
     alignas(4) u8 key[kMaxKeyLength + kKeyLengthSize] = {};
-    alignas(4) u8 data[512];
+    alignas(4) u8 data[4096];
     const u16 keyLength = kCatKeyFixed;
     std::memcpy(key, &keyLength, sizeof keyLength);
     bool found = false;
@@ -196,9 +226,12 @@ const FaultScenario kFaultScenario[kFaultScenarios] = {
     {"DeletionOfALeaf",
      [](ImageVolume* volume) { return UpToTheLastBefore(volume, DeleteFirst, UsedNodes); },
      OpenTrees, [](ImageVolume* volume) { return Committed(volume, DeleteFirst(volume)); }},
-    {"DeletionWithCollapse",
-     [](ImageVolume* volume) { return UpToTheLastBefore(volume, DeleteFirst, Depth); }, OpenTrees,
-     [](ImageVolume* volume) { return Committed(volume, DeleteFirst(volume)); }},
+    {"DeletionWithCollapse", PrepareCollapse,
+     [](ImageVolume* volume) {
+         const int status = OpenTrees(volume);
+         return status == kOk ? FindHighest(volume, kFirstNumber + kNumberStep * kRecords) : status;
+     },
+     [](ImageVolume* volume) { return Committed(volume, DeleteHighest(volume)); }},
     {"Iteration", Nothing, OpenTrees, Iterate},
     {"BadBlocks", AddBadBlocks, OpenTrees, LoadBadBlocks},
     {"ReservedInsertion", Nothing, OpenTrees,
@@ -215,10 +248,10 @@ const FaultScenario kFaultScenario[kFaultScenarios] = {
          return status == kOk ? InsertBetween(volume) : status;
      },
      [](ImageVolume* volume) { return volume->Commit(0); }},
-    {"FlushWithZeroing", MakeAttributes,
+    {"FlushWithZeroing", Nothing,
      [](ImageVolume* volume) {
          const int status = OpenTrees(volume);
-         return status == kOk ? InsertAttribute(volume) : status;
+         return status == kOk ? MakeAttributes(volume) : status;
      },
      [](ImageVolume* volume) { return volume->Commit(4); }},
     {"Restore", Nothing,

@@ -126,6 +126,18 @@ Problem OpenProblem(int error, bool isBlockDevice) {
                                            : CannotOpen(error);
 }
 
+constexpr u64 kWorthStarting = u64{256} << 10;
+
+// Lets the medium begin with what it will be asked for at the next sync. Nothing depends on it.
+void StartWriting(int handle, u64 offset, u64 bytes) {
+#if defined(SYNC_FILE_RANGE_WRITE)
+    sync_file_range(handle, static_cast<off64_t>(offset), static_cast<off64_t>(bytes),
+                    SYNC_FILE_RANGE_WRITE);
+#else
+    (void)handle, (void)offset, (void)bytes;
+#endif
+}
+
 }  // namespace
 
 std::unique_ptr<FileDevice> FileDevice::Open(const std::string& path, Mode mode, u64 size,
@@ -200,6 +212,7 @@ IoResult FileDevice::Write(u64 offset, const void* source, std::size_t bytes) {
         return {kIoPastEnd, offset};
     }
     const u8* in = static_cast<const u8*>(source);
+    const u64 start = offset;
     while (bytes > 0) {
         const ssize_t count = g_calls->write(handle_, in, bytes, static_cast<off_t>(offset));
         if (count < 0) {
@@ -214,6 +227,9 @@ IoResult FileDevice::Write(u64 offset, const void* source, std::size_t bytes) {
         in += count;
         offset += static_cast<u64>(count);
         bytes -= static_cast<std::size_t>(count);
+    }
+    if (offset - start >= kWorthStarting) {
+        StartWriting(handle_, start, offset - start);
     }
     return {};
 }

@@ -130,7 +130,7 @@ Problem MakePlan(u64 size, const FormatOptions& options, Plan* plan) {
 }
 
 // What the device held before is gone, and known to be gone, before anything else of it is written
-// over.
+// over: the volume header first, by which it is found.
 IoResult WritePlan(BlockDevice* device, const Plan& plan) {
     u8 bytes[kHeaderSize];
     EncodeHeader(plan.header, bytes);
@@ -138,6 +138,9 @@ IoResult WritePlan(BlockDevice* device, const Plan& plan) {
     const u64 bitmapAt =
         u64{plan.header.allocationFile.extents[0].startBlock} * plan.header.blockSize;
     IoResult result = device->Zero(0, kHeaderOffset + kHeaderSize);
+    if (result.Ok()) {
+        result = device->Sync();
+    }
     if (result.Ok()) {
         result = device->Zero(size - kAltHeaderFromEnd, kAltHeaderFromEnd);
     }
@@ -184,6 +187,9 @@ IoResult Complete(BlockDevice* device, const JournalBlocks& journal, u32 blockSi
     }
     if (result.Ok()) {
         result = Proclaim(device, device->Size() - kAltHeaderFromEnd, journal);
+    }
+    if (result.Ok()) {
+        result = device->Sync();
     }
     if (result.Ok()) {
         result = Proclaim(device, kHeaderOffset, journal);
