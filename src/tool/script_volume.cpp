@@ -118,6 +118,19 @@ void TellNotes(const std::string& image, const ImageVolume& volume) {
     }
 }
 
+// The last commit. A volume that a failure has closed to changes has lost some already.
+void KeepRest(const std::string& subject, ImageVolume* volume) {
+    const bool wasWritable = volume->IsWritable();
+    const int status = wasWritable ? volume->Commit(0) : kErrVolumeReadOnly;
+    if (status == kOk) {
+        return;
+    }
+    Problem problem = !wasWritable && volume->LastIoProblem() ? volume->LastIoProblem()
+                                                              : CommitProblem(volume, status);
+    problem.what = "the last changes could not be kept: " + problem.what;
+    ThrowProblem(subject, problem);
+}
+
 }  // namespace
 
 void TargetOptions::Declare(Invocation* call) {
@@ -200,13 +213,8 @@ Problem CommitProblem(ImageVolume* volume, int status) {
 void FinishTarget(const Invocation& call, const TargetOptions& options, ImageVolume* volume,
                   u64 handedOverBefore) {
     const bool keeps = options.write || !options.saveFile.empty();
-    if (keeps && volume->IsWritable()) {
-        const int status = volume->Commit(0);
-        if (status != kOk) {
-            Problem problem = CommitProblem(volume, status);
-            problem.what = "the last changes could not be kept: " + problem.what;
-            ThrowProblem(options.Subject(call), problem);
-        }
+    if (options.write || (keeps && volume->IsWritable())) {
+        KeepRest(options.Subject(call), volume);
     }
     if (!options.saveFile.empty()) {
         Save(options, volume);

@@ -215,6 +215,7 @@ TEST(ReplayFailures, EachTransferInTurn) {
             volume = MountOn(&faulty, Writing(), &problem);
             if (!faults.hasFailed) {
                 ASSERT_NE(nullptr, volume);
+                volume.reset();  // before the device goes
                 break;
             }
             failures += volume == nullptr ? 1u : 0u;

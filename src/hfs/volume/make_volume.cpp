@@ -374,7 +374,16 @@ std::unique_ptr<ImageVolume> MakeVolume(std::unique_ptr<BlockDevice> device,
     if (!*problem) {
         *problem = WriteProblem(Complete(device.get(), plan.journal, options.blockSize));
     }
-    return *problem ? nullptr : MountNew(std::move(device), options, true, problem);
+    std::unique_ptr<ImageVolume> volume;
+    if (!*problem) {
+        volume = MountNew(std::move(device), options, true, problem);
+    }
+    for (const u32 fileId : {kExtentsFileId, kCatalogFileId, kAttributesFileId}) {
+        if (volume && volume->HasTree(fileId) && volume->Tree(fileId, problem) == nullptr) {
+            return nullptr;
+        }
+    }
+    return volume;
 }
 
 std::unique_ptr<ImageVolume> MakeMemoryVolume(u64 size, const FormatOptions& options,
