@@ -191,7 +191,7 @@ private:
         }
         if (status != kOk) {
             volume_->RestoreAfter(status);
-            Wrong(StatusText(status));
+            Wrong(StatusWithCode(status));
         }
         ++sinceFlush_;
         volume_->TrimCache();

@@ -207,7 +207,7 @@ std::unique_ptr<ImageVolume> OpenTarget(const Invocation& call, const TargetOpti
 
 Problem CommitProblem(ImageVolume* volume, int status) {
     const Problem& io = volume->LastIoProblem();
-    return io && io.status == status ? io : Failure(StatusText(status), "");
+    return io && io.status == status ? io : Failure(StatusWithCode(status), "");
 }
 
 void FinishTarget(const Invocation& call, const TargetOptions& options, ImageVolume* volume,

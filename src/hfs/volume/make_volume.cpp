@@ -350,7 +350,7 @@ Problem Fill(BlockDevice* device, const FormatOptions& options, const Plan& plan
         if (status != kOk) {
             problem = volume->LastIoProblem()
                           ? volume->LastIoProblem()
-                          : Failure("cannot write the volume: " + StatusText(status), "");
+                          : Failure("cannot write the volume: " + StatusWithCode(status), "");
         }
     }
     return problem;

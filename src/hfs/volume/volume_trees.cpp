@@ -236,7 +236,7 @@ CBTreeHfs* ImageVolume::State::Open(u32 fileId) {
         return nullptr;
     }
     if (MapFork(fileId) == kErrNoMemory) {
-        slot->problem = Failure(name + " tree: " + StatusText(kErrNoMemory), "");
+        slot->problem = Failure(name + " tree: " + StatusWithCode(kErrNoMemory), "");
         slot->problem.status = kErrNoMemory;
         slot->problem.fileId = fileId;
         return nullptr;
