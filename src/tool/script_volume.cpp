@@ -6,10 +6,10 @@
 
 #include <cstdio>
 
+#include "hfs/records/text_format.h"
 #include "hfs/volume/make_volume.h"
 #include "tool/errors.h"
 #include "tool/options.h"
-#include "tool/text_format.h"
 #include "tool/undo_file.h"
 
 namespace VELK::tool {
