@@ -78,6 +78,33 @@ TEST_P(ModelTest, TreeAndModelAgreeWhenServicesFail) {
     RunAndShrink(GetParam(), NumberFromEnvironment("TREEHFS_SEED", 20261122), true);
 }
 
+// Accelerators must not change what can be observed: the order of changes, the residue in the gaps
+// of nodes, the counts of requests. One number stands for all of it, over every geometry and tree
+// kind, with and without faults. A change that is meant to be seen brings a new number.
+// TREEHFS_DIGEST_CALLS takes longer runs and only tells their number, to compare two builds by.
+TEST(ModelDigest, RunsAreWhatTheyWereObservedToBe) {
+    constexpr u64 kDefault = 40;
+    constexpr u64 kSmallNodesMore = 12;  // times the calls, where a tree gets deep soon
+    const u64 calls = NumberFromEnvironment("TREEHFS_DIGEST_CALLS", kDefault);
+    u64 all = 0;
+    u64 seed = 4711;
+    for (const RunSetup& setup : Setups()) {
+        const bool isSmall = setup.geometry.nodeSize <= 512;
+        for (const bool withFaults : {false, true}) {
+            Runner runner(setup);
+            const u64 share = isSmall ? calls * kSmallNodesMore : calls;
+            const auto failure =
+                runner.Run(MakeOperations(++seed, static_cast<u32>(share), withFaults));
+            ASSERT_FALSE(failure) << *failure;
+            all = all * 31 + runner.Digest();
+        }
+    }
+    if (calls != kDefault) {
+        GTEST_SKIP() << "number of these runs: " << all;
+    }
+    EXPECT_EQ(all, 3368167796521018749u);
+}
+
 INSTANTIATE_TEST_SUITE_P(Setups, ModelTest, ::testing::ValuesIn(Setups()), [](const auto& param) {
     return std::string(param.param.fileId == kExtentsFileId   ? "Extents"
                        : param.param.fileId == kCatalogFileId ? "Catalog"

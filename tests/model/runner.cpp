@@ -111,6 +111,7 @@ std::optional<std::string> Runner::Run(const std::vector<Operation>& operations)
         const bool failed = Faulted();
         faults_->FailNone();
         heap_.FailNone();
+        DigestState();
         if (!outcome) {
             outcome = CheckEvents(!failed && !refused_ && IsLegal(operation.verb));
         }
@@ -175,7 +176,14 @@ Runner::Outcome Runner::Audit() {
     if (!volume_->breaches.empty()) {
         return "contract: " + volume_->breaches.front();
     }
-    if (Outcome outcome = Check(Present())) {
+    const Bytes file = Present();
+    for (const u8 byte : file) {
+        Digest(byte);
+    }
+    for (const u32 nodeNum : ModifiedNodes(*tree_)) {
+        Digest(nodeNum);
+    }
+    if (Outcome outcome = Check(file)) {
         return outcome;
     }
     if (tree_->header.leafRecords != model_.size()) {
@@ -263,9 +271,31 @@ Runner::Outcome Runner::Check(const Bytes& file) const {
     return first.empty() ? std::nullopt : Outcome("checker: " + first);
 }
 
+void Runner::Digest(u64 value) {
+    digest_ = (digest_ ^ value) * 0x9E3779B97F4A7C15u;
+    digest_ ^= digest_ >> 29;
+}
+
+void Runner::DigestState() {
+    const BTHeaderMem& header = tree_->header;
+    for (const u32 number : {tree_->hitCount, tree_->readCount, tree_->nodeCount, tree_->validNodes,
+                             header.rootNode, header.treeDepth + 0u, header.leafRecords,
+                             header.totalNodes, header.freeNodes, tree_->isDirty + 0u}) {
+        Digest(number);
+    }
+    for (const CallRecord& call : volume_->TakeCalls()) {
+        Digest(static_cast<u64>(call.call));
+        Digest(call.offset);
+        Digest(call.bytes);
+    }
+}
+
 // What the engine said. A legal call on this sound tree, with working services, reports nothing.
 Runner::Outcome Runner::CheckEvents(bool quiet) {
     for (const Event& event : capture_.Take()) {
+        Digest(static_cast<u64>(event.kind));
+        Digest(event.code);
+        Digest(static_cast<u64>(event.site));
         if (event.kind == Event::Kind::kReport && quiet &&
             !Contains(kReportedAnswers, std::size(kReportedAnswers), event.site)) {
             return "report " + Hex(static_cast<int>(event.code)) + " at " +

@@ -30,6 +30,11 @@ public:
     // Runs the list; the text of the first disagreement, or none.
     std::optional<std::string> Run(const std::vector<Operation>& operations);
 
+    // A number that everything observable of the run so far went into: node requests, header
+    // fields, what was reported and asserted, the calls the volume saw, and with each audit every
+    // byte of the tree.
+    u64 Digest() const { return digest_; }
+
 private:
     using Outcome = std::optional<std::string>;
 
@@ -62,6 +67,8 @@ private:
     Outcome Check(const Bytes& file) const;
     Bytes Present() const;
     Outcome CheckEvents(bool quiet);
+    void DigestState();
+    void Digest(u64 value);
 
     bool Faulted() const { return faults_->HasFailed() || heap_.HasFailed(); }
     u32 DataSize(u32 size) const;
@@ -82,6 +89,7 @@ private:
     TreeModel committed_;
     MemVolume::Snapshot snapshot_;
     u32 salt_ = 0;
+    u64 digest_ = 0;
     alignas(8) u8 key_[kKeyLengthSize + kMaxKeyLength + 6] = {};
     Bytes record_;
 };
