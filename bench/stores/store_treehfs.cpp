@@ -17,7 +17,7 @@ using namespace VELK;
 
 constexpr u32 kNodeSize = 4096;
 constexpr u32 kNodeShift = 12;
-constexpr u64 kAddressSpace = u64{64} << 30;
+constexpr u64 kAddressSpace = u64{8} << 30;
 
 // The tree file; grows within address space that was set aside.
 class RamVolume {

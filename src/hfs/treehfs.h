@@ -412,7 +412,8 @@ public:
     bool reservationOpen = false;  // ReserveSpace was called with a BTReserve, and not released
     bool isDirty = false;          // header or map changed since the last flush
     u64 pathVersion = 1;  // raised when records move so that a stored path may no longer lead right
-    bool isAllOwn = false;  // Create made the tree and no node was read from the volume since
+    HfsNodeHint rootHint{};  // leads to the root when that is cached
+    bool isAllOwn = false;   // Create made the tree and no node was read from the volume since
 };
 
 }  // namespace VELK

@@ -63,18 +63,19 @@ HfsNodeHint* HintPlaces(HfsNode* parent, u32 nodeNum) {
     return &parent->hints[nodeNum & parent->hintMask & ~1u];
 }
 
-HfsNodeHint* FindHint(HfsNode* parent, u32 nodeNum) {
-    HfsNodeHint* hint = HintPlaces(parent, nodeNum);
-    hint += hint->nodeNum == nodeNum ? 0 : 1;
+HfsNodeHint* FindHint(HfsNodeHint* places, bool isPair, u32 nodeNum) {
+    if (places == nullptr) {
+        return nullptr;
+    }
+    HfsNodeHint* hint = places + (isPair && places->nodeNum != nodeNum ? 1 : 0);
     return hint->nodeNum == nodeNum && hint->node != nullptr ? hint : nullptr;
 }
 
 // Takes an empty place, else one of the two by a bit of the number that did not choose the pair.
-void SetHint(HfsNode* parent, HfsNode* child) {
-    HfsNodeHint* places = HintPlaces(parent, child->nodeNum);
-    HfsNodeHint* hint = places->node == nullptr ? places : places + 1;
+void SetHint(HfsNodeHint* places, bool isPair, HfsNode* child) {
+    HfsNodeHint* hint = places + (isPair && places->node != nullptr ? 1 : 0);
     if (hint->node != nullptr) {
-        hint = places + (child->nodeNum & 1);
+        hint = places + (isPair ? child->nodeNum & 1 : 0);
         hint->node->hintedBy = nullptr;
     }
     if (child->hintedBy != nullptr) {
@@ -326,32 +327,31 @@ int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
 }
 
 int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNode** out) {
-    const bool hasHints = parent->hints != nullptr;
-    HfsNodeHint* hint = hasHints ? FindHint(parent, nodeNum) : nullptr;
-    if (hint != nullptr) {
-        // Asked for all at once, as each may be cold: the node's block entries, which lie in its
-        // second line, its descriptor, and its offset table, which is long in an index node.
-        const u8* end = hint->data + tree->header.blockSize;
-        __builtin_prefetch(&hint->node->bufs[0]);
-        __builtin_prefetch(hint->data);
-        __builtin_prefetch(end - 64);
-        if (use == NodeUse::kReadIndex) {
-            __builtin_prefetch(end - 128);
-            __builtin_prefetch(end - 192);
+    HfsNodeHint* places = parent == nullptr          ? &tree->rootHint
+                          : parent->hints != nullptr ? HintPlaces(parent, nodeNum)
+                                                     : nullptr;
+    HfsNodeHint* hint = FindHint(places, parent != nullptr, nodeNum);
+    if (hint == nullptr) {
+        const int status = FetchNode(tree, nodeNum, use, out);
+        if (status == kOk && places != nullptr) {
+            SetHint(places, parent != nullptr, *out);
         }
-        CountHit(tree, hint->node);
-        TakeReference(hint->node);
-        // A change moves the node to the end of the modified list, which writes to its neighbours.
-        __builtin_prefetch(hint->node->modifiedLink.next, 1);
-        __builtin_prefetch(hint->node->modifiedLink.prev, 1);
-        *out = hint->node;
-        return kOk;
+        return status;
     }
-    const int status = FetchNode(tree, nodeNum, use, out);
-    if (status == kOk && hasHints) {
-        SetHint(parent, *out);
+    // Asked for all at once, as each may be cold: the node's block entries, which lie in its
+    // second line, its descriptor, and its offset table, which is long in an index node.
+    const u8* end = hint->data + tree->header.blockSize;
+    __builtin_prefetch(&hint->node->bufs[0]);
+    __builtin_prefetch(hint->data);
+    __builtin_prefetch(end - 64);
+    if (use == NodeUse::kReadIndex) {
+        __builtin_prefetch(end - 128);
+        __builtin_prefetch(end - 192);
     }
-    return status;
+    CountHit(tree, hint->node);
+    TakeReference(hint->node);
+    *out = hint->node;
+    return kOk;
 }
 
 int CBTreeHfs::GetINode(unsigned nodeNum, HfsNode** out, bool makeEmpty) {

@@ -34,7 +34,7 @@ enum class NodeUse {
 };
 int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out);
 
-// GetINode of a child of `parent`, by its hint when there is one.
+// GetINode of a child of `parent`, by its hint when there is one; of the root with no parent.
 int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNode** out);
 
 // Links `node` into the tree of cached nodes by its number. False: the number is there already.

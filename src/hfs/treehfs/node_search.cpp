@@ -21,88 +21,134 @@ u16 FoldPlain(u32 unit) {
     return static_cast<u16>(unit - 'A' < 26 ? unit + ('a' - 'A') : unit);
 }
 
+// Where the bytes of a node are. Nearly every node lies in one block, and is then searched without
+// asking for each offset which block holds it.
+class OneBlock {
+public:
+    OneBlock(const BTHeaderMem*, const HfsNode* node) : data_(node->bufs[0].data) {}
+
+    const u8* At(u32 offset) const { return data_ + offset; }
+    // Whether the `size` bytes from `offset` on lie in one block, those from `start` to `end` in at
+    // most two. REQUIRES of both: they lie inside the node.
+    static bool IsWhole(u32, u32) { return true; }
+    static bool IsShort(u32, u32) { return true; }
+
+private:
+    const u8* data_;
+};
+
+class ManyBlocks {
+public:
+    ManyBlocks(const BTHeaderMem* hdr, const HfsNode* node)
+        : bufs_(node->bufs), mask_(hdr->blockMask), shift_(hdr->blockShift) {}
+
+    const u8* At(u32 offset) const { return bufs_[offset >> shift_].data + (offset & mask_); }
+    bool IsWhole(u32 offset, u32 size) const { return (offset & mask_) + size <= mask_ + 1; }
+    bool IsShort(u32 start, u32 end) const {
+        return ((end - 1) >> shift_) - (start >> shift_) <= 1;
+    }
+
+private:
+    const HfsBcbBuf* bufs_;
+    u32 mask_;
+    u32 shift_;
+};
+
 // The key of record `index` where it lies, null when anything about the record is out of the
 // ordinary: exactly the checks of GetKey, of contiguity and of soundness.
+template <typename Blocks>
 class QuickKeys {
 public:
     QuickKeys(const BTHeaderMem* hdr, const HfsNode* node, const SearchKey& key)
-        : bufs_(node->bufs),
+        : blocks_(hdr, node),
           nodeSize_(hdr->nodeSize),
-          blockMask_(hdr->blockMask),
-          blockShift_(hdr->blockShift),
           fixed_(key.Fixed()),
           nameLengthAt_(key.NameLengthAt()) {}
 
     // REQUIRES: the slots of record `index` and the next lie inside the node.
-    u32 Slot(u32 index) const { return GetBe16(At(nodeSize_ - kSlotSize * (index + 1))); }
+    u32 Slot(u32 index) const { return GetBe16(blocks_.At(SlotAt(index))); }
 
-    const u8* KeyAt(u32 index) const {
+    [[gnu::always_inline]] const u8* KeyAt(u32 index) const {
         const u32 start = Slot(index);
         const u32 end = Slot(index + 1);
-        if (end >= nodeSize_ || start >= end) {
+        if (HFS_UNLIKELY(end >= nodeSize_ || start >= end || (start & 1) != 0) ||
+            HFS_UNLIKELY(!blocks_.IsWhole(start, kKeyLengthSize))) {
             return nullptr;
         }
-        const u32 room = blockMask_ + 1 - (start & blockMask_);
-        const u8* key = At(start);
-        if (room < kKeyLengthSize || (start & 1) != 0) {
-            return nullptr;
-        }
+        const u8* key = blocks_.At(start);
         const u32 keyLength = GetBe16(key);
         const u32 padded = PaddedKeySize(keyLength);
-        if (keyLength < fixed_ || keyLength > kMaxKeyLength || padded > room ||
-            padded >= end - start) {
+        if (HFS_UNLIKELY(keyLength - fixed_ > kMaxKeyLength - fixed_ || padded >= end - start) ||
+            HFS_UNLIKELY(!blocks_.IsWhole(start, padded))) {
             return nullptr;
         }
         // Data in three blocks is asserted each time it is described.
-        if (((end - 1) >> blockShift_) - ((start + padded) >> blockShift_) > 1) {
+        if (HFS_UNLIKELY(!blocks_.IsShort(start + padded, end))) {
             return nullptr;
         }
-        if (nameLengthAt_ != 0 && fixed_ + 2u * GetBe16(key + nameLengthAt_) > keyLength) {
+        if (nameLengthAt_ != 0 &&
+            HFS_UNLIKELY(fixed_ + 2u * GetBe16(key + nameLengthAt_) > keyLength)) {
             return nullptr;
         }
         return key;
     }
 
+    // Describes record `index`, whose key KeyAt gave, as far as delivery needs it. False: its data
+    // does not lie in one block.
+    bool Describe(u32 index, const u8* key, NodeKey* out) const {
+        const u32 start = Slot(index);
+        const u32 end = Slot(index + 1);
+        const u32 padded = PaddedKeySize(GetBe16(key));
+        out->offset = start;
+        out->size = end - start;
+        out->keySize = GetBe16(key) + kKeyLengthSize;
+        out->dataSize = end - start - padded;
+        out->dataFirstBytes = out->dataSize;
+        if (!blocks_.IsWhole(start + padded, out->dataSize)) {
+            return false;
+        }
+        out->data = const_cast<u8*>(blocks_.At(start + padded));
+        return true;
+    }
+
     void Prefetch(u32 index) const {
         const u32 start = Slot(index);
         if (start < nodeSize_) {
-            __builtin_prefetch(At(start));
+            __builtin_prefetch(blocks_.At(start));
         }
     }
 
 private:
-    const u8* At(u32 offset) const {
-        return bufs_[offset >> blockShift_].data + (offset & blockMask_);
-    }
+    u32 SlotAt(u32 index) const { return nodeSize_ - kSlotSize * (index + 1); }
 
-    const HfsBcbBuf* bufs_;
+    Blocks blocks_;
     u32 nodeSize_;
-    u32 blockMask_;
-    u32 blockShift_;
     u32 fixed_;
     u32 nameLengthAt_;
 };
 
-// Asks for the keys that the first four probes can meet, all at once: waiting for one after the
-// other is what a search in a cold node consists of.
-void PrefetchProbes(const QuickKeys& keys, s32 high) {
-    constexpr u32 kRounds = 4;
-    struct Interval {
-        s32 low;
-        s32 high;
-    };
-    Interval intervals[(1u << kRounds) - 1] = {{0, high}};
-    for (u32 at = 0; at < (1u << kRounds) - 1; ++at) {
-        const Interval here = intervals[at];
-        if (here.low > here.high) {
-            continue;
-        }
-        const s32 middle = (here.low + here.high) >> 1;
-        keys.Prefetch(static_cast<u32>(middle));
-        if (2 * at + 2 < (1u << kRounds) - 1) {
-            intervals[2 * at + 1] = {here.low, middle - 1};
-            intervals[2 * at + 2] = {middle + 1, here.high};
-        }
+// Asks for the keys that the first probes can meet, all at once: waiting for one after the other is
+// what a search in a cold node consists of.
+template <int kRounds, typename Keys>
+[[gnu::always_inline]] inline void PrefetchProbes(const Keys& keys, s32 low, s32 high) {
+    if (low > high) {
+        return;
+    }
+    const s32 middle = (low + high) >> 1;
+    keys.Prefetch(static_cast<u32>(middle));
+    if constexpr (kRounds > 1) {
+        PrefetchProbes<kRounds - 1>(keys, low, middle - 1);
+        PrefetchProbes<kRounds - 1>(keys, middle + 1, high);
+    }
+}
+
+// Few nodes stand above the lowest index nodes: they stay in the processor's caches.
+template <typename Keys>
+void PrefetchFor(const Keys& keys, u32 height, s32 high) {
+    if (height == 1) {
+        PrefetchProbes<4>(keys, 0, high);
+    } else if (height == 2) {
+        PrefetchProbes<3>(keys, 0, high);
     }
 }
 
@@ -156,14 +202,17 @@ inline int SearchKey::Compare(const BTreeKey* nodeKey) const {
     return compare_(key_, id_, nodeKey);
 }
 
-int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
+namespace {
+
+template <typename Blocks>
+int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
     const u32 count = NumRecords(node);
     s32 low = 0;
     s32 high = static_cast<s32>(count) - 1;
-    const QuickKeys keys(&tree->header, node, key);
+    const QuickKeys<Blocks> keys(&tree->header, node, key);
     const bool quick = HasQuickKeys(tree->header, key, count);
     if (quick) {
-        PrefetchProbes(keys, high);
+        PrefetchFor(keys, Height(node), high);
     }
     while (low <= high) {
         const s32 middle = (low + high) >> 1;
@@ -181,7 +230,8 @@ int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Searc
         const int order = key.Compare(nodeKey);
         if (order == 0) {
             result->found = true;
-            result->isLocated = bytes == nullptr;
+            result->isLocated =
+                bytes == nullptr || keys.Describe(static_cast<u32>(middle), bytes, &result->record);
             result->index = middle;
             result->key = nodeKey;
             return kOk;
@@ -197,43 +247,64 @@ int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Searc
     return kOk;
 }
 
+// SearchInside without the search proper. True: the key lies between the first and the last.
+template <typename Blocks>
+bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, u32 count,
+                bool* isBehindAll) {
+    const QuickKeys<Blocks> keys(&tree->header, leaf, key);
+    const u8* last = keys.KeyAt(count - 1);
+    if (last == nullptr) {
+        return false;
+    }
+    if (key.Compare(reinterpret_cast<const BTreeKey*>(last)) > 0) {
+        *isBehindAll = true;
+        return false;
+    }
+    const u8* first = keys.KeyAt(0);
+    return first != nullptr && key.Compare(reinterpret_cast<const BTreeKey*>(first)) >= 0;
+}
+
+}  // namespace
+
+int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
+    return tree->header.blocksPerNode == 1 ? Search<OneBlock>(tree, node, key, result)
+                                           : Search<ManyBlocks>(tree, node, key, result);
+}
+
 bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key,
                   SearchResult* result) {
     const u32 count = NumRecords(leaf);
     if (count == 0 || !HasQuickKeys(tree->header, key, count)) {
         return false;
     }
-    const QuickKeys keys(&tree->header, leaf, key);
-    const u8* last = keys.KeyAt(count - 1);
-    if (last == nullptr) {
-        return false;
-    }
-    const int order = key.Compare(reinterpret_cast<const BTreeKey*>(last));
-    if (order > 0 && FLink(leaf) == 0) {
+    bool isBehindAll = false;
+    const bool isInside = tree->header.blocksPerNode == 1
+                              ? LiesInside<OneBlock>(tree, leaf, key, count, &isBehindAll)
+                              : LiesInside<ManyBlocks>(tree, leaf, key, count, &isBehindAll);
+    if (isBehindAll && FLink(leaf) == 0) {
         result->found = false;
         result->index = static_cast<s32>(count);
         return true;
     }
-    const u8* first = order > 0 ? nullptr : keys.KeyAt(0);
-    return first != nullptr && key.Compare(reinterpret_cast<const BTreeKey*>(first)) >= 0 &&
-           SearchNode(tree, leaf, key, result) == kOk;
+    return isInside && SearchNode(tree, leaf, key, result) == kOk;
 }
 
 int ChildOf(const CBTreeHfs* tree, const HfsNode* node, s32 index, u32* child) {
     const BTHeaderMem* hdr = &tree->header;
     const u32 count = NumRecords(node);
-    if (HFS_UNLIKELY(index < 0 || static_cast<u32>(index) >= count ||
-                     kSlotSize * (count + 1) >= hdr->nodeSize)) {
+    if (hdr->blocksPerNode != 1 || index < 0 || static_cast<u32>(index) >= count ||
+        kSlotSize * (count + 1) >= hdr->nodeSize) {
         return node->GetChildNodeNum(hdr, index, child);
     }
-    const NodeBytes bytes(hdr, node);
-    const u32 start = bytes.U16(SlotOffset(hdr, static_cast<u32>(index)));
-    const u32 end = bytes.U16(SlotOffset(hdr, static_cast<u32>(index) + 1));
-    if (HFS_UNLIKELY(end >= hdr->nodeSize || start >= end || Kind(node) != kBTIndexNode ||
-                     PaddedKeySize(bytes.U16(start)) + kChildSize != end - start)) {
+    const u8* data = node->bufs[0].data;
+    const u32 start = GetBe16(data + SlotOffset(hdr, static_cast<u32>(index)));
+    const u32 end = GetBe16(data + SlotOffset(hdr, static_cast<u32>(index) + 1));
+    if (HFS_UNLIKELY(end >= hdr->nodeSize || start + kKeyLengthSize > end) ||
+        HFS_UNLIKELY(Kind(node) != kBTIndexNode) ||
+        HFS_UNLIKELY(PaddedKeySize(GetBe16(data + start)) + kChildSize != end - start)) {
         return node->GetChildNodeNum(hdr, index, child);
     }
-    *child = bytes.U32(end - kChildSize);
+    *child = GetBe32(data + end - kChildSize);
     return kOk;
 }
 

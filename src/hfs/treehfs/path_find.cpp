@@ -157,8 +157,9 @@ int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, HfsNode* parent, HfsFindD
     entry->node = nullptr;
     const u32 readBefore = tree->readCount;
     const NodeUse use = level > 1 ? NodeUse::kReadIndex : NodeUse::kRead;
-    HFS_TRY(parent != nullptr ? FetchChild(tree, parent, nodeNum, use, &entry->node)
-                              : FetchNode(tree, nodeNum, use, &entry->node),
+    const bool isOnTheWayDown = parent != nullptr || nodeNum == tree->header.rootNode;
+    HFS_TRY(isOnTheWayDown ? FetchChild(tree, parent, nodeNum, use, &entry->node)
+                           : FetchNode(tree, nodeNum, use, &entry->node),
             2909);
     const int status = CheckPlace(entry->node, level);
     if (HFS_UNLIKELY(status != kOk && nodeNum >= tree->validNodes &&
