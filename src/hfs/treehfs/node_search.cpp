@@ -25,9 +25,12 @@ u16 FoldPlain(u32 unit) {
 // asking for each offset which block holds it.
 class OneBlock {
 public:
-    OneBlock(const BTHeaderMem*, const HfsNode* node) : data_(node->bufs[0].data) {}
+    OneBlock(const BTHeaderMem* hdr, const HfsNode* node)
+        : data_(node->bufs[0].data), slots_(data_ + hdr->nodeSize) {}
 
     const u8* At(u32 offset) const { return data_ + offset; }
+    // Slot of record `index` in the lower half, that of the next record in the upper one.
+    u32 SlotPair(u32 index) const { return GetBe32(slots_ - kSlotSize * std::size_t{index + 2}); }
     // Whether the `size` bytes from `offset` on lie in one block, those from `start` to `end` in at
     // most two. REQUIRES of both: they lie inside the node.
     static bool IsWhole(u32, u32) { return true; }
@@ -35,14 +38,22 @@ public:
 
 private:
     const u8* data_;
+    const u8* slots_;  // end of the table
 };
 
 class ManyBlocks {
 public:
     ManyBlocks(const BTHeaderMem* hdr, const HfsNode* node)
-        : bufs_(node->bufs), mask_(hdr->blockMask), shift_(hdr->blockShift) {}
+        : bufs_(node->bufs),
+          nodeSize_(hdr->nodeSize),
+          mask_(hdr->blockMask),
+          shift_(hdr->blockShift) {}
 
     const u8* At(u32 offset) const { return bufs_[offset >> shift_].data + (offset & mask_); }
+    u32 SlotPair(u32 index) const {
+        const u32 slot = nodeSize_ - kSlotSize * (index + 1);
+        return GetBe16(At(slot)) | u32{GetBe16(At(slot - kSlotSize))} << 16;
+    }
     bool IsWhole(u32 offset, u32 size) const { return (offset & mask_) + size <= mask_ + 1; }
     bool IsShort(u32 start, u32 end) const {
         return ((end - 1) >> shift_) - (start >> shift_) <= 1;
@@ -50,27 +61,48 @@ public:
 
 private:
     const HfsBcbBuf* bufs_;
+    u32 nodeSize_;
     u32 mask_;
     u32 shift_;
 };
 
+// Shape of the keys to search: that of a catalog in folded order, by far the most frequent, is
+// known to the compiler.
+struct FoldedKeys {
+    explicit FoldedKeys(const SearchKey&) {}
+    static constexpr u32 kFixed = kCatKeyFixed;
+    static constexpr u32 kNameLengthAt = kCatKeyNameLength;
+    static constexpr u32 Fixed() { return kFixed; }
+    static constexpr u32 NameLengthAt() { return kNameLengthAt; }
+    static int Compare(const SearchKey& key, const BTreeKey* nodeKey) {
+        return key.CompareFolded(nodeKey);
+    }
+};
+struct OtherKeys {
+    explicit OtherKeys(const SearchKey& key)
+        : fixed(key.Fixed()), nameLengthAt(key.NameLengthAt()) {}
+    u32 Fixed() const { return fixed; }
+    u32 NameLengthAt() const { return nameLengthAt; }
+    static int Compare(const SearchKey& key, const BTreeKey* nodeKey) {
+        return key.Compare(nodeKey);
+    }
+    u32 fixed;
+    u32 nameLengthAt;
+};
+
 // The key of record `index` where it lies, null when anything about the record is out of the
 // ordinary: exactly the checks of GetKey, of contiguity and of soundness.
-template <typename Blocks>
+template <typename Blocks, typename Shape>
 class QuickKeys {
 public:
     QuickKeys(const BTHeaderMem* hdr, const HfsNode* node, const SearchKey& key)
-        : blocks_(hdr, node),
-          nodeSize_(hdr->nodeSize),
-          fixed_(key.Fixed()),
-          nameLengthAt_(key.NameLengthAt()) {}
+        : blocks_(hdr, node), shape_(key), nodeSize_(hdr->nodeSize) {}
 
-    // REQUIRES: the slots of record `index` and the next lie inside the node.
-    u32 Slot(u32 index) const { return GetBe16(blocks_.At(SlotAt(index))); }
-
+    // REQUIRES of all: the slots of record `index` and the next lie inside the node.
     [[gnu::always_inline]] const u8* KeyAt(u32 index) const {
-        const u32 start = Slot(index);
-        const u32 end = Slot(index + 1);
+        const u32 slots = blocks_.SlotPair(index);
+        const u32 start = slots & 0xFFFF;
+        const u32 end = slots >> 16;
         if (HFS_UNLIKELY(end >= nodeSize_ || start >= end || (start & 1) != 0) ||
             HFS_UNLIKELY(!blocks_.IsWhole(start, kKeyLengthSize))) {
             return nullptr;
@@ -78,7 +110,8 @@ public:
         const u8* key = blocks_.At(start);
         const u32 keyLength = GetBe16(key);
         const u32 padded = PaddedKeySize(keyLength);
-        if (HFS_UNLIKELY(keyLength - fixed_ > kMaxKeyLength - fixed_ || padded >= end - start) ||
+        if (HFS_UNLIKELY(keyLength - shape_.Fixed() > kMaxKeyLength - shape_.Fixed() ||
+                         padded >= end - start) ||
             HFS_UNLIKELY(!blocks_.IsWhole(start, padded))) {
             return nullptr;
         }
@@ -86,8 +119,8 @@ public:
         if (HFS_UNLIKELY(!blocks_.IsShort(start + padded, end))) {
             return nullptr;
         }
-        if (nameLengthAt_ != 0 &&
-            HFS_UNLIKELY(fixed_ + 2u * GetBe16(key + nameLengthAt_) > keyLength)) {
+        if (shape_.NameLengthAt() != 0 &&
+            HFS_UNLIKELY(shape_.Fixed() + 2u * GetBe16(key + shape_.NameLengthAt()) > keyLength)) {
             return nullptr;
         }
         return key;
@@ -96,8 +129,9 @@ public:
     // Describes record `index`, whose key KeyAt gave, as far as delivery needs it. False: its data
     // does not lie in one block.
     bool Describe(u32 index, const u8* key, NodeKey* out) const {
-        const u32 start = Slot(index);
-        const u32 end = Slot(index + 1);
+        const u32 slots = blocks_.SlotPair(index);
+        const u32 start = slots & 0xFFFF;
+        const u32 end = slots >> 16;
         const u32 padded = PaddedKeySize(GetBe16(key));
         out->offset = start;
         out->size = end - start;
@@ -112,19 +146,16 @@ public:
     }
 
     void Prefetch(u32 index) const {
-        const u32 start = Slot(index);
+        const u32 start = blocks_.SlotPair(index) & 0xFFFF;
         if (start < nodeSize_) {
             __builtin_prefetch(blocks_.At(start));
         }
     }
 
 private:
-    u32 SlotAt(u32 index) const { return nodeSize_ - kSlotSize * (index + 1); }
-
     Blocks blocks_;
+    [[no_unique_address]] Shape shape_;
     u32 nodeSize_;
-    u32 fixed_;
-    u32 nameLengthAt_;
 };
 
 // Asks for the keys that the first probes can meet, all at once: waiting for one after the other is
@@ -168,10 +199,10 @@ SearchKey::SearchKey(const CBTreeHfs* tree, const BTreeKey* key, unsigned id)
     }
     fixed_ = shape.fixed;
     nameLengthAt_ = shape.nameLength;
-    byParentFirst_ = compare_ == CompareCatKeysCaseIns;
+    isFolded_ = compare_ == CompareCatKeysCaseIns;
     // The whole key, not the two bytes of its length field.
     const u8* bytes = reinterpret_cast<const u8*>(key);
-    if (byParentFirst_ && GetHost16(bytes + kCatKeyNameLength) != 0) {
+    if (isFolded_ && GetHost16(bytes + kCatKeyNameLength) != 0) {
         firstUnit_ = FoldPlain(GetHost16(bytes + kCatKeyName));
     }
 }
@@ -192,24 +223,23 @@ inline int SearchKey::CompareFirstUnits(const u8* nodeKey) const {
     return firstUnit_ > unit ? 1 : -1;
 }
 
+inline int SearchKey::CompareFolded(const BTreeKey* nodeKey) const {
+    const int order = CompareFirstUnits(reinterpret_cast<const u8*>(nodeKey));
+    return order != 0 ? order : CompareCatKeysCaseIns(key_, id_, nodeKey);
+}
+
 inline int SearchKey::Compare(const BTreeKey* nodeKey) const {
-    if (byParentFirst_) {
-        const int order = CompareFirstUnits(reinterpret_cast<const u8*>(nodeKey));
-        if (order != 0) {
-            return order;
-        }
-    }
-    return compare_(key_, id_, nodeKey);
+    return isFolded_ ? CompareFolded(nodeKey) : compare_(key_, id_, nodeKey);
 }
 
 namespace {
 
-template <typename Blocks>
+template <typename Blocks, typename Shape>
 int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
     const u32 count = NumRecords(node);
     s32 low = 0;
     s32 high = static_cast<s32>(count) - 1;
-    const QuickKeys<Blocks> keys(&tree->header, node, key);
+    const QuickKeys<Blocks, Shape> keys(&tree->header, node, key);
     const bool quick = HasQuickKeys(tree->header, key, count);
     if (quick) {
         PrefetchFor(keys, Height(node), high);
@@ -227,7 +257,7 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchRes
                 return status;
             }
         }
-        const int order = key.Compare(nodeKey);
+        const int order = Shape::Compare(key, nodeKey);
         if (order == 0) {
             result->found = true;
             result->isLocated =
@@ -251,7 +281,7 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchRes
 template <typename Blocks>
 bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, u32 count,
                 bool* isBehindAll) {
-    const QuickKeys<Blocks> keys(&tree->header, leaf, key);
+    const QuickKeys<Blocks, OtherKeys> keys(&tree->header, leaf, key);
     const u8* last = keys.KeyAt(count - 1);
     if (last == nullptr) {
         return false;
@@ -267,8 +297,11 @@ bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, u32 
 }  // namespace
 
 int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
-    return tree->header.blocksPerNode == 1 ? Search<OneBlock>(tree, node, key, result)
-                                           : Search<ManyBlocks>(tree, node, key, result);
+    if (tree->header.blocksPerNode != 1) {
+        return Search<ManyBlocks, OtherKeys>(tree, node, key, result);
+    }
+    return key.IsFolded() ? Search<OneBlock, FoldedKeys>(tree, node, key, result)
+                          : Search<OneBlock, OtherKeys>(tree, node, key, result);
 }
 
 bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key,

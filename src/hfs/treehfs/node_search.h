@@ -13,6 +13,9 @@ public:
     // Order of the search key against a key of a node, as the tree's comparator has it.
     // REQUIRES: the node key is sound (see scratch.h).
     int Compare(const BTreeKey* nodeKey) const;
+    // The same of a key in folded order, as IsFolded tells.
+    int CompareFolded(const BTreeKey* nodeKey) const;
+    bool IsFolded() const { return isFolded_; }
 
     // Fewest bytes of a sound node key, and where its name length stands (0: it has no name).
     u32 Fixed() const { return fixed_; }
@@ -27,7 +30,7 @@ private:
     u32 fixed_ = 0;
     u32 nameLengthAt_ = 0;
     u16 firstUnit_ = 0;  // folded; 0: the comparator has to decide
-    bool byParentFirst_ = false;
+    bool isFolded_ = false;
 };
 
 // What a search in one node came to.
