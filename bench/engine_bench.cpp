@@ -1,7 +1,7 @@
 // Speed and memory of the engine's operations on a catalog tree in memory: nodes and map blocks of
-// 4,096 bytes, records of 88 to 248 bytes, keys in random order, one core.
+// 4,096 bytes (--node: another size), records of 88 to 248 bytes, keys in random order, one core.
 //
-// usage: engine_bench [--records N[,N...]] [--seed N] [--json FILE]
+// usage: engine_bench [--records N[,N...]] [--node N] [--seed N] [--json FILE]
 //
 // For each number of records: insert all, look all up, look absent keys up, walk, delete half,
 // flush. Every answer is checked; a wrong one ends the run with exit status 1. Times are those of
@@ -26,7 +26,7 @@ namespace VELK::bench {
 
 namespace {
 
-constexpr u32 kNodeShift = 12;
+constexpr u32 kUsualNodeShift = 12;
 constexpr u32 kFolders = 1000;  // parents the names are spread over
 constexpr u32 kFolderRecord = 88;
 constexpr u32 kFileRecord = 248;
@@ -39,6 +39,7 @@ struct Figure {
 
 struct Result {
     u64 records = 0;
+    u32 nodeShift = 0;
     std::vector<Figure> figures;
     u32 depth = 0;
     u32 nodesCached = 0;
@@ -138,7 +139,9 @@ struct ItemRecord {
 
 class Run {
 public:
-    Run(u64 records, u64 seed) : order_(Shuffled(records, seed)), again_(Shuffled(records, ~seed)) {
+    Run(u64 records, u64 seed, u32 nodeShift)
+        : order_(Shuffled(records, seed)), again_(Shuffled(records, ~seed)), volume_(nodeShift) {
+        result_.nodeShift = nodeShift;
         result_.records = records;
         tree_.volume = &volume_.fs;
         tree_.fileId = kCatalogFileId;
@@ -153,7 +156,7 @@ public:
     Run& operator=(const Run&) = delete;
 
     Result Measure(const CountingHeap& heap) {
-        const int status = tree_.Create(kNodeShift, 0, nullptr);
+        const int status = tree_.Create(result_.nodeShift, 0, nullptr);
         if (status != kOk) {
             Stop("create", 0, status);
         }
@@ -230,7 +233,7 @@ private:
         u8 key[kKeyLengthSize + kMaxKeyLength + 2];
         unsigned recordSize = 0;
         unsigned keySize = 0;
-        const u64 first = u64{tree_.header.firstLeafNode} << kNodeShift;
+        const u64 first = u64{tree_.header.firstLeafNode} << tree_.nodeShift;
         int status = tree_.SetPos(first, record, sizeof record, &recordSize, key, sizeof key,
                                   &keySize, &walk);
         u64 count = 0;
@@ -278,7 +281,7 @@ double NanosecondsOf(const Figure& figure) {
 }
 
 double MemoryShare(const Result& result) {
-    const double nodes = static_cast<double>(result.nodesCached) * (1u << kNodeShift);
+    const double nodes = static_cast<double>(result.nodesCached) * (1u << result.nodeShift);
     return (static_cast<double>(result.engineBytes) + nodes) / nodes;
 }
 
@@ -286,14 +289,14 @@ double MemoryShare(const Result& result) {
 constexpr u64 kRecordsInAll = 300'000;
 constexpr u64 kMostRepeats = 15;
 
-Result MeasureOften(u64 count, u64 seed) {
+Result MeasureOften(u64 count, u64 seed, u32 nodeShift) {
     const u64 repeats = std::clamp<u64>(kRecordsInAll / count, 1, kMostRepeats);
     std::vector<Result> results;
     for (u64 i = 0; i < repeats; ++i) {
         CountingHeap counter;
         const HostHeap heap = {CountingHeap::Alloc, CountingHeap::Free, &counter};
         SetHostHeap(&heap);
-        results.push_back(Run(count, seed).Measure(counter));
+        results.push_back(Run(count, seed, nodeShift).Measure(counter));
         SetHostHeap(nullptr);
     }
     Result median = results.front();
@@ -316,7 +319,7 @@ void Print(const Result& result) {
     }
     std::printf("  memory       %.3f times the cached nodes (engine %.1f MiB beside %.1f MiB)\n",
                 MemoryShare(result), static_cast<double>(result.engineBytes) / (1 << 20),
-                static_cast<double>(u64{result.nodesCached} << kNodeShift) / (1 << 20));
+                static_cast<double>(u64{result.nodesCached} << result.nodeShift) / (1 << 20));
 }
 
 bool WriteJson(const char* name, const std::vector<Result>& results) {
@@ -326,10 +329,11 @@ bool WriteJson(const char* name, const std::vector<Result>& results) {
     }
     std::fprintf(file, "[");
     for (const Result& result : results) {
-        std::fprintf(file, "%s{\"records\":%llu,\"depth\":%u,\"nodes_cached\":%u,\"memory\":%.4f",
-                     &result == results.data() ? "" : ",\n",
-                     static_cast<unsigned long long>(result.records), result.depth,
-                     result.nodesCached, MemoryShare(result));
+        std::fprintf(
+            file,
+            "%s{\"records\":%llu,\"node\":%u,\"depth\":%u,\"nodes_cached\":%u,\"memory\":%.4f",
+            &result == results.data() ? "" : ",\n", static_cast<unsigned long long>(result.records),
+            1u << result.nodeShift, result.depth, result.nodesCached, MemoryShare(result));
         for (const Figure& figure : result.figures) {
             std::fprintf(file, ",\"%s\":%.1f", figure.operation, NanosecondsOf(figure));
         }
@@ -350,11 +354,21 @@ std::vector<u64> ParseCounts(const char* text) {
     return counts;
 }
 
+// log2 of a node size, 0 for one that no tree has.
+u32 ShiftOf(unsigned long nodeSize) {
+    u32 shift = 9;
+    while (shift < 15 && (1ul << shift) < nodeSize) {
+        ++shift;
+    }
+    return 1ul << shift == nodeSize ? shift : 0;
+}
+
 }  // namespace
 
 int Main(int argc, char** argv) {
     std::vector<u64> counts = {10'000, 100'000, 1'000'000};
     u64 seed = 1;
+    u32 nodeShift = kUsualNodeShift;
     const char* json = nullptr;
     for (int i = 1; i + 1 < argc; i += 2) {
         const std::string option = argv[i];
@@ -362,19 +376,23 @@ int Main(int argc, char** argv) {
             counts = ParseCounts(argv[i + 1]);
         } else if (option == "--seed") {
             seed = std::strtoull(argv[i + 1], nullptr, 10);
+        } else if (option == "--node") {
+            nodeShift = ShiftOf(std::strtoul(argv[i + 1], nullptr, 10));
         } else if (option == "--json") {
             json = argv[i + 1];
         } else {
             counts.clear();
         }
     }
-    if (counts.empty() || argc % 2 == 0) {
-        std::fprintf(stderr, "usage: engine_bench [--records N[,N...]] [--seed N] [--json FILE]\n");
+    if (counts.empty() || nodeShift == 0 || argc % 2 == 0) {
+        std::fprintf(
+            stderr,
+            "usage: engine_bench [--records N[,N...]] [--node N] [--seed N] [--json FILE]\n");
         return 16;
     }
     std::vector<Result> results;
     for (u64 count : counts) {
-        results.push_back(MeasureOften(count, seed));
+        results.push_back(MeasureOften(count, seed, nodeShift));
         Print(results.back());
     }
     if (results.size() > 1) {

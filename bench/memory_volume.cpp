@@ -11,7 +11,8 @@ namespace VELK::bench {
 
 namespace {
 
-constexpr u64 kVolumeSize = (u64{1} << 30) - 4096;  // below the size that has clumps of its own
+constexpr u64 kClumpSize = (u64{1} << 30) - 4096;  // below the size that has clumps of its own
+constexpr u64 kMostBytes = u64{16} << 30;
 constexpr int kNoRange = 0x101;
 
 }  // namespace
@@ -19,15 +20,15 @@ constexpr int kNoRange = 0x101;
 const HfsVolumeOps MemoryVolume::kVolumeOps = {Map, DirtyMeta, Zero, Resize};
 const HfsCacheOps MemoryVolume::kCacheOps = {Release, Modify, Modify};
 
-MemoryVolume::MemoryVolume() {
+MemoryVolume::MemoryVolume(u32 mapShift) {
     fs.service = {&kVolumeOps, this};
     fs.cache = {&kCacheOps, this};
-    fs.mapBlockShift = kMapShift;
-    fs.mapBlockSize = 1u << kMapShift;
-    fs.allocBlockShift = kMapShift;
-    fs.allocBlockSize = 1u << kMapShift;
-    fs.volumeSize = kVolumeSize;
-    fs.totalBlocks = static_cast<u32>(kVolumeSize >> kMapShift);
+    fs.mapBlockShift = static_cast<u8>(mapShift);
+    fs.mapBlockSize = static_cast<u16>(1u << mapShift);
+    fs.allocBlockShift = static_cast<u8>(mapShift);
+    fs.allocBlockSize = 1u << mapShift;
+    fs.volumeSize = kClumpSize;
+    fs.totalBlocks = static_cast<u32>(kMostBytes >> mapShift);
     fs.defaultClumpSize = 1u << kChunkShift;
     bitmapBytes_.resize((fs.totalBlocks + 7) / 8);
     bitmap_.Attach(bitmapBytes_.data(), fs.totalBlocks);
@@ -46,8 +47,8 @@ int MemoryVolume::Map(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u3
         return kNoRange;
     }
     auto* volume = static_cast<MemoryVolume*>(self);
-    for (u32 i = 0; i < bytes >> kMapShift; ++i) {
-        bufs[i].data = volume->At(byteOffset + (u64{i} << kMapShift));
+    for (u32 i = 0; i < bytes >> fs->mapBlockShift; ++i) {
+        bufs[i].data = volume->At(byteOffset + (u64{i} << fs->mapBlockShift));
         bufs[i].bh = reinterpret_cast<buffer_head*>(bufs[i].data);
     }
     return kOk;
@@ -62,8 +63,8 @@ int MemoryVolume::Zero(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u
     if (byteOffset + bytes > fs->catalogFork.logicalSize) {
         return kNoRange;
     }
-    for (u64 at = byteOffset; at < byteOffset + bytes; at += 1u << kMapShift) {
-        std::memset(static_cast<MemoryVolume*>(self)->At(at), 0, 1u << kMapShift);
+    for (u64 at = byteOffset; at < byteOffset + bytes; at += fs->mapBlockSize) {
+        std::memset(static_cast<MemoryVolume*>(self)->At(at), 0, fs->mapBlockSize);
     }
     return kOk;
 }
@@ -89,7 +90,8 @@ int MemoryVolume::Resize(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8,
         return kErrNoSpace;
     }
     fs->catalogFork.logicalSize = newSize;
-    fs->catalogFork.totalBlocks = static_cast<u32>((newSize + (1u << kMapShift) - 1) >> kMapShift);
+    fs->catalogFork.totalBlocks =
+        static_cast<u32>((newSize + fs->allocBlockSize - 1) >> fs->allocBlockShift);
     return kOk;
 }
 

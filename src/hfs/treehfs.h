@@ -85,6 +85,8 @@ struct HfsNode {
     u32 hintMask;            // entries of `hints` less one
     HfsNodeHint* hints;      // of an index node, in the node's own heap block; null: none
     HfsNodeHint* hintedBy;   // the one hint that leads to this node; null: none
+    HfsNode* left;           // neighbours met in the chain of the node's level, which know this one
+    HfsNode* right;          // as theirs; null: none met
     HfsBcbBuf bufs[1];       // the blocks, in order; blocksPerNode of them
 
     // Accessors (node_access.cpp). They change nothing and return 0 or kErrCorrupt, reported with

@@ -5,6 +5,7 @@
 #include <cstring>
 
 #include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/report.h"
 #include "platform/heap.h"
@@ -85,8 +86,14 @@ void SetHint(HfsNodeHint* places, bool isPair, HfsNode* child) {
     child->hintedBy = hint;
 }
 
-// No hint outlives the node it leads to or the node it belongs to.
+// No hint outlives the node it leads to or the node it belongs to, nor does acquaintance.
 void ForgetHints(HfsNode* node) {
+    if (node->left != nullptr) {
+        node->left->right = nullptr;
+    }
+    if (node->right != nullptr) {
+        node->right->left = nullptr;
+    }
     if (node->hintedBy != nullptr) {
         node->hintedBy->node = nullptr;
     }
@@ -348,10 +355,42 @@ int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNo
         __builtin_prefetch(end - 128);
         __builtin_prefetch(end - 192);
     }
-    CountHit(tree, hint->node);
-    TakeReference(hint->node);
-    *out = hint->node;
+    TakeCached(tree, hint->node, out);
     return kOk;
+}
+
+void Introduce(HfsNode* left, HfsNode* right) {
+    if (left->right != nullptr) {
+        left->right->left = nullptr;
+    }
+    if (right->left != nullptr) {
+        right->left->right = nullptr;
+    }
+    left->right = right;
+    right->left = left;
+}
+
+int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out) {
+    const u32 nodeNum = side == Side::kRight ? FLink(node) : BLink(node);
+    HfsNode* known = KnownSibling(node, side, nodeNum);
+    if (known != nullptr) {
+        TakeCached(tree, known, out);
+        return kOk;
+    }
+    const int status = FetchNode(tree, nodeNum, NodeUse::kRead, out);
+    if (status == kOk && *out != node) {
+        side == Side::kRight ? Introduce(node, *out) : Introduce(*out, node);
+    }
+    return status;
+}
+
+void PrefetchSibling(const CBTreeHfs* tree, const HfsNode* node, Side side) {
+    const HfsNode* known = side == Side::kRight ? node->right : node->left;
+    if (known != nullptr) {
+        const u8* data = known->bufs[0].data;
+        __builtin_prefetch(data);
+        __builtin_prefetch(data + tree->header.blockSize - 64);
+    }
 }
 
 int CBTreeHfs::GetINode(unsigned nodeNum, HfsNode** out, bool makeEmpty) {

@@ -24,6 +24,13 @@ inline void TakeReference(HfsNode* node) {
     node->refCount = node->refCount > 0 ? node->refCount + 1 : 1;
 }
 
+// A request met by a node known to be cached.
+inline void TakeCached(CBTreeHfs* tree, HfsNode* node, HfsNode** out) {
+    CountHit(tree, node);
+    TakeReference(node);
+    *out = node;
+}
+
 // What a node is requested for. An index node gets room for hints in its heap block, which has to
 // be known before the node is read.
 enum class NodeUse {
@@ -36,6 +43,22 @@ int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out);
 
 // GetINode of a child of `parent`, by its hint when there is one; of the root with no parent.
 int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNode** out);
+
+// Neighbours in the chain of a level know each other from splits and from having met. What a node
+// knows is only a way round the search by number: its links on disk decide.
+enum class Side { kLeft, kRight };
+
+// The neighbour of `node` on one side when it is known and has this number, else null.
+inline HfsNode* KnownSibling(const HfsNode* node, Side side, u32 nodeNum) {
+    HfsNode* known = side == Side::kRight ? node->right : node->left;
+    return known != nullptr && known->nodeNum == nodeNum ? known : nullptr;
+}
+// Makes two nodes known to each other in place of those they knew.
+void Introduce(HfsNode* left, HfsNode* right);
+// GetINode of the node that `node` links to on one side. REQUIRES: there is such a link.
+int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out);
+// Asks for the memory of the neighbour of `node`, if it is known.
+void PrefetchSibling(const CBTreeHfs* tree, const HfsNode* node, Side side);
 
 // Links `node` into the tree of cached nodes by its number. False: the number is there already.
 bool LinkNode(CBTreeHfs* tree, HfsNode* node);

@@ -82,6 +82,11 @@ int HandOver(CBTreeHfs* tree, HfsNode* node) {
 
 int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset, unsigned length) {
     const u64 end = static_cast<u64>(offset) + length;
+    // A change marks its node several times in a row; nothing is left to do after the first.
+    if (header.blocksPerNode == 1 && offset < header.blockSize && end <= header.blockSize &&
+        node->bufs[0].dirty && modifiedList.prev == &node->modifiedLink) {
+        return kOk;
+    }
     HFS_ASSERT(offset <= header.nodeSize, 776);
     HFS_ASSERT(end <= header.nodeSize, 777);
     if (offset > header.nodeSize || end > header.nodeSize) {

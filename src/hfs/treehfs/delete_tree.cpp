@@ -35,7 +35,7 @@ int Unlink(CBTreeHfs* tree, HfsNode* node) {
     const u32 next = FLink(node);
     if (previous != 0) {
         NodeRef left;
-        HFS_TRY(tree->GetINode(previous, left.Out(), false), 4846);
+        HFS_TRY(FetchSibling(tree, node, Side::kLeft, left.Out()), 4846);
         if (FLink(left.Get()) != node->nodeNum || !IsSiblingOf(left.Get(), node)) {
             return Fail(kErrInvalid, kReasonInvalid, 9260);
         }
@@ -47,7 +47,7 @@ int Unlink(CBTreeHfs* tree, HfsNode* node) {
     }
     if (next != 0) {
         NodeRef right;
-        HFS_TRY(tree->GetINode(next, right.Out(), false), 4859);
+        HFS_TRY(FetchSibling(tree, node, Side::kRight, right.Out()), 4859);
         if (BLink(right.Get()) != node->nodeNum || !IsSiblingOf(right.Get(), node)) {
             return Fail(kErrInvalid, kReasonInvalid, 9261);
         }

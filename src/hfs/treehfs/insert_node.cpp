@@ -1,6 +1,7 @@
 // Puts one record into one node or, when it is full, shares with its left sibling, else splits it
 // into a new right sibling. A full root is split the same way and gets a new root above. What the
 // parent has to learn of it is told, not done: see insert_level.cpp.
+#include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/map_walk.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
@@ -61,7 +62,7 @@ int LendLeft(CBTreeHfs* tree, const InsertKey& key, HfsNode* node, int index, co
         return kOk;
     }
     NodeRef left;
-    HFS_TRY(tree->GetINode(BLink(node), left.Out(), false), 4351);
+    HFS_TRY(FetchSibling(tree, node, Side::kLeft, left.Out()), 4351);
     HFS_TRY(CheckLeftSibling(left.Get(), node), 4362);
     if (key.secondKeyFollows) {
         return kOk;
@@ -86,10 +87,11 @@ int LinkRight(CBTreeHfs* tree, HfsNode* node, HfsNode* fresh) {
     const u32 next = FLink(node);
     if (next != 0) {
         NodeRef right;
-        HFS_TRY(tree->GetINode(next, right.Out(), false), 4413);
+        HFS_TRY(FetchSibling(tree, node, Side::kRight, right.Out()), 4413);
         HFS_TRY(CheckRightSibling(right.Get(), node), 4424);
         HFS_TRY(tree->SetDirty(right.Get(), 0), 4428);
         SetBLink(hdr, right.Get(), fresh->nodeNum);
+        Introduce(fresh, right.Get());
     }
     HFS_TRY(tree->SetDirty(fresh, 0), 9230);
     SetFLink(hdr, fresh, next);
@@ -98,6 +100,7 @@ int LinkRight(CBTreeHfs* tree, HfsNode* node, HfsNode* fresh) {
     SetHeight(hdr, fresh, Height(node));
     HFS_TRY(tree->SetDirty(node, 0), 4449);
     SetFLink(hdr, node, fresh->nodeNum);
+    Introduce(node, fresh);
     if (IsLeaf(fresh) && next == 0) {
         tree->header.lastLeafNode = fresh->nodeNum;
         tree->isDirty = true;

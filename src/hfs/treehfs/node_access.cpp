@@ -66,6 +66,45 @@ int SplitRecord(const BTHeaderMem* hdr, const HfsNode* node, NodeKey* out) {
     return kOk;
 }
 
+// GetKey of a node in one block, as far as nothing about the record is out of the ordinary. False:
+// the long way round has to tell what it is.
+bool GetPlainKey(const BTHeaderMem* hdr, const HfsNode* node, u32 index, NodeKey* out) {
+    const u32 nodeSize = hdr->nodeSize;
+    const u64 fromEnd = static_cast<u64>(index) * kSlotSize + 2 * kSlotSize;
+    if (hdr->blockSize != nodeSize || index >= NumRecords(node) || fromEnd >= nodeSize ||
+        IsKeyless(node, static_cast<int>(index))) {
+        return false;
+    }
+    u8* data = node->bufs[0].data;
+    u8* slots = data + nodeSize - fromEnd;
+    const u32 end = GetBe16(slots);
+    const u32 start = GetBe16(slots + kSlotSize);
+    if (end >= nodeSize || start >= end) {
+        return false;
+    }
+    const u32 keyLength = GetBe16(data + start);
+    const u32 padded = PaddedKeySize(keyLength);
+    if (end - start <= padded) {
+        return false;
+    }
+    out->offset = start;
+    out->firstBytes = nodeSize - start;
+    out->ptr = data + start;
+    out->next1 = nullptr;
+    out->next2 = nullptr;
+    out->size = end - start;
+    out->entryPos = nodeSize - static_cast<u32>(fromEnd) + kSlotSize;
+    out->entry = slots + kSlotSize;
+    out->entryBytes = static_cast<u32>(fromEnd) - kSlotSize;
+    out->keySize = keyLength + kKeyLengthSize;
+    out->dataSize = end - start - padded;
+    out->dataFirstBytes = nodeSize - start - padded;
+    out->data = data + start + padded;
+    out->dataNext1 = nullptr;
+    out->dataNext2 = nullptr;
+    return true;
+}
+
 }  // namespace
 
 unsigned GetKeyLength(const BTHeaderMem* hdr, const BTreeKey* key, bool leaf) {
@@ -79,6 +118,9 @@ unsigned GetKeyLengthLe(const BTHeaderMem* hdr, const BTreeKey* key, bool leaf) 
 }
 
 int HfsNode::GetKey(const BTHeaderMem* hdr, int index, NodeKey* out) const {
+    if (hdr->blocksPerNode == 1 && GetPlainKey(hdr, this, static_cast<u32>(index), out)) {
+        return kOk;
+    }
     if (HFS_UNLIKELY(index < 0 || static_cast<u32>(index) >= NumRecords(this))) {
         AssertFailed(410);
         if (index < 0) {

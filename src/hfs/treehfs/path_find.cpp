@@ -150,17 +150,21 @@ int CheckLevel(int level) {
     return kOk;
 }
 
-int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, HfsNode* parent, HfsFindData* path) {
+int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, HfsNode* parent, HfsFindData* path,
+              HfsNode* known) {
     HfsFindLevel* entry = &path->path[level];
     entry->index = 0;
     ReleaseNode(entry->node);
     entry->node = nullptr;
     const u32 readBefore = tree->readCount;
     const NodeUse use = level > 1 ? NodeUse::kReadIndex : NodeUse::kRead;
-    const bool isOnTheWayDown = parent != nullptr || nodeNum == tree->header.rootNode;
-    HFS_TRY(isOnTheWayDown ? FetchChild(tree, parent, nodeNum, use, &entry->node)
-                           : FetchNode(tree, nodeNum, use, &entry->node),
-            2909);
+    if (known != nullptr) {
+        TakeCached(tree, known, &entry->node);
+    } else if (parent != nullptr || nodeNum == tree->header.rootNode) {
+        HFS_TRY(FetchChild(tree, parent, nodeNum, use, &entry->node), 2909);
+    } else {
+        HFS_TRY(FetchNode(tree, nodeNum, use, &entry->node), 2909);
+    }
     const int status = CheckPlace(entry->node, level);
     if (HFS_UNLIKELY(status != kOk && nodeNum >= tree->validNodes &&
                      tree->readCount != readBefore)) {

@@ -26,11 +26,15 @@ void LeaveLeaf(CBTreeHfs* tree, HfsFindData* path) {
     }
 }
 
-// Steps from the current leaf to node `sibling`; the index becomes 0.
-int EnterLeaf(CBTreeHfs* tree, u32 sibling, HfsFindData* path) {
+// Steps from the current leaf to node `sibling` on one side; the index becomes 0.
+int EnterLeaf(CBTreeHfs* tree, u32 sibling, Side side, HfsFindData* path) {
+    HfsNode* known = KnownSibling(path->path[1].node, side, sibling);
     LeaveLeaf(tree, path);
     path->leadsAsOf = 0;
-    return LoadLevel(tree, 1, sibling, nullptr, path);
+    if (known != nullptr) {
+        PrefetchSibling(tree, known, side);  // the one after
+    }
+    return LoadLevel(tree, 1, sibling, nullptr, path, known);
 }
 
 // A chain of leaves cannot be longer than the tree has nodes: a longer one is a ring.
@@ -55,7 +59,7 @@ int StepForward(CBTreeHfs* tree, u32 count, HfsFindData* path) {
         }
         int status = CountHop(tree, &hops);
         if (status == kOk) {
-            status = EnterLeaf(tree, next, path);
+            status = EnterLeaf(tree, next, Side::kRight, path);
         }
         HFS_TRY(status, 3286);
         path->valid = true;
@@ -82,7 +86,7 @@ int StepBackward(CBTreeHfs* tree, u32 count, HfsFindData* path) {
         }
         int status = CountHop(tree, &hops);
         if (status == kOk) {
-            status = EnterLeaf(tree, previous, path);
+            status = EnterLeaf(tree, previous, Side::kLeft, path);
         }
         HFS_TRY(status, 3257);
         path->valid = true;

@@ -11,7 +11,7 @@
 #include <numeric>
 #include <string>
 
-#include "stores/store.h"
+#include "../stores/store.h"
 
 namespace {
 
@@ -41,7 +41,8 @@ public:
             InsertTail(false);
         } else {
             // Calls go to records in another order than they came in.
-            const std::uint32_t present = operation == "absent" ? load_.count - calls_ : load_.count;
+            const std::uint32_t present =
+                operation == "absent" ? load_.count - calls_ : load_.count;
             Insert(0, present, false);
             const std::vector<std::uint32_t> again = bench::Shuffled(load_.count, 11);
             Measure(operation, operation == "absent" ? &order_[present] : again.data());
