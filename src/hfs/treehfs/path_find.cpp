@@ -39,6 +39,18 @@ int CheckPlace(const HfsNode* node, int level) {
     return kOk;
 }
 
+// Brings a node by the shortest way there is.
+int FetchForLevel(CBTreeHfs* tree, u32 nodeNum, HfsNode* parent, HfsNode* known, NodeUse use,
+                  HfsNode** out) {
+    if (known != nullptr) {
+        TakeCached(tree, known, out);
+        return kOk;
+    }
+    const bool hasHint = parent != nullptr || nodeNum == tree->header.rootNode;
+    return hasHint ? FetchChild(tree, parent, nodeNum, use, out)
+                   : FetchNode(tree, nodeNum, use, out);
+}
+
 void DeliverFoundKey(const CBTreeHfs* tree, const SearchResult& found, void* keyOut,
                      unsigned* keyOutSize) {
     const u32 size = found.record.keySize;
@@ -158,13 +170,7 @@ int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, HfsNode* parent, HfsFindD
     entry->node = nullptr;
     const u32 readBefore = tree->readCount;
     const NodeUse use = level > 1 ? NodeUse::kReadIndex : NodeUse::kRead;
-    if (known != nullptr) {
-        TakeCached(tree, known, &entry->node);
-    } else if (parent != nullptr || nodeNum == tree->header.rootNode) {
-        HFS_TRY(FetchChild(tree, parent, nodeNum, use, &entry->node), 2909);
-    } else {
-        HFS_TRY(FetchNode(tree, nodeNum, use, &entry->node), 2909);
-    }
+    HFS_TRY(FetchForLevel(tree, nodeNum, parent, known, use, &entry->node), 2909);
     const int status = CheckPlace(entry->node, level);
     if (HFS_UNLIKELY(status != kOk && nodeNum >= tree->validNodes &&
                      tree->readCount != readBefore)) {
