@@ -297,11 +297,13 @@ bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, u32 
 }  // namespace
 
 int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
-    if (tree->header.blocksPerNode != 1) {
-        return Search<ManyBlocks, OtherKeys>(tree, node, key, result);
+    const bool isWhole = tree->header.blocksPerNode == 1;
+    if (key.IsFolded()) {
+        return isWhole ? Search<OneBlock, FoldedKeys>(tree, node, key, result)
+                       : Search<ManyBlocks, FoldedKeys>(tree, node, key, result);
     }
-    return key.IsFolded() ? Search<OneBlock, FoldedKeys>(tree, node, key, result)
-                          : Search<OneBlock, OtherKeys>(tree, node, key, result);
+    return isWhole ? Search<OneBlock, OtherKeys>(tree, node, key, result)
+                   : Search<ManyBlocks, OtherKeys>(tree, node, key, result);
 }
 
 bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key,
