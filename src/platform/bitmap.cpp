@@ -21,11 +21,31 @@ u64 LoadWord(const unsigned char* bytes) {
     return word;
 }
 
+// Skips whole groups of four words in which every bit is as `skip` says: in a long map that is in
+// use nearly everything is skipped. `bit` and what comes back stand at the start of a byte.
+unsigned long SkipEqual(const unsigned char* bits, unsigned long bit, unsigned long count,
+                        bool skip) {
+    constexpr unsigned kWords = 4;
+    const u64 equal = skip ? ~u64{0} : 0;
+    for (; count - bit >= kWords * kWordBits; bit += kWords * kWordBits) {
+        u64 words[kWords];
+        std::memcpy(words, bits + bit / 8, sizeof words);
+        if (((words[0] ^ equal) | (words[1] ^ equal) | (words[2] ^ equal) | (words[3] ^ equal)) !=
+            0) {
+            break;
+        }
+    }
+    return bit;
+}
+
 // First bit in first .. count - 1 that differs from `skip`, `count` when there is none.
 unsigned long FindOther(const unsigned char* bits, unsigned long first, unsigned long count,
                         bool skip) {
     const u64 invert = skip ? ~u64{0} : 0;
     unsigned long bit = first;
+    if (bit % 8 == 0 && bit < count) {
+        bit = SkipEqual(bits, bit, count, skip);
+    }
     while (bit < count) {
         unsigned long found;
         if (bit % 8 == 0 && count - bit >= kWordBits) {
