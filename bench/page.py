@@ -41,7 +41,8 @@ def stores_table(name):
         ratio = rate(stores["treehfs"], operation)[0] / rate(stores["lmdb"], operation)[0]
         mark = "" if ratio >= goal else " (missed)"
         lines.append(f"| {operation} | " + " | ".join(cells) + f" | {ratio:.2f} | {goal}{mark} |")
-    for title, key, unit in (("peak memory, MiB", "peakKiB", 1 << 10), ("size, MiB", "bytes", 1 << 20)):
+    sizes = (("peak memory, MiB", "peakKiB", 1 << 10), ("size, MiB", "bytes", 1 << 20))
+    for title, key, unit in sizes:
         cells = (f"{statistics.median(result[key] for result in results) / unit:,.0f}"
                  for results in stores.values())
         lines.append(f"| {title} | " + " | ".join(cells) + " | | |")
@@ -95,7 +96,8 @@ def plot(name, key, title):
 
 
 def main():
-    plot("engine-records.json", "records", "nanoseconds an operation, by records (4,096-byte nodes)")
+    plot("engine-records.json", "records",
+         "nanoseconds an operation, by records (4,096-byte nodes)")
     plot("engine-nodes.json", "node", "nanoseconds an operation, by node size (100,000 records)")
     parts = {"stores-1000000": stores_table("stores-1000000.json"),
              "stores-100000": stores_table("stores-100000.json"),
