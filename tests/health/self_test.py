@@ -12,6 +12,7 @@ import layers
 import lengths
 import links
 import sites
+import stack
 import symbols
 
 sys.path.append(str(pathlib.Path(__file__).resolve().parents[2] / "tools"))
@@ -187,6 +188,22 @@ class Symbols(unittest.TestCase):
     def test_anything_else_fails(self):
         for name in ("malloc", "_Znwm", "__cxa_throw", "_ZTVN10__cxxabiv1E", "printf", "memchr"):
             self.assertEqual(symbols.judge({name}, set()), [f"undefined symbol {name}"])
+
+
+class Stack(unittest.TestCase):
+    LISTING = ("0000 <Small()>:\n  0: push   %rbp\n  1: sub    $0x7f8,%rsp\n"
+               "0010 <Large(int)>:\n 10: push   %rbp\n 11: push   %r12\n 13: sub $0x7f8,%rsp\n"
+               " 20: sub    $0xffffffffffffff80,%rsp\n 24: sub    $0x9000,%rax\n")
+
+    def test_frame_of_the_limit_passes(self):
+        self.assertEqual(stack.judge({"Small()": 2048}, 2048), [])
+
+    def test_larger_frame_fails(self):
+        self.assertEqual(stack.judge(stack.frames(self.LISTING), 2048),
+                         ["Large(int) takes 2056 bytes of stack, more than 2048"])
+
+    def test_library_without_functions_fails(self):
+        self.assertEqual(stack.judge(stack.frames("nothing"), 2048), ["no functions found"])
 
 
 class Layers(Tree):
