@@ -45,7 +45,7 @@ Runner::Runner(const RunSetup& setup) : setup_(setup), record_(32768) {}
 
 Runner::~Runner() {
     cursor_.ClearPath();
-    if (tree_ != nullptr) {
+    if (object_ != nullptr) {
         faults_->FailNone();
         heap_.FailNone();
         tree_->ReleaseSpace(&reserve_);
@@ -76,7 +76,8 @@ void Runner::Start() {
     volume_ = std::make_unique<MemVolume>(options);
     faults_ = std::make_unique<FaultService>(&volume_->fs);
     faults_->FailNone();
-    tree_ = std::make_unique<CBTreeHfs>();
+    object_ = std::make_unique<CBTreeHfs>();
+    tree_ = Metered(object_.get());
     tree_->volume = &volume_->fs;
     tree_->fileId = setup_.fileId;
     tree_->convert = ConvertFor(setup_.fileId);

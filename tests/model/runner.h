@@ -80,7 +80,8 @@ private:
     Capture capture_;
     std::unique_ptr<MemVolume> volume_;
     std::unique_ptr<FaultService> faults_;
-    std::unique_ptr<CBTreeHfs> tree_;
+    std::unique_ptr<CBTreeHfs> object_;
+    Metered tree_{nullptr};  // every call held to its bounds
     HfsFindData cursor_;
     BTReserve reserve_{};
     bool reserved_ = false;

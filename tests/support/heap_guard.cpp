@@ -3,16 +3,31 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdlib>
 #include <cstring>
 
 namespace VELK::test {
 
-HeapGuard::HeapGuard() : heap_{OnAlloc, OnFree, this}, before_(SetHostHeap(&heap_)) {}
+namespace {
+
+HeapGuard* currentGuard = nullptr;
+
+}  // namespace
+
+HeapGuard* HeapGuard::Current() {
+    return currentGuard;
+}
+
+HeapGuard::HeapGuard()
+    : heap_{OnAlloc, OnFree, this}, before_(SetHostHeap(&heap_)), outer_(currentGuard) {
+    currentGuard = this;
+}
 
 HeapGuard::~HeapGuard() {
     EXPECT_EQ(live_.size(), 0u) << "blocks of the engine's heap were never given back";
     SetHostHeap(before_);
+    currentGuard = outer_;
 }
 
 void HeapGuard::FailNth(u32 nth, bool forever) {
@@ -35,7 +50,9 @@ void* HeapGuard::OnAlloc(void* self, std::size_t size) {
     void* memory = std::malloc(size);
     if (memory != nullptr) {
         std::memset(memory, 0xA7, size);  // nobody may rely on zeroed memory
-        guard->live_.insert(memory);
+        guard->live_.emplace(memory, size);
+        guard->liveBytes_ += size;
+        guard->peakBytes_ = std::max(guard->peakBytes_, guard->liveBytes_);
     }
     return memory;
 }
@@ -44,7 +61,14 @@ void HeapGuard::OnFree(void* self, void* memory) {
     if (memory == nullptr) {
         return;
     }
-    EXPECT_EQ(static_cast<HeapGuard*>(self)->live_.erase(memory), 1u) << "freed twice or foreign";
+    HeapGuard* guard = static_cast<HeapGuard*>(self);
+    const auto block = guard->live_.find(memory);
+    if (block == guard->live_.end()) {
+        ADD_FAILURE() << "freed twice or foreign";
+    } else {
+        guard->liveBytes_ -= block->second;
+        guard->live_.erase(block);
+    }
     std::free(memory);
 }
 

@@ -3,7 +3,7 @@
 #pragma once
 
 #include <cstddef>
-#include <unordered_set>
+#include <unordered_map>
 
 #include "platform/host/host.h"
 #include "platform/types.h"
@@ -24,14 +24,23 @@ public:
 
     u32 Allocations() const { return allocations_; }  // all so far, refused ones included
     std::size_t Live() const { return live_.size(); }
+    // Most bytes that were out at once since the last ResetPeak.
+    std::size_t PeakBytes() const { return peakBytes_; }
+    void ResetPeak() { peakBytes_ = liveBytes_; }
+
+    // The one that stands in now; null: none.
+    static HeapGuard* Current();
 
 private:
     static void* OnAlloc(void* self, std::size_t size);
     static void OnFree(void* self, void* memory);
 
-    std::unordered_set<void*> live_;
+    std::unordered_map<void*, std::size_t> live_;  // bytes by block
+    std::size_t liveBytes_ = 0;
+    std::size_t peakBytes_ = 0;
     HostHeap heap_;
     const HostHeap* before_;
+    HeapGuard* outer_;
     u32 allocations_ = 0;
     u32 failIn_ = 0;
     bool forever_ = false;

@@ -118,7 +118,9 @@ void MemVolume::Restore(const Snapshot& snapshot) {
 
 void MemVolume::Note(Call call, u64 offset, u64 bytes, bool noRead) {
     counts_[static_cast<int>(call)] += 1;
-    calls_.push_back({call, offset, bytes, noRead});
+    if (options.listsCalls) {
+        calls_.push_back({call, offset, bytes, noRead});
+    }
 }
 
 MemVolume::Block* MemVolume::Find(buffer_head* bh, const char* what) {

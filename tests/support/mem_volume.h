@@ -14,6 +14,7 @@
 
 #include "hfs/treehfs.h"
 #include "image_bytes.h"
+#include "metered.h"
 #include "tree_image.h"
 
 namespace VELK::test {
@@ -58,6 +59,7 @@ struct MemVolumeOptions {
     u64 maxFileSize = ~0ull;  // Resize beyond fails
     u8 stale = 0xE5;          // what freshly allocated disk bytes hold
     u32 misalign = 0;         // bytes every block is off its alignment
+    bool listsCalls = true;   // for TakeCalls; otherwise they are only counted
 };
 
 class MemVolume {
@@ -133,12 +135,13 @@ private:
     u32 counts_[kCallKinds] = {};
 };
 
-// A tree object of a volume, with the hooks of ConvertFor; torn down at its end.
+// A tree object of a volume, with the hooks of ConvertFor; torn down at its end. What is called
+// through it is held to its bounds.
 class TestTree {
 public:
     TestTree(MemVolume* volume, u32 fileId);
     ~TestTree();
-    CBTreeHfs* operator->() { return &tree; }
+    Metered::Call operator->() { return Metered::Call(&tree); }
     CBTreeHfs& operator*() { return tree; }
 
     CBTreeHfs tree;
