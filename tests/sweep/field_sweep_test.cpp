@@ -1,0 +1,179 @@
+// Every field of every kind of node gets the values it should not have, one at a time and in pairs;
+// then everything is called (trial.h). TREEHFS_SWEEP=all goes through all values of 16-bit fields
+// and all pairs; without it a sample of both is tried.
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <string>
+
+#include "fields.h"
+#include "keys.h"
+#include "tree_image.h"
+#include "trial.h"
+
+namespace VELK::test {
+
+namespace {
+
+bool SweepsAll() {
+    const char* text = std::getenv("TREEHFS_SWEEP");
+    return text != nullptr && std::string(text) == "all";
+}
+
+struct SweepSetup {
+    u32 fileId;
+    u32 nodeSize;
+};
+
+class FieldSweep : public ::testing::TestWithParam<SweepSetup> {
+protected:
+    // Three levels, two of them index nodes, and a map node more than needed.
+    static TreeImage Sound(const SweepSetup& setup) {
+        TreeShape shape;
+        shape.fileId = setup.fileId;
+        shape.nodeSize = setup.nodeSize;
+        shape.recordsPerLeaf = 2;
+        shape.childrenPerIndex = 2;
+        shape.mapNodes = 1;
+        shape.freeNodes = 3;
+        std::vector<TreeRecord> records = NthRecords(shape.fileId, 8, kExtentRecordSize);
+        if (shape.fileId == kExtentsFileId) {
+            for (u32 n = 0; n < 3; ++n) {
+                records[n].key = DiskExtKey(kForkData, kBadBlockFileId, n * 8);
+            }
+        }
+        return BuildTree(shape, records);
+    }
+
+    FieldSweep() : sound_(Sound(GetParam())), trial_(GetParam().fileId, 512) {
+        const u32 middleLeaf = sound_.levels[1][1];
+        nodes_ = {0,
+                  sound_.levels[1][0],
+                  middleLeaf,
+                  sound_.levels[2][0],
+                  sound_.rootNode,
+                  sound_.mapNodes[0]};
+    }
+
+    std::vector<Field> FieldsOf(u32 nodeNum) const {
+        return FieldsOfNode(sound_.Node(nodeNum).data(), sound_.shape.nodeSize,
+                            sound_.shape.fileId);
+    }
+    // The field's place in the file.
+    Field InFile(u32 nodeNum, Field field) const {
+        field.offset += nodeNum * sound_.shape.nodeSize;
+        return field;
+    }
+    // Whole sweeps take hours: how far this one is.
+    void Tell(const char* what, u64 number, u64 of) const {
+        if (SweepsAll()) {
+            std::printf(
+                "%s %llu of %llu, %llu trials\n", what, static_cast<unsigned long long>(number),
+                static_cast<unsigned long long>(of), static_cast<unsigned long long>(trials_));
+            std::fflush(stdout);
+        }
+    }
+    void Try(const TreeImage& image, u32 nodeNum) {
+        trial_.RunTree(image.bytes, nodeNum);
+        trial_.RunNode(image.Node(nodeNum), nodeNum == 0 ? 0 : 1);
+        trials_ += 1;
+    }
+    void TryValue(u32 nodeNum, const Field& field, u64 value) {
+        TreeImage image = sound_;
+        SetField(image.bytes.data(), InFile(nodeNum, field), value);
+        Try(image, nodeNum);
+        ASSERT_FALSE(HasFailure())
+            << "node " << nodeNum << ", " << field.name << " at " << field.offset << " = " << value;
+    }
+
+    TreeImage sound_;
+    Trial trial_;
+    std::vector<u32> nodes_;  // header, leaves, index, root, map
+    u64 trials_ = 0;
+};
+
+// A few values for pairs: the ends, the neighbours of what is there, the tree's and node's ends.
+std::vector<u64> FewValues(const Field& field, u64 old, const TreeImage& image) {
+    const u64 all = field.width == 4 ? 0xFFFFFFFFu : (u64{1} << (8 * field.width)) - 1;
+    return {0, (old + 1) & all, field.width == 4 ? image.totalNodes : image.shape.nodeSize & all,
+            all};
+}
+
+}  // namespace
+
+TEST_P(FieldSweep, AnyFieldMayHoldAnyValue) {
+    trial_.RunTree(sound_.bytes, 1);
+    ASSERT_FALSE(HasFailure()) << "the sound tree";
+    // 65,536 values where nodes have 512 bytes; 251 is prime, so samples meet every residue.
+    const u32 step = !SweepsAll() ? 6007 : GetParam().nodeSize == 512 ? 1 : 251;
+    for (const u32 nodeNum : nodes_) {
+        for (const Field& field : FieldsOf(nodeNum)) {
+            const u64 old = GetField(sound_.bytes.data(), InFile(nodeNum, field));
+            if (SweepsAll() || field.width != 2) {
+                for (const u64 value :
+                     BoundaryValues(field, old, sound_.shape.nodeSize, sound_.totalNodes)) {
+                    TryValue(nodeNum, field, value);
+                }
+            }
+            const u32 count = field.width == 1 ? 256 : field.width == 2 ? 65536 : 0;
+            for (u32 value = field.offset % step; value < count; value += step) {
+                TryValue(nodeNum, field, value);
+                if (HasFatalFailure()) {
+                    return;
+                }
+            }
+            Tell("node", nodeNum, sound_.totalNodes);
+        }
+    }
+    std::printf("%llu trials, fields by themselves\n", static_cast<unsigned long long>(trials_));
+}
+
+TEST_P(FieldSweep, AnyTwoFieldsMayBeWrongTogether) {
+    struct Change {
+        u32 node;
+        Field field;
+        u64 value;
+    };
+    std::vector<Change> changes;
+    for (const u32 nodeNum : nodes_) {
+        for (const Field& field : FieldsOf(nodeNum)) {
+            const u64 old = GetField(sound_.bytes.data(), InFile(nodeNum, field));
+            for (const u64 value : FewValues(field, old, sound_)) {
+                changes.push_back({nodeNum, InFile(nodeNum, field), value});
+            }
+        }
+    }
+    const u64 all = u64{changes.size()} * changes.size();
+    const u64 step = SweepsAll() ? 1 : all / 800 | 1;
+    for (u64 pair = 0; pair < all; pair += step) {
+        const Change& one = changes[static_cast<std::size_t>(pair / changes.size())];
+        const Change& two = changes[static_cast<std::size_t>(pair % changes.size())];
+        if (pair % (1u << 18) < step) {
+            Tell("pair", pair, all);
+        }
+        if (one.field.offset >= two.field.offset) {
+            continue;  // tried the other way round, or the same field
+        }
+        TreeImage image = sound_;
+        SetField(image.bytes.data(), one.field, one.value);
+        SetField(image.bytes.data(), two.field, two.value);
+        Try(image, two.node);
+        ASSERT_FALSE(HasFailure())
+            << one.field.name << " at " << one.field.offset << " = " << one.value << " and "
+            << two.field.name << " at " << two.field.offset << " = " << two.value;
+    }
+    std::printf("%llu trials, pairs of fields\n", static_cast<unsigned long long>(trials_));
+}
+
+INSTANTIATE_TEST_SUITE_P(Trees, FieldSweep,
+                         ::testing::Values(SweepSetup{kCatalogFileId, 512},
+                                           SweepSetup{kExtentsFileId, 512},
+                                           SweepSetup{kAttributesFileId, 512},
+                                           SweepSetup{kCatalogFileId, 1024}),
+                         [](const auto& setup) {
+                             return "File" + std::to_string(setup.param.fileId) + "By" +
+                                    std::to_string(setup.param.nodeSize);
+                         });
+
+}  // namespace VELK::test
