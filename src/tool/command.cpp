@@ -31,19 +31,6 @@ u32 NarrowOption(const Invocation& call, const char* name, const std::optional<u
 
 }  // namespace
 
-u32 TreeIdFromText(const std::string& text) {
-    if (text == "catalog" || text == "c") {
-        return kCatalogFileId;
-    }
-    if (text == "extents" || text == "e") {
-        return kExtentsFileId;
-    }
-    if (text == "attributes" || text == "a") {
-        return kAttributesFileId;
-    }
-    return 0;
-}
-
 Invocation::Invocation(const Command& theCommand, std::vector<std::string> arguments)
     : command(theCommand), words(arguments), options(theCommand, std::move(arguments)) {}
 

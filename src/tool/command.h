@@ -11,6 +11,7 @@
 
 #include "tool/options.h"
 #include "tool/output.h"
+#include "tool/tree_name.h"
 
 namespace VELK::tool {
 
@@ -98,8 +99,5 @@ private:
     std::string colorWord_ = "auto";
     std::string progressWord_ = "auto";
 };
-
-// File ID of "catalog", "extents", "attributes" or "c", "e", "a"; 0: none of them.
-u32 TreeIdFromText(const std::string& text);
 
 }  // namespace VELK::tool

@@ -6,10 +6,10 @@
 
 #include "hfs/records/quoted.h"
 #include "platform/error.h"
-#include "tool/command.h"
 #include "tool/errors.h"
 #include "tool/script_lex.h"
 #include "tool/script_words.h"
+#include "tool/tree_name.h"
 
 namespace VELK::tool {
 namespace {

@@ -5,10 +5,10 @@
 #include "hfs/records/key_text.h"
 #include "hfs/records/record_text.h"
 #include "platform/error.h"
-#include "tool/command.h"
 #include "tool/errors.h"
 #include "tool/script.h"
 #include "tool/script_words.h"
+#include "tool/tree_name.h"
 
 namespace VELK::tool {
 namespace {
