@@ -1,5 +1,5 @@
 // What the fuzz targets share: taking an input apart, checks that end the run, an engine that says
-// nothing and whose memory is counted.
+// nothing and whose memory is counted (quiet.h).
 #pragma once
 
 #include <gtest/gtest.h>
@@ -7,9 +7,8 @@
 #include <cstdio>
 #include <cstdlib>
 
-#include "heap_guard.h"
 #include "image_bytes.h"
-#include "platform/host/host.h"
+#include "quiet.h"
 
 // A target: looks at one input. Ends the process when an answer is wrong.
 extern "C" int LLVMFuzzerTestOneInput(const VELK::u8* data, std::size_t size);
@@ -54,27 +53,10 @@ private:
     std::size_t left_;
 };
 
-// No report, no trace; the heap of the engine is counted, and at the end nothing may be left and
-// no service of the volume may have been used against its contract.
-class Quiet {
-public:
-    Quiet() : before_(SetHostSinks(&kSilent)) {}
-    ~Quiet() { SetHostSinks(before_); }
-    Quiet(const Quiet&) = delete;
-    Quiet& operator=(const Quiet&) = delete;
+using test::Quiet;
 
-private:
-    static void NoText(void*, const char*) {}
-    static void NoLog(void*, void*, const char*) {}
-    static void NoDump(void*, const void*, unsigned) {}
-    static void NoError(void*, unsigned, const char*, int) {}
-
-    static constexpr HostSinks kSilent = {NoError, NoText, NoLog, NoDump, nullptr};
-    const HostSinks* before_;
-    test::HeapGuard heap_;
-};
-
-// To be called once everything of a run is gone.
+// To be called once everything of a run is gone: no leak, no bound broken, no service of the volume
+// used against its contract.
 inline void CheckNothingFailed() {
     FUZZ_CHECK(!::testing::Test::HasFailure());
 }

@@ -9,6 +9,8 @@
 #include "hfs/check/check.h"
 #include "hfs/volume/image_volume.h"
 #include "keys.h"
+#include "metered.h"
+#include "mutate.h"
 
 namespace {
 
@@ -25,7 +27,7 @@ struct alignas(8) Buffers {
     unsigned keySize;
 };
 
-void Walk(ImageVolume* volume, CBTreeHfs* tree) {
+void Walk(ImageVolume* volume, test::Metered tree) {
     Buffers at = {};
     HfsFindData path;
     const unsigned long long first = static_cast<u64>(tree->header.firstLeafNode)
@@ -40,7 +42,7 @@ void Walk(ImageVolume* volume, CBTreeHfs* tree) {
     path.ClearPath();
 }
 
-void Change(ImageVolume* volume, CBTreeHfs* tree, u8 what) {
+void Change(ImageVolume* volume, test::Metered tree, u8 what) {
     for (u32 n = 0; n < 12 && volume->IsWritable(); ++n) {
         const test::HostKey key = test::NthHostKey(tree->fileId, n);
         const test::Bytes record = test::Pattern(88, n);
@@ -108,9 +110,9 @@ void Run(fuzz::Input* input) {
         CBTreeHfs* tree = volume->Tree(fileId, &trouble);
         FUZZ_CHECK(tree != nullptr || !trouble.Text().empty());
         if (tree != nullptr) {
-            Walk(volume.get(), tree);
+            Walk(volume.get(), test::Metered(tree));
             if ((how & 1) != 0 && fileId != kExtentsFileId) {
-                Change(volume.get(), tree, what);
+                Change(volume.get(), test::Metered(tree), what);
             }
         }
     }
@@ -126,4 +128,31 @@ extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
     }
     fuzz::CheckNothingFailed();
     return 0;
+}
+
+// Fields of the volume's header, or of one of the trees it leads to.
+extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::size_t most,
+                                               unsigned seed) {
+    fuzz::Mutator mutator(seed);
+    constexpr std::size_t kControl = 2;
+    if (size < kControl + kHeaderOffset + kHeaderSize || mutator.OneIn(4)) {
+        return LLVMFuzzerMutate(data, size, most);
+    }
+    if (mutator.OneIn(8)) {
+        LLVMFuzzerMutate(data, kControl, kControl);
+    }
+    u8* image = data + kControl;
+    VolumeHeader header = {};
+    DecodeHeader(image + kHeaderOffset, &header);
+    const u32 fileId = kTrees[mutator.Below(3)];
+    const HfsFork& fork = *header.ForkOf(fileId);
+    const u64 start = u64{fork.extents[0].startBlock} * header.blockSize;
+    const u64 length = u64{fork.extents[0].blockCount} * header.blockSize;
+    const u64 imageSize = size - kControl;
+    if (mutator.OneIn(4) || start >= imageSize || length > imageSize - start) {
+        mutator.Field(image + kHeaderOffset, test::FieldsOfVolumeHeader(), 512, header.totalBlocks);
+        return size;
+    }
+    mutator.TreeFile(image + start, static_cast<std::size_t>(length), fileId);
+    return size;
 }

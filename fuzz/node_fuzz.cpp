@@ -1,8 +1,9 @@
 // The accessors on the bytes of one node, whatever they are: every answer lies inside the node, and
 // a node of many blocks gives the same answers as the same node in one block.
 //
-// Input: geometry, node number, then the node.
+// Input: geometry, node number, two pairs of a record and an offset to ask for, then the node.
 #include "fuzz.h"
+#include "mutate.h"
 #include "node_image.h"
 
 namespace {
@@ -52,11 +53,26 @@ void CheckAlike(const Answers& one, const Answers& many) {
     FUZZ_CHECK(one.sizeStatus == many.sizeStatus && one.size == many.size);
 }
 
-void Look(const test::Bytes& bytes, u32 mapBlock, u32 nodeNum) {
-    const test::LooseNode one(bytes, static_cast<u32>(bytes.size()), nodeNum);
+// What one input asks for: records and offsets of its own, beside those at the ends.
+struct Questions {
+    int index[2];
+    u32 offset[2];
+};
+
+void CheckOffset(const test::LooseNode& node, u32 nodeSize, u32 offset) {
+    NodePtr place = {};
+    const int status = node->GetPtr(node.Hdr(), offset, &place);
+    FUZZ_CHECK(status == kOk || offset >= nodeSize);
+    FUZZ_CHECK(status != kOk || offset == nodeSize || place.ptr == node.At(offset));
+}
+
+void Look(const test::Bytes& bytes, u32 mapBlock, u32 nodeNum, const Questions& questions) {
+    const u32 nodeSize = static_cast<u32>(bytes.size());
+    const test::LooseNode one(bytes, nodeSize, nodeNum);
     const test::LooseNode many(bytes, mapBlock, nodeNum);
-    const int slots = static_cast<int>(bytes.size() / kSlotSize);
-    for (int index = -1; index <= slots; ++index) {
+    const int last = static_cast<int>(test::Get16(bytes, kDescNumRecords));
+    for (const int index :
+         {-1, 0, 1, last - 1, last, last + 1, questions.index[0], questions.index[1]}) {
         const Answers alone = Ask(one, index);
         const Answers split = Ask(many, index);
         if (alone.keyStatus == kOk) {
@@ -67,10 +83,9 @@ void Look(const test::Bytes& bytes, u32 mapBlock, u32 nodeNum) {
         }
         CheckAlike(alone, split);
     }
-    for (u32 offset = 0; offset <= bytes.size() + 1; ++offset) {
-        NodePtr place = {};
-        const int status = many->GetPtr(many.Hdr(), offset, &place);
-        FUZZ_CHECK(status != kOk || offset == bytes.size() || place.ptr == many.At(offset));
+    for (const u32 offset :
+         {nodeSize - 1, nodeSize, nodeSize + 1, questions.offset[0], questions.offset[1]}) {
+        CheckOffset(many, nodeSize, offset);
     }
     unsigned freeOne = 0;
     unsigned freeMany = 0;
@@ -87,12 +102,29 @@ extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
     const u32 nodeSize = kSizes[geometry & 3];
     const u32 mapBlock = 512u << ((geometry >> 2) & 3);
     const u32 nodeNum = input.U8() & 1;
+    Questions questions = {};
+    for (u32 i = 0; i < 2; ++i) {
+        questions.index[i] = static_cast<int>(input.U16()) - 0x4000;
+        questions.offset[i] = input.U16();
+    }
     test::Bytes bytes = input.Rest(nodeSize);
     bytes.resize(nodeSize);
     {
         const fuzz::Quiet quiet;
-        Look(bytes, mapBlock < nodeSize ? mapBlock : nodeSize, nodeNum);
+        Look(bytes, mapBlock < nodeSize ? mapBlock : nodeSize, nodeNum, questions);
     }
     fuzz::CheckNothingFailed();
     return 0;
+}
+
+extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::size_t most,
+                                               unsigned seed) {
+    fuzz::Mutator mutator(seed);
+    constexpr std::size_t kControl = 10;
+    const u32 nodeSize = size > 0 ? kSizes[data[0] & 3] : 0;
+    if (size < kControl + nodeSize || nodeSize == 0 || mutator.OneIn(3)) {
+        return LLVMFuzzerMutate(data, size, most);
+    }
+    mutator.Node(data + kControl, nodeSize, kCatalogFileId, nodeSize);
+    return size;
 }

@@ -6,6 +6,7 @@
 #include "fuzz.h"
 #include "keys.h"
 #include "mem_volume.h"
+#include "mutate.h"
 
 namespace {
 
@@ -23,7 +24,7 @@ struct alignas(8) Buffers {
     unsigned keySize;
 };
 
-void Walk(CBTreeHfs* tree, int step, u32 firstNode) {
+void Walk(test::Metered tree, int step, u32 firstNode) {
     Buffers at = {};
     HfsFindData path;
     const unsigned long long position = static_cast<u64>(firstNode) << tree->nodeShift;
@@ -37,7 +38,7 @@ void Walk(CBTreeHfs* tree, int step, u32 firstNode) {
     path.ClearPath();
 }
 
-void Search(CBTreeHfs* tree) {
+void Search(test::Metered tree) {
     Buffers at = {};
     for (u32 n = 0; n < kKeys; ++n) {
         const test::HostKey key = test::NthHostKey(tree->fileId, n * 3, n % 2 == 0);
@@ -53,7 +54,7 @@ bool IsAnswer(int status) {
 }
 
 // Changes until one fails, then restores, as a volume does. False: restored.
-bool Change(CBTreeHfs* tree, test::MemVolume* volume, u8 pattern) {
+bool Change(test::Metered tree, test::MemVolume* volume, u8 pattern) {
     if (tree->Flush(0) != kOk) {
         return false;
     }
@@ -83,22 +84,24 @@ void Run(fuzz::Input* input) {
     test::MemVolumeOptions options;
     options.mapBlockSize = 512u << (geometry & 3);
     options.allocBlockSize = options.mapBlockSize;
+    options.listsCalls = false;
     options.totalBlocks = 4096;
     options.hasJournal = (geometry & 4) != 0;
     test::MemVolume volume(options);
     volume.LoadFile(fileId, input->Rest(kMostBytes));
     {
-        test::TestTree tree(&volume, fileId);
+        test::TestTree owner(&volume, fileId);
+        const test::Metered tree(&owner.tree);
         if (tree->Init() == kOk) {
-            Walk(&*tree, 1, tree->header.firstLeafNode);
-            Walk(&*tree, -1, tree->header.lastLeafNode);
-            Search(&*tree);
+            Walk(tree, 1, (*tree).header.firstLeafNode);
+            Walk(tree, -1, (*tree).header.lastLeafNode);
+            Search(tree);
             if (fileId == kExtentsFileId) {
                 HfsRuns runs;
                 tree->LoadBadBlocks(&runs);
             }
-            if ((pattern & 1) != 0 && Change(&*tree, &volume, pattern)) {
-                Walk(&*tree, 1, tree->header.firstLeafNode);
+            if ((pattern & 1) != 0 && Change(tree, &volume, pattern)) {
+                Walk(tree, 1, (*tree).header.firstLeafNode);
             }
         }
     }
@@ -119,4 +122,18 @@ extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
     }
     fuzz::CheckNothingFailed();
     return 0;
+}
+
+extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::size_t most,
+                                               unsigned seed) {
+    fuzz::Mutator mutator(seed);
+    constexpr std::size_t kControl = 3;
+    if (size <= kControl || mutator.OneIn(4)) {
+        return LLVMFuzzerMutate(data, size, most);
+    }
+    if (mutator.OneIn(8)) {
+        LLVMFuzzerMutate(data, kControl, kControl);
+    }
+    mutator.TreeFile(data + kControl, size - kControl, kFiles[data[0] % 3]);
+    return size;
 }

@@ -2,6 +2,8 @@
 // is then read without the engine and compared record by record.
 //
 // Input: tree kind, geometry, then operations of three bytes: what, key, size.
+#include <algorithm>
+#include <cstring>
 #include <map>
 
 #include "capture.h"
@@ -10,6 +12,7 @@
 #include "keys.h"
 #include "ledger.h"
 #include "mem_volume.h"
+#include "mutate.h"
 
 namespace {
 
@@ -33,7 +36,7 @@ public:
         mostData_ = shape.nodeSize / 4;
         volume_.LoadTree(test::BuildTree(shape, {}));
         test::TestTree tree(&volume_, fileId_);
-        tree_ = &*tree;
+        tree_ = test::Metered(&tree.tree);
         FUZZ_CHECK(tree_->Init() == kOk);
         for (u32 i = 0; i < kMostOperations && !input->IsEmpty(); ++i) {
             Operate(input);
@@ -46,6 +49,7 @@ private:
         test::MemVolumeOptions options;
         options.mapBlockSize = 512u << (geometry & 3);
         options.allocBlockSize = options.mapBlockSize;
+        options.listsCalls = false;
         options.totalBlocks = 1u << 15;
         options.hasJournal = (geometry & 4) != 0;
         return options;
@@ -152,7 +156,7 @@ private:
     u8 geometry_;
     u32 mostData_ = 0;
     test::MemVolume volume_;
-    CBTreeHfs* tree_ = nullptr;
+    test::Metered tree_{nullptr};
     std::map<u32, test::Bytes> model_;
     alignas(8) u8 record_[8192] = {};
 };
@@ -167,4 +171,37 @@ extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
     }
     fuzz::CheckNothingFailed();
     return 0;
+}
+
+// Operations are repeated, exchanged, given another key or verb, as wholes.
+extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::size_t most,
+                                               unsigned seed) {
+    fuzz::Mutator mutator(seed);
+    constexpr std::size_t kControl = 2;
+    constexpr u32 kOperation = 3;
+    const u32 count = size > kControl ? static_cast<u32>(size - kControl) / kOperation : 0;
+    if (count < 2 || mutator.OneIn(4)) {
+        return LLVMFuzzerMutate(data, size, most);
+    }
+    const auto at = [data](u32 index) { return data + kControl + std::size_t{index} * kOperation; };
+    const u32 first = mutator.Below(count);
+    const u32 second = mutator.Below(count);
+    switch (mutator.Below(4)) {
+        case 0:
+            at(first)[0] = static_cast<u8>(mutator.Below(256));
+            break;
+        case 1:
+            at(first)[1] = at(second)[1];
+            at(first)[0] = static_cast<u8>((at(second)[0] & 0xF0) | (at(first)[0] & 0x0F));
+            break;
+        case 2:
+            std::swap_ranges(at(first), at(first) + kOperation, at(second));
+            break;
+        default: {
+            const u32 most3 = std::min(count - first, count - second);
+            const u32 copied = 1 + mutator.Below(most3);
+            std::memmove(at(first), at(second), std::size_t{copied} * kOperation);
+        }
+    }
+    return size;
 }

@@ -11,8 +11,17 @@
 #include <vector>
 
 #include "fuzz.h"
+#include "mutate.h"
+
+// Targets without a mutation of their own are varied byte by byte.
+extern "C" __attribute__((weak)) std::size_t LLVMFuzzerCustomMutator(VELK::u8* data,
+                                                                     std::size_t size,
+                                                                     std::size_t most,
+                                                                     unsigned seed);
 
 namespace {
+
+std::mt19937 randomBytes(1);
 
 using Bytes = VELK::test::Bytes;
 
@@ -36,8 +45,8 @@ void RunOne(const Bytes& input) {
 constexpr VELK::u8 kTelling[] = {0x00, 0x01, 0x02, 0x0E, 0x7F, 0x80, 0xF8, 0xFE, 0xFF};
 
 // A few small changes in places near each other or far apart.
-Bytes Vary(Bytes input, std::mt19937* random) {
-    const auto below = [random](std::size_t limit) { return (*random)() % limit; };
+Bytes VaryBytes(Bytes input) {
+    const auto below = [](std::size_t limit) { return randomBytes() % limit; };
     if (input.empty()) {
         return input;
     }
@@ -67,18 +76,37 @@ Bytes Vary(Bytes input, std::mt19937* random) {
     return input;
 }
 
+// As libFuzzer does: the target's own mutation, where it has one.
+Bytes Vary(Bytes input) {
+    if (LLVMFuzzerCustomMutator == nullptr) {
+        return VaryBytes(std::move(input));
+    }
+    constexpr std::size_t kGrowth = 64;
+    const std::size_t size = input.size();
+    input.resize(size + kGrowth);
+    const unsigned seed = static_cast<unsigned>(randomBytes());
+    input.resize(LLVMFuzzerCustomMutator(input.data(), size, input.size(), seed));
+    return input;
+}
+
 }  // namespace
+
+extern "C" std::size_t LLVMFuzzerMutate(VELK::u8* data, std::size_t size, std::size_t most) {
+    const Bytes varied = VaryBytes(Bytes(data, data + size));
+    const std::size_t kept = std::min(varied.size(), most);
+    std::copy_n(varied.begin(), kept, data);
+    return kept;
+}
 
 int main(int argc, char** argv) {
     unsigned long variations = 0;
-    std::mt19937 random(1);
     std::vector<std::filesystem::path> files;
     for (int i = 1; i < argc; ++i) {
         const std::string argument = argv[i];
         if (argument == "--variations" && i + 1 < argc) {
             variations = std::strtoul(argv[++i], nullptr, 10);
         } else if (argument == "--seed" && i + 1 < argc) {
-            random.seed(static_cast<unsigned>(std::strtoul(argv[++i], nullptr, 10)));
+            randomBytes.seed(static_cast<unsigned>(std::strtoul(argv[++i], nullptr, 10)));
         } else if (std::filesystem::is_directory(argument)) {
             for (const auto& entry : std::filesystem::directory_iterator(argument)) {
                 files.push_back(entry.path());
@@ -93,7 +121,7 @@ int main(int argc, char** argv) {
         const Bytes input = ReadAll(file);
         RunOne(input);
         for (unsigned long i = 0; i < variations; ++i) {
-            RunOne(Vary(input, &random));
+            RunOne(Vary(input));
         }
         runs += 1 + variations;
     }

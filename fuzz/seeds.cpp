@@ -2,6 +2,7 @@
 #include <filesystem>
 #include <fstream>
 
+#include "disk_builder.h"
 #include "fuzz.h"
 #include "hfs/volume/make_volume.h"
 #include "journal_base.h"
@@ -36,12 +37,13 @@ void Nodes() {
         leaf.records.push_back(test::Record(key, test::Pattern(10 + 4 * n, n)));
         index.records.push_back(test::Record(key, 5 + n));
     }
-    Write("node", "leaf", {0, 0}, leaf.Build(512));
-    Write("node", "leaf-of-two-blocks", {1, 0}, leaf.Build(1024));
-    Write("node", "index", {0, 0}, index.Build(512));
-    Write("node", "index-of-eight-blocks", {2, 0}, index.Build(4096));
+    Write("node", "leaf", {0, 0, 0x40, 2, 0, 14, 0x40, 3, 1, 255}, leaf.Build(512));
+    Write("node", "leaf-of-two-blocks", {1, 0, 0x40, 2, 0, 14, 0x40, 3, 1, 255}, leaf.Build(1024));
+    Write("node", "index", {0, 0, 0x40, 2, 0, 14, 0x40, 3, 1, 255}, index.Build(512));
+    Write("node", "index-of-eight-blocks", {2, 0, 0x40, 2, 0, 14, 0x40, 3, 1, 255},
+          index.Build(4096));
     test::TreeShape shape;
-    Write("node", "header", {0, 1}, test::BuildTree(shape, {}).Node(0));
+    Write("node", "header", {0, 1, 0, 2, 0, 14, 0, 3, 1, 255}, test::BuildTree(shape, {}).Node(0));
 }
 
 void Trees() {
@@ -118,6 +120,51 @@ void Journals() {
     Write("journal", "both-mended", {3}, Bytes(journal, journal + 5120));
 }
 
+// The head of each kind of disk, and the volume's header sector.
+void Finder() {
+    const Bytes volume = test::DiskVolume{}.Build();
+    const Bytes sector(volume.begin() + 1024, volume.begin() + 1536);
+    const auto write = [&sector](const char* name, const Bytes& control, Bytes disk,
+                                 std::size_t head) {
+        disk.resize(head);
+        Bytes body = sector;
+        test::AppendBytes(&body, disk);
+        Write("finder", name, control, body);
+    };
+    const Bytes usual = {0, 17 << 2, 1};
+    write("bare", usual, volume, 2048);
+    write("apm", usual, test::InApm(volume, 512), 2560);
+    write("apm-2048", usual, test::InApm(volume, 2048), 8192);
+    write("gpt", usual, test::InGpt(volume, 512), 2048);
+    write("gpt-chosen", {4, 17 << 2, 1}, test::InGpt(volume, 512), 2048);
+    write("mbr", usual, test::InMbr(volume), 512);
+    write("mbr-lenient", {1, 17 << 2, 1}, test::InMbr(volume), 512);
+    write("wrapper", usual, test::InWrapper(volume), 2048);
+    write("nothing", usual, Bytes(1024), 1024);
+}
+
+void Scripts() {
+    const std::pair<const char*, const char*> scripts[] = {
+        {"keys",
+         "use extents\ninsert 16:data:0 extents{[[1,2],[9,4]]}\nuse attributes\n"
+         "insert 37:\"com.example.tag\" inline{\"text\"}\nfind 37:big:8\nuse catalog\n"
+         "get hex:0008000000020001\nseek first\nnext 3\nprev\nhere\npos\ngoto 4294967296\n"},
+        {"changes",
+         "#!treehfs apply --script 1\ncreate catalog node=512\nrepeat 20\n"
+         "insert 2:\"n$i\" file{id:$i,size:1107,data:[[17,1]]} # a comment\nexpect ok\n"
+         "repeat 2\nfind $j:x$i\nend\nend\nupdate 2:n1 zero:248\ndelete 2:n2\nflush\n"
+         "replace 2:n3 folder{id:9,valence:3,created:\"2001-01-01T00:00:00\"}\nexpect exists\n"},
+        {"looks",
+         "state\nheader\nnode 0\ncheck full\nstats\ndigest\nshow data\nset strict\n"
+         "echo $i anything\nwalk 5\nreserve 3\nrelease\nextend 20\nclear\nrestore\nreopen\n"
+         "badblocks\nfail alloc 3\nwalk 2 back\n"},
+    };
+    for (const auto& [name, text] : scripts) {
+        const std::string all = text;
+        Write("script", name, {4}, Bytes(all.begin(), all.end()));
+    }
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
@@ -132,6 +179,8 @@ int main(int argc, char** argv) {
     Operations();
     Images();
     Journals();
+    Finder();
+    Scripts();
     Write("canary", "harmless", {}, {'b', 'i', 'r'});
     return 0;
 }
