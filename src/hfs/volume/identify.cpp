@@ -63,6 +63,11 @@ bool Matches(BlockDevice* image, u64 offset, const Signature& signature) {
 
 Content Identify(BlockDevice* image, u64 offset, std::string* name) {
     u8 head[kHeaderSize];
+    // A map may place a partition anywhere in 64 bits, where sums begin at 0 again.
+    if (offset >= image->Size()) {
+        *name = "nothing known";
+        return Content::kUnknown;
+    }
     name->clear();
     if (image->Read(offset + kHeaderOffset, head, sizeof head).Ok()) {
         switch (Be16(head)) {
