@@ -13,6 +13,7 @@ import statistics
 
 DOCS = pathlib.Path(__file__).resolve().parents[1] / "docs"
 FIGURES = DOCS / "benchmarks"
+PICTURES = DOCS / "pictures"
 GOALS = {"load in key order": 0.9, "load in random order": 1.1, "lookup, existing": 1.15,
          "lookup, absent": 1.15, "full scan": 1.4, "folder listing": 1.4, "update in place": 1.3,
          "delete half": 1.4, "delete all": 1.4}
@@ -91,7 +92,7 @@ def plot(name, key, title):
                      + " ".join(f"{x:.1f},{y:.1f}" for x, y in points) + '"/>'
                      f'<text x="{width - 104}" y="{points[-1][1] + 4:.1f}" fill="{colour}">'
                      f'{operation}</text>')
-    (FIGURES / name.replace(".json", ".svg")).write_text("\n".join(parts) + "\n</svg>\n",
+    (PICTURES / name.replace(".json", ".svg")).write_text("\n".join(parts) + "\n</svg>\n",
                                                          encoding="utf-8")
 
 
