@@ -148,12 +148,13 @@ TEST_F(Export, WrongLinesAreNamed) {
         "{\"schema\":\"treehfs.records/1\",\"tree\":\"catalog\",\"node_size\":4096,"
         "\"compare\":\"case-insensitive\"}\n";
     EXPECT_EQ(Imported(header + "{\"type\":\"file\"}\n", {"--new", "1M"}).err,
-              "treehfs: FILE: line 2: a record without a key\n");
-    EXPECT_EQ(
-        Imported(header + "{\"key\":{\"parent\":2,\"name\":\"a\"}}\n", {"--new", "1M"}).err,
-        "treehfs: FILE: line 2: a record without data: neither raw nor a type of this tree\n");
+              "treehfs: FILE: line 2: a record without a key: nothing was kept\n");
+    EXPECT_EQ(Imported(header + "{\"key\":{\"parent\":2,\"name\":\"a\"}}\n", {"--new", "1M"}).err,
+              "treehfs: FILE: line 2: a record without data: neither raw nor a type of this tree: "
+              "nothing was kept\n");
     EXPECT_EQ(Imported(header + "{\"key\":{\"name\":\"a\"},\"raw\":\"00\"}\n", {"--new", "1M"}).err,
-              "treehfs: FILE: line 2: key ':\"a\"': expected PARENT:NAME, for example 2:alpha\n");
+              "treehfs: FILE: line 2: key ':\"a\"': expected PARENT:NAME, for example 2:alpha: "
+              "nothing was kept\n");
     EXPECT_EQ(Imported("{\"schema\":\"treehfs.records/1\",\"tree\":\"x\"}\n", {"--new", "1M"}).err,
               "treehfs: FILE: line 1: the header names no tree\n");
 }

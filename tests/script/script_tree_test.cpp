@@ -44,7 +44,7 @@ TEST(ScriptTree, ReservationsHaveOwners) {
               "1 reserve 00000000 ok owner=yes nodes=4\n"
               "2 reserve 00000000 ok owner=no nodes=0\n"
               "3 header 00000000 ok node=512 map=512 maxkey=516 clump=8192 type=00 compare=CF "
-              "attributes=6 valid=2 cached=0 reserved=6\n"
+              "attributes=6 valid=16 cached=0 reserved=6\n"
               "4 release 00000000 ok nodes=0\n"
               "5 release 00000000 ok nodes=4\n"
               "6 release A0000101 invalid held=none\n");
