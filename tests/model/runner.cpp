@@ -178,11 +178,13 @@ Runner::Outcome Runner::Audit() {
         return "contract: " + volume_->breaches.front();
     }
     const Bytes file = Present();
-    for (const u8 byte : file) {
-        Digest(byte);
-    }
-    for (const u32 nodeNum : ModifiedNodes(*tree_)) {
-        Digest(nodeNum);
+    if (setup_.isDigested) {
+        for (const u8 byte : file) {
+            Digest(byte);
+        }
+        for (const u32 nodeNum : ModifiedNodes(*tree_)) {
+            Digest(nodeNum);
+        }
     }
     if (Outcome outcome = Check(file)) {
         return outcome;

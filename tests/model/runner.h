@@ -20,6 +20,7 @@ namespace VELK::test {
 struct RunSetup {
     u32 fileId;
     Geometry geometry;
+    bool isDigested = false;  // sum up what can be observed; bytes cost time
 };
 
 class Runner {
@@ -32,7 +33,7 @@ public:
 
     // A number that everything observable of the run so far went into: node requests, header
     // fields, what was reported and asserted, the calls the volume saw, and with each audit every
-    // byte of the tree.
+    // byte of the tree. REQUIRES: the set-up asked for it.
     u64 Digest() const { return digest_; }
 
 private:
