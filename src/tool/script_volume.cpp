@@ -11,6 +11,7 @@
 #include "tool/errors.h"
 #include "tool/options.h"
 #include "tool/undo_file.h"
+#include "tool/write_gate.h"
 
 namespace VELK::tool {
 namespace {
@@ -147,7 +148,8 @@ void TargetOptions::DeclareForImage(Invocation* call) {
     call->options.Text("--undo", &undoFile, "FILE",
                        "with --write: keep what is overwritten, for the command undo");
     call->options.Flag("--force", &force,
-                       "write to a volume with a journal or not unmounted; replace FILE");
+                       "write to a damaged volume, one with a journal or not unmounted; replace "
+                       "FILE");
 }
 
 std::string TargetOptions::Subject(const Invocation& call) const {
@@ -192,6 +194,9 @@ std::unique_ptr<ImageVolume> OpenTarget(const Invocation& call, const TargetOpti
     open.partition = call.partition;
     open.backupHeader = call.backupHeader;
     open.mapBlockSize = call.mapBlockSize;
+    if (options.write) {
+        CheckBeforeWriting(call.image, open);
+    }
     Problem problem;
     std::unique_ptr<ImageVolume> volume =
         options.undoFile.empty() ? ImageVolume::OpenFile(call.image, open, nullptr, &problem)

@@ -69,7 +69,11 @@ struct VolumeImage {
     std::vector<TreeRecord> attributes;
     bool isHfsx = false;
     bool hasAttributes = true;
-    u32 catalogPieces = 1;   // runs the catalog file is laid out in
+    u32 catalogPieces = 1;     // runs the catalog file is laid out in
+    u32 childrenPerIndex = 0;  // of the catalog; 0: as many as fit
+    u32 freeNodes = 8;         // of the catalog
+    u32 totalBlocks = kTotalBlocks;
+    u32 dataStart = kDataStart;
     std::vector<u32> owned;  // blocks of files, to be marked used
 
     // Lays everything out. `bytes` and the trees below are there afterwards.

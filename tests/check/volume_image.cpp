@@ -112,15 +112,15 @@ void VolumeImage::PutHeader() {
     Put32(&bytes, kHeader + 32, files);
     Put32(&bytes, kHeader + 36, folders - 1);
     Put32(&bytes, kHeader + 40, kBlockSize);
-    Put32(&bytes, kHeader + 44, kTotalBlocks);
+    Put32(&bytes, kHeader + 44, totalBlocks);
     Put32(&bytes, kHeader + 48, static_cast<u32>(std::count(used_.begin(), used_.end(), false)));
     Put32(&bytes, kHeader + 64, nextId);
 }
 
 void VolumeImage::Build() {
-    bytes.assign(static_cast<std::size_t>(kTotalBlocks) * kBlockSize, 0);
-    used_.assign(kTotalBlocks, false);
-    for (u32 block : {0u, 1u, 2u, 3u, kTotalBlocks - 2, kTotalBlocks - 1}) {
+    bytes.assign(static_cast<std::size_t>(totalBlocks) * kBlockSize, 0);
+    used_.assign(totalBlocks, false);
+    for (u32 block : {0u, 1u, 2u, 3u, totalBlocks - 2, totalBlocks - 1}) {
         used_[block] = true;
     }
     for (u32 block : owned) {
@@ -128,6 +128,8 @@ void VolumeImage::Build() {
     }
     TreeShape shape;
     shape.keyCompareType = isHfsx ? kKeyCompareBinary : kKeyCompareFolding;
+    shape.childrenPerIndex = childrenPerIndex;
+    shape.freeNodes = freeNodes;
     catalogTree = BuildTree(shape, catalog);
     catalogStart = 4;
     u32 next = catalogStart;
@@ -164,7 +166,7 @@ void VolumeImage::Build() {
         forks[3] = ForkData({{attributesStart, blocks}}, kBlockSize);
         next += blocks;
     }
-    if (next > kDataStart) {
+    if (next > dataStart) {
         throw std::length_error("the trees reach into the data");
     }
     PutHeader();
@@ -172,7 +174,7 @@ void VolumeImage::Build() {
         std::copy(forks[i].begin(), forks[i].end(),
                   bytes.begin() + kForks + static_cast<long>(80 * i));
     }
-    for (u32 block = 0; block < kTotalBlocks; ++block) {
+    for (u32 block = 0; block < totalBlocks; ++block) {
         if (used_[block]) {
             u8& marks = bytes[3 * kBlockSize + block / 8];
             marks = static_cast<u8>(marks | (0x80u >> (block % 8)));

@@ -55,6 +55,10 @@ const std::vector<Problem>& ImageVolume::Notes() const {
     return state_->notes;
 }
 
+const Problem& ImageVolume::WriteObstacle() const {
+    return state_->writeObstacle;
+}
+
 bool ImageVolume::IsTruncated() const {
     return state_->isTruncated;
 }

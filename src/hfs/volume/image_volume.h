@@ -87,7 +87,10 @@ public:
     // Things a user should know although the volume opened: a truncated image, a journal that is
     // not empty, overlapping forks, ...
     const std::vector<Problem>& Notes() const;
-    bool IsTruncated() const;             // the image ends before the volume does
+    bool IsTruncated() const;  // the image ends before the volume does
+    // Why Access::kWrite with the same options is refused. No problem: it is not, or the volume
+    // was opened read-only.
+    const Problem& WriteObstacle() const;
     const JournalState& Journal() const;  // as found at mount, and what became of it
     // The alternate header; null when it cannot be read. `*offset` (optional): its image offset.
     const VolumeHeader* AlternateHeader(u64* offset) const;

@@ -86,6 +86,9 @@ Problem ImageVolume::State::Replay() {
         if (onMedium && !options.force) {
             return note;
         }
+        if (onMedium) {
+            note.advice = "written to all the same, without what follows there";
+        }
         notes.push_back(note);
     }
     const VolumeHeader before = header;

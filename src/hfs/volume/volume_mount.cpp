@@ -66,8 +66,19 @@ Problem TruncatedNote(u64 imageSize, const VolumePlace& place, u64 end) {
     return note;
 }
 
+bool Overlap(u64 start, u64 count, u64 otherStart, u64 otherCount) {
+    return count != 0 && otherCount != 0 && start < otherStart + otherCount &&
+           otherStart < start + count;
+}
+
+Problem OverlapNote(const std::string& what) {
+    Problem note = Failure(what, "run check");
+    note.check = "V04";
+    return note;
+}
+
 // Extents of different special files that claim the same blocks.
-void NoteOverlaps(const VolumeHeader& header, std::vector<Problem>* notes) {
+void NoteSharedBlocks(const VolumeHeader& header, std::vector<Problem>* notes) {
     for (std::size_t i = 0; i < kSpecialFileIds.size(); ++i) {
         for (std::size_t j = i + 1; j < kSpecialFileIds.size(); ++j) {
             const HfsFork* a = header.ForkOf(kSpecialFileIds[i]);
@@ -75,24 +86,42 @@ void NoteOverlaps(const VolumeHeader& header, std::vector<Problem>* notes) {
             bool overlap = false;
             for (const HfsExtent& x : a->extents) {
                 for (const HfsExtent& y : b->extents) {
-                    overlap = overlap || (x.blockCount != 0 && y.blockCount != 0 &&
-                                          x.startBlock < u64{y.startBlock} + y.blockCount &&
-                                          y.startBlock < u64{x.startBlock} + x.blockCount);
+                    overlap =
+                        overlap || Overlap(x.startBlock, x.blockCount, y.startBlock, y.blockCount);
                 }
             }
             if (overlap) {
-                Problem note =
-                    Failure(std::string(ForkName(kSpecialFileIds[i])) + " file and " +
-                                ForkName(kSpecialFileIds[j]) + " file claim the same blocks",
-                            "run check");
-                note.check = "V04";
-                notes->push_back(note);
+                notes->push_back(OverlapNote(std::string(ForkName(kSpecialFileIds[i])) +
+                                             " file and " + ForkName(kSpecialFileIds[j]) +
+                                             " file claim the same blocks"));
             }
         }
     }
 }
 
-// Node size a tree's header states, 0 when it cannot be read or is no node size.
+// Extents of special files that lie over the volume header or its copy.
+void NoteCoveredHeaders(const VolumeHeader& header, u64 volumeBytes, std::vector<Problem>* notes) {
+    for (const u32 fileId : kSpecialFileIds) {
+        bool overlap = false;
+        for (const HfsExtent& extent : header.ForkOf(fileId)->extents) {
+            const u64 start = u64{extent.startBlock} * header.blockSize;
+            const u64 bytes = u64{extent.blockCount} * header.blockSize;
+            overlap = overlap || Overlap(start, bytes, kHeaderOffset, kHeaderSize) ||
+                      Overlap(start, bytes, volumeBytes - kAltHeaderFromEnd, kHeaderSize);
+        }
+        if (overlap) {
+            notes->push_back(OverlapNote(std::string(ForkName(fileId)) +
+                                         " file claims the blocks of a volume header"));
+        }
+    }
+}
+
+void NoteOverlaps(const VolumeHeader& header, u64 volumeBytes, std::vector<Problem>* notes) {
+    NoteSharedBlocks(header, notes);
+    NoteCoveredHeaders(header, volumeBytes, notes);
+}
+
+// What a tree's header gives as its node size, 0 when it cannot be read.
 u32 StatedNodeSize(ImageVolume::State* state, u32 fileId) {
     const HfsFork* fork = state->header.ForkOf(fileId);
     if (fork->extents[0].blockCount == 0) {
@@ -103,10 +132,11 @@ u32 StatedNodeSize(ImageVolume::State* state, u32 fileId) {
     if (!state->volume->Read(at, bytes, sizeof bytes).Ok()) {
         return 0;
     }
-    const u32 size = Be16(bytes);
-    return IsPowerOfTwo(size) && size >= (1u << kMinNodeShift) && size <= (1u << kMaxNodeShift)
-               ? size
-               : 0;
+    return Be16(bytes);
+}
+
+bool IsNodeSize(u32 size) {
+    return IsPowerOfTwo(size) && size >= (1u << kMinNodeShift) && size <= (1u << kMaxNodeShift);
 }
 
 // The map block is the smallest node size of the volume's trees, so that nearly every node is one
@@ -115,7 +145,7 @@ Problem ChooseMapBlock(ImageVolume::State* state) {
     u32 smallest = 0;
     for (std::size_t i = 0; i < kTreeCount; ++i) {
         const u32 size = StatedNodeSize(state, kSpecialFileIds[i]);
-        if (size != 0 && (smallest == 0 || size < smallest)) {
+        if (IsNodeSize(size) && (smallest == 0 || size < smallest)) {
             smallest = size;
         }
     }
@@ -244,23 +274,50 @@ Problem ImageVolume::State::Mount(VolumeScan* scan) {
 }
 
 Problem ImageVolume::State::FinishReading() {
-    NoteOverlaps(header, &notes);
+    NoteOverlaps(header, volumeBytes, &notes);
     return {};
+}
+
+// What no change can build on, whatever the user insists on: it would write over something else.
+Problem ImageVolume::State::CheckShape(const std::vector<Problem>& overlaps) {
+    Problem problem = isTruncated ? notes.front() : overlaps.empty() ? Problem{} : overlaps.front();
+    for (std::size_t i = 0; i < kTreeCount && !problem; ++i) {
+        const u32 fileId = kSpecialFileIds[i];
+        problem = CheckForkExtents(*header.ForkOf(fileId), header.totalBlocks, fileId);
+        const u32 size = StatedNodeSize(this, fileId);
+        if (!problem && size != 0 && !IsNodeSize(size)) {
+            problem = Failure(Format("%s tree: node size %u is not a power of two from 512 to "
+                                     "32,768",
+                                     ForkName(fileId), size),
+                              "");
+            problem.check = "H02";
+        }
+    }
+    problem.advice = "the volume can only be read";
+    return problem;
+}
+
+// With --force what would be refused becomes a remark.
+void ImageVolume::State::NoteWhatForcePassed() {
+    if (Problem passed = CheckMayWrite(header, journal, false)) {
+        passed.advice = "written to all the same";
+        notes.push_back(passed);
+    }
 }
 
 Problem ImageVolume::State::PrepareWriting() {
     std::vector<Problem> overlaps;
-    NoteOverlaps(header, &overlaps);
+    NoteOverlaps(header, volumeBytes, &overlaps);
+    writeObstacle = CheckMayWrite(header, journal, options.force);
+    if (!writeObstacle) {
+        writeObstacle = CheckShape(overlaps);
+    }
     isWritable = true;
     if (options.access == Access::kWrite) {
-        if (Problem problem = CheckMayWrite(header, journal, options.force)) {
-            return problem;
+        if (writeObstacle) {
+            return writeObstacle;
         }
-        if (!overlaps.empty() || isTruncated) {
-            Problem problem = isTruncated ? notes.front() : overlaps.front();
-            problem.advice = "the volume can only be read";
-            return problem;
-        }
+        NoteWhatForcePassed();
         if (Problem problem = ChooseSink()) {
             return problem;
         }

@@ -85,6 +85,7 @@ struct ImageVolume::State {
     bool isWritable = false;
     bool usedBackup = false;
     std::vector<Problem> notes;
+    Problem writeObstacle;  // Access::kOverlay, kWrite
     Problem lastIo;
     JournalState journal;
     JournalPlace journalPlace;
@@ -118,6 +119,8 @@ struct ImageVolume::State {
     Problem ReadHeaders();
     Problem FinishReading();
     Problem PrepareWriting();
+    Problem CheckShape(const std::vector<Problem>& overlaps);
+    void NoteWhatForcePassed();
     bool IsCutShort() const;
     BlockDevice* Base() { return overlay ? static_cast<BlockDevice*>(overlay.get()) : image.get(); }
 
