@@ -1,11 +1,12 @@
 #!/usr/bin/env bash
 # lint.sh [--changed [BASE] | FILE...]: everything that can be said about the code without running
 # it. Without files the whole project; --changed: what differs from BASE (main) or is new. Findings
-# are errors. What a tool is missing for is said and skipped.
+# are errors. What a tool is missing for is said and skipped. Units that were clean are remembered in
+# build/lint-*; LINT_JOBS is how many are looked at together.
 # shellcheck disable=SC2317  # steps are called through step()
 set -uo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.." || exit 1
-jobs=$(nproc 2>/dev/null || echo 2)
+jobs=${LINT_JOBS:-$(nproc 2>/dev/null || echo 2)}
 failed=0
 
 step() {
@@ -34,14 +35,6 @@ units=()
 for source in "${sources[@]}"; do
     [[ $source == *.cpp && -f $source ]] && units+=("$source")
 done
-# Units of the main build; consumers of the installed package and fuzz targets build elsewhere.
-known_units() {
-    python3 -c '
-import json, os, sys
-known = {os.path.relpath(entry["file"]) for entry in json.load(open(sys.argv[1]))}
-print("\n".join(unit for unit in sys.argv[2:] if unit in known))' "$1" "${units[@]}"
-}
-
 format() {
     [ "${#sources[@]}" -eq 0 ] || clang-format --dry-run --Werror "${sources[@]}"
 }
@@ -54,7 +47,7 @@ configure() {
 # Compiles every unit for its warnings alone, with the options of the build.
 syntax() {
     [ "${#units[@]}" -gt 0 ] || return 0
-    python3 tests/syntax_only.py "build/lint-$1/compile_commands.json" "$jobs" "${units[@]}"
+    python3 tests/lint_units.py warnings "build/lint-$1" "$jobs" "${units[@]}"
 }
 for compiler in g++ clang++; do
     have "$compiler" || continue
@@ -66,9 +59,10 @@ for compiler in g++ clang++; do
 done
 
 tidy() {
-    known_units build/lint-clang++/compile_commands.json | sed -n '/^src\//p' |
-        xargs -r -P "$jobs" -n 1 clang-tidy --quiet -p build/lint-clang++ \
-            2> >(grep -vE '^[0-9]+ warnings? generated' >&2)
+    local own
+    mapfile -t own < <(printf '%s\n' "${units[@]}" | grep -E '^(src|python)/')
+    [ "${#own[@]}" -gt 0 ] || return 0
+    python3 tests/lint_units.py tidy build/lint-clang++ "$jobs" "${own[@]}"
 }
 [ -f build/lint-clang++/compile_commands.json ] && have clang-tidy && step "clang-tidy" tidy
 

@@ -51,19 +51,20 @@ extern "C" {
 #define TREEHFS_ERR_BUFFER ((int)0xA0000209u)     /* the buffer is too small; its size says how */
 
 /* "not-found", "corrupt", ...; "status" for a value that is none of these. Never null. */
-TREEHFS_API const char *treehfs_status_name(int status);
+TREEHFS_API const char* treehfs_status_name(int status);
 /* "no such key, or the end of the records". Never null. */
-TREEHFS_API const char *treehfs_status_text(int status);
+TREEHFS_API const char* treehfs_status_text(int status);
 /* What the last failed call of this thread met, with its place; "" before the first. Valid until
  * the thread's next call. */
-TREEHFS_API const char *treehfs_last_error(void);
+TREEHFS_API const char* treehfs_last_error(void);
 /* Version of the library, as in "0.1.0". */
-TREEHFS_API const char *treehfs_version(void);
+TREEHFS_API const char* treehfs_version(void);
 
 /* Sets a struct to zeros and its size: treehfs_record record = TREEHFS_INIT(treehfs_record);
  * In C++: treehfs_record record{}; record.struct_size = sizeof record; */
 #ifndef __cplusplus
-#define TREEHFS_INIT(type) {.struct_size = sizeof(type)}
+#define TREEHFS_INIT(type) \
+    { .struct_size = sizeof(type) }
 #endif
 
 /* --- volumes ---------------------------------------------------------------------------------- */
@@ -91,11 +92,11 @@ typedef struct treehfs_open_options {
 } treehfs_open_options;
 
 /* Opens the volume in the image, disk image or block device `path`; `options` may be null. */
-TREEHFS_API int treehfs_open(const char *path, const treehfs_open_options *options,
-                             treehfs_volume **volume);
+TREEHFS_API int treehfs_open(const char* path, const treehfs_open_options* options,
+                             treehfs_volume** volume);
 /* Ends the volume; changes that were not committed are gone. The handle is gone whatever is
  * returned; cursors stay to be closed. Null is allowed. */
-TREEHFS_API int treehfs_close(treehfs_volume *volume);
+TREEHFS_API int treehfs_close(treehfs_volume* volume);
 
 #define TREEHFS_VOLUME_HFSX 1u            /* HFSX; otherwise HFS+ */
 #define TREEHFS_VOLUME_JOURNALED 2u       /* has a journal */
@@ -122,10 +123,10 @@ typedef struct treehfs_volume_info {
 } treehfs_volume_info;
 
 /* Fills `info`, up to the size it names. */
-TREEHFS_API int treehfs_get_volume_info(treehfs_volume *volume, treehfs_volume_info *info);
+TREEHFS_API int treehfs_get_volume_info(treehfs_volume* volume, treehfs_volume_info* info);
 /* Things worth knowing although the volume opened, one by one; null behind the last. Valid until
  * the volume is closed. */
-TREEHFS_API const char *treehfs_note(treehfs_volume *volume, uint32_t index);
+TREEHFS_API const char* treehfs_note(treehfs_volume* volume, uint32_t index);
 
 /* --- trees ------------------------------------------------------------------------------------ */
 
@@ -151,8 +152,8 @@ typedef struct treehfs_tree_info {
 } treehfs_tree_info;
 
 /* TREEHFS_ERR_NO_TREE: the volume has no such tree. */
-TREEHFS_API int treehfs_get_tree_info(treehfs_volume *volume, uint32_t tree,
-                                      treehfs_tree_info *info);
+TREEHFS_API int treehfs_get_tree_info(treehfs_volume* volume, uint32_t tree,
+                                      treehfs_tree_info* info);
 
 /* --- keys and records as text ----------------------------------------------------------------- */
 /* These need no volume. `*size` becomes the bytes of the result, without a text's ending 0, also
@@ -162,25 +163,25 @@ TREEHFS_API int treehfs_get_tree_info(treehfs_volume *volume, uint32_t tree,
 #define TREEHFS_KEY_BYTES 522u
 
 /* 2:"name" (catalog), 5:data:0 (extents), 37:"name" (attributes), hex:... (any) -> bytes. */
-TREEHFS_API int treehfs_key_parse(uint32_t tree, const char *text, void *key, uint32_t capacity,
-                                  uint32_t *size);
+TREEHFS_API int treehfs_key_parse(uint32_t tree, const char* text, void* key, uint32_t capacity,
+                                  uint32_t* size);
 /* The way back. */
-TREEHFS_API int treehfs_key_text(uint32_t tree, const void *key, uint32_t key_size, char *text,
-                                 uint32_t capacity, uint32_t *size);
+TREEHFS_API int treehfs_key_text(uint32_t tree, const void* key, uint32_t key_size, char* text,
+                                 uint32_t capacity, uint32_t* size);
 /* folder{id:16,...}, inline{"text"}, hex:... -> bytes. */
-TREEHFS_API int treehfs_data_parse(uint32_t tree, const char *text, void *data, uint32_t capacity,
-                                   uint32_t *size);
+TREEHFS_API int treehfs_data_parse(uint32_t tree, const char* text, void* data, uint32_t capacity,
+                                   uint32_t* size);
 /* One record as the line of JSON that `treehfs export` writes, without line feed. */
-TREEHFS_API int treehfs_record_json(uint32_t tree, const void *key, uint32_t key_size,
-                                    const void *data, uint32_t data_size, char *text,
-                                    uint32_t capacity, uint32_t *size);
+TREEHFS_API int treehfs_record_json(uint32_t tree, const void* key, uint32_t key_size,
+                                    const void* data, uint32_t data_size, char* text,
+                                    uint32_t capacity, uint32_t* size);
 
 /* --- looking ---------------------------------------------------------------------------------- */
 
 /* Copies the data of the record with this key. `*size` becomes its bytes, also with
  * TREEHFS_ERR_BUFFER. TREEHFS_ERR_NOT_FOUND: no such key. `data` may be null with capacity 0. */
-TREEHFS_API int treehfs_find(treehfs_volume *volume, uint32_t tree, const void *key,
-                             uint32_t key_size, void *data, uint32_t capacity, uint32_t *size);
+TREEHFS_API int treehfs_find(treehfs_volume* volume, uint32_t tree, const void* key,
+                             uint32_t key_size, void* data, uint32_t capacity, uint32_t* size);
 
 /* A walk in key order: opaque, from treehfs_cursor_open to treehfs_cursor_close. */
 typedef struct treehfs_cursor treehfs_cursor;
@@ -189,8 +190,8 @@ typedef struct treehfs_cursor treehfs_cursor;
 typedef struct treehfs_record {
     uint32_t struct_size; /* sizeof this struct */
     uint32_t id;          /* parent ID of a catalog key, else the file ID */
-    const void *key;      /* as on disk, length field included */
-    const void *data;     /* as on disk */
+    const void* key;      /* as on disk, length field included */
+    const void* data;     /* as on disk */
     uint32_t key_size;    /* bytes */
     uint32_t data_size;   /* bytes */
     uint32_t node;        /* number of the leaf it lies in */
@@ -198,14 +199,14 @@ typedef struct treehfs_record {
 } treehfs_record;
 
 /* Stands before the first record whose key is not below `key`; null: before the first of all. */
-TREEHFS_API int treehfs_cursor_open(treehfs_volume *volume, uint32_t tree, const void *key,
-                                    uint32_t key_size, treehfs_cursor **cursor);
+TREEHFS_API int treehfs_cursor_open(treehfs_volume* volume, uint32_t tree, const void* key,
+                                    uint32_t key_size, treehfs_cursor** cursor);
 /* Delivers the next record in key order; TREEHFS_ERR_NOT_FOUND at the end. Records may change
  * between two calls: the walk goes on behind the key delivered last. TREEHFS_ERR_CLOSED: the volume
  * was closed. */
-TREEHFS_API int treehfs_cursor_next(treehfs_cursor *cursor, treehfs_record *record);
+TREEHFS_API int treehfs_cursor_next(treehfs_cursor* cursor, treehfs_record* record);
 /* Null is allowed. */
-TREEHFS_API void treehfs_cursor_close(treehfs_cursor *cursor);
+TREEHFS_API void treehfs_cursor_close(treehfs_cursor* cursor);
 
 /* --- changing --------------------------------------------------------------------------------- */
 /* All changes since the volume was opened, or since its last commit or rollback, are one
@@ -217,20 +218,20 @@ TREEHFS_API void treehfs_cursor_close(treehfs_cursor *cursor);
  * says that it was noticed. */
 
 /* Marks the start of changes that belong together. TREEHFS_ERR_INVALID: others wait already. */
-TREEHFS_API int treehfs_begin(treehfs_volume *volume);
+TREEHFS_API int treehfs_begin(treehfs_volume* volume);
 /* Keeps all changes since the last commit, or none of them. */
-TREEHFS_API int treehfs_commit(treehfs_volume *volume);
+TREEHFS_API int treehfs_commit(treehfs_volume* volume);
 /* Drops all changes since the last commit. */
-TREEHFS_API int treehfs_rollback(treehfs_volume *volume);
+TREEHFS_API int treehfs_rollback(treehfs_volume* volume);
 
 /* Adds a record; TREEHFS_ERR_EXISTS: the key is there. */
-TREEHFS_API int treehfs_insert(treehfs_volume *volume, uint32_t tree, const void *key,
-                               uint32_t key_size, const void *data, uint32_t data_size);
+TREEHFS_API int treehfs_insert(treehfs_volume* volume, uint32_t tree, const void* key,
+                               uint32_t key_size, const void* data, uint32_t data_size);
 /* The new data may have another size. */
-TREEHFS_API int treehfs_update(treehfs_volume *volume, uint32_t tree, const void *key,
-                               uint32_t key_size, const void *data, uint32_t data_size);
+TREEHFS_API int treehfs_update(treehfs_volume* volume, uint32_t tree, const void* key,
+                               uint32_t key_size, const void* data, uint32_t data_size);
 /* Removes the record with this key. */
-TREEHFS_API int treehfs_delete(treehfs_volume *volume, uint32_t tree, const void *key,
+TREEHFS_API int treehfs_delete(treehfs_volume* volume, uint32_t tree, const void* key,
                                uint32_t key_size);
 
 /* --- checking --------------------------------------------------------------------------------- */
@@ -254,13 +255,13 @@ typedef struct treehfs_check_options {
 typedef struct treehfs_finding {
     uint32_t struct_size; /* sizeof this struct */
     uint32_t severity;    /* TREEHFS_INFO, ... */
-    const char *id;       /* "K03"; docs/check.md lists them */
+    const char* id;       /* "K03"; docs/check.md lists them */
     uint32_t tree;        /* TREEHFS_CATALOG, ...; 0: the volume */
     int32_t record;       /* index in the node; -1: none in particular */
     int64_t node;         /* -1: none in particular */
     uint64_t offset;      /* byte of the image; UINT64_MAX: none in particular */
-    const char *where;    /* "catalog node 14 record 0" */
-    const char *text;     /* one sentence */
+    const char* where;    /* "catalog node 14 record 0" */
+    const char* text;     /* one sentence */
 } treehfs_finding;
 
 /* What a check found. */
@@ -276,13 +277,13 @@ typedef struct treehfs_check_summary {
 } treehfs_check_summary;
 
 /* Not 0: stop the run soon. Must not call back into the volume. */
-typedef int (*treehfs_finding_fn)(void *self, const treehfs_finding *finding);
+typedef int (*treehfs_finding_fn)(void* self, const treehfs_finding* finding);
 
 /* Judges the volume by its bytes, independently of what reads and changes its trees. TREEHFS_OK
  * says that the run took place: what it found is in `summary`. `options`, `told` and `summary` may
  * be null. TREEHFS_ERR_INVALID: there are changes that were not committed. */
-TREEHFS_API int treehfs_check(treehfs_volume *volume, const treehfs_check_options *options,
-                              treehfs_finding_fn told, void *self, treehfs_check_summary *summary);
+TREEHFS_API int treehfs_check(treehfs_volume* volume, const treehfs_check_options* options,
+                              treehfs_finding_fn told, void* self, treehfs_check_summary* summary);
 
 #ifdef __cplusplus
 }
