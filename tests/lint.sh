@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # lint.sh [--changed [BASE] | FILE...]: everything that can be said about the code without running
 # it. Without files the whole project; --changed: what differs from BASE (main) or is new. Findings
-# are errors. What a tool is missing for is said and skipped. Units that were clean are remembered in
+# are errors. What a tool is missing for is said and skipped. Clean units are remembered in
 # build/lint-*; LINT_JOBS is how many are looked at together.
 # shellcheck disable=SC2317  # steps are called through step()
 set -uo pipefail

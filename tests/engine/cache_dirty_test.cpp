@@ -237,6 +237,15 @@ TEST_F(DirtyTest, FlushOfALaterNewNodeRaisesValidNodesOverTheGap) {
     EXPECT_EQ(bench_->validNodes, 10u);
 }
 
+TEST_F(DirtyTest, FlushOfTheLastNodeNumberDoesNotWrapValidNodes) {
+    bench_->SetDirty(node_, 0);
+    node_->nodeNum = 0xFFFFFFFF;
+    bench_->validNodes = 0xFFFFFFFF;
+    EXPECT_EQ(bench_->FlushINode(node_), kOk);
+    EXPECT_EQ(bench_->validNodes, 0xFFFFFFFFu);
+    node_->nodeNum = 1;
+}
+
 TEST_F(DirtyTest, FlushOfAnOldNodeLeavesValidNodes) {
     bench_->validNodes = 9;
     bench_->SetDirty(node_, 0);

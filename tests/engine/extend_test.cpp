@@ -122,6 +122,14 @@ TEST_P(Extend, SizesNoNumberHoldsAreRefused) {
     ExpectUntouched(20, 17);
 }
 
+TEST_P(Extend, VolumeThatNamesNoAllocationBlockIsRefused) {
+    Open(20, 3);
+    volume->fs.allocBlockSize = 0;
+    EXPECT_EQ(GrowTo(21), kErrInvalid);
+    EXPECT_EVENTS(Reported(kReasonInvalid, 9426));
+    ExpectUntouched(20, 17);
+}
+
 TEST_P(Extend, LargestClumpDoesNotWrap) {
     Open(20, 3);
     MakeVolume(1000);

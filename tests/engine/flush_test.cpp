@@ -409,6 +409,19 @@ TEST_F(FlushTest, TeardownFreesNodesWhateverTheirCounts) {
     EXPECT_EQ(bench_.heap.Live(), 0u);
 }
 
+// Such a node is found by the modified list alone; were it left there, a later flush would meet it.
+TEST_F(FlushTest, TeardownFreesAModifiedNodeThatIsNoLongerFound) {
+    HfsNode* node = Get(1);
+    ASSERT_EQ(kOk, bench_->SetDirty(node, 0));
+    node->link.remove(&bench_->nodeRoot);
+    bench_->nodeCount -= 1;
+    bench_->Dtor();
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(2380)});
+    EXPECT_TRUE(bench_->modifiedList.IsEmpty());
+    EXPECT_EQ(bench_.volume.Lent(), 0u);
+    EXPECT_EQ(bench_.heap.Live(), 0u);
+}
+
 TEST_F(FlushTest, TeardownAssertsMoreThanThreeReferences) {
     Get(1)->refCount = 3;
     bench_->Dtor();

@@ -94,6 +94,15 @@ TEST(NamesFolded, IgnorableUnitsVanishAnywhere) {
     EXPECT_EQ(Ins(u"a\u200Cb", u"a\u200Dc"), -1);
 }
 
+// Units that count for nothing are passed one by one, also when there is nothing else to compare.
+TEST(NamesFolded, NamesOfIgnorableUnitsAloneEnd) {
+    const std::u16string many(65535, u'\u200C');
+    EXPECT_EQ(Ins(many, many), 0);
+    EXPECT_EQ(Ins(many, u"\uFEFF"), 0);
+    EXPECT_EQ(Ins(many + u"a", u"b"), -1);
+    EXPECT_EQ(Ins(u"b", many + u"a"), 1);
+}
+
 TEST(NamesFolded, SoftHyphenAndFinalSigmaCount) {
     EXPECT_NE(Ins(u"a\u00ADb", u"ab"), 0);
     EXPECT_EQ(Ins(u"\u03C2", u"\u03C3"), -1);

@@ -86,6 +86,29 @@ TEST(HostDefaults, TraceLogAndDumpGoToStandardErrorAndErrorsNowhere) {
               "00000010: 00\n");
 }
 
+// A damaged record asserts each time it is read. Other lines are never kept back.
+TEST(HostDefaults, AnAssertionMetAMillionTimesIsToldAHundredTimes) {
+    const HostSinks* before = SetHostSinks(nullptr);
+    ::testing::internal::CaptureStderr();
+    for (int i = 0; i < 1000000; ++i) {
+        _VELKTrace("***** velk_assert src/x, %d\n", 505);
+    }
+    for (int i = 0; i < 101; ++i) {
+        _VELKTrace("no assertion\n");
+    }
+    const std::string text = ::testing::internal::GetCapturedStderr();
+    SetHostSinks(before);
+    std::string expected;
+    for (int i = 0; i < 100; ++i) {
+        expected += "***** velk_assert src/x, 505\n";
+    }
+    expected += "***** told often enough, not again: src/x, 505\n";
+    for (int i = 0; i < 101; ++i) {
+        expected += "no assertion\n";
+    }
+    EXPECT_EQ(text, expected);
+}
+
 TEST(HostDefaults, HeapIsAlignedAndTakesNullBack) {
     const HostHeap* before = SetHostHeap(nullptr);
     void* memory = velk_heap_alloc(40);

@@ -54,6 +54,17 @@ protected:
         path.ClearPath();
         return found;
     }
+    // Mounts what was committed anew; changes stay in memory.
+    void ReopenWithBudget(u64 cacheBudget) {
+        const std::vector<u8> image = Bytes();
+        auto device = std::make_unique<MemoryDevice>(image.size());
+        ASSERT_TRUE(device->Write(0, image.data(), image.size()).Ok());
+        OpenOptions options;
+        options.access = Access::kOverlay;
+        options.cacheBudget = cacheBudget;
+        volume_ = ImageVolume::Open(std::move(device), options, nullptr, &problem_);
+        ASSERT_NE(nullptr, volume_) << problem_.Text();
+    }
     std::vector<u8> Bytes() {
         std::vector<u8> bytes(static_cast<std::size_t>(size_));
         EXPECT_EQ(0, volume_->ReadVolume(0, bytes.data(), bytes.size()));
@@ -448,14 +459,7 @@ TEST_F(CommitTest, TrimCacheKeepsHeldAndModifiedNodes) {
         ASSERT_EQ(0, Insert(i));
     }
     ASSERT_EQ(0, volume_->Commit(0));
-    const std::vector<u8> image = Bytes();
-    auto device = std::make_unique<MemoryDevice>(image.size());
-    ASSERT_TRUE(device->Write(0, image.data(), image.size()).Ok());
-    OpenOptions options;
-    options.access = Access::kOverlay;
-    options.cacheBudget = 8192;
-    volume_ = ImageVolume::Open(std::move(device), options, nullptr, &problem_);
-    ASSERT_NE(nullptr, volume_) << problem_.Text();
+    ReopenWithBudget(8192);
     const NumberKey key(500);
     HfsFindData path;
     bool found = false;
@@ -476,6 +480,30 @@ TEST_F(CommitTest, TrimCacheKeepsHeldAndModifiedNodes) {
     EXPECT_EQ(0, Catalog()->IncPos(0, record, sizeof record, &size, nullptr, 0, nullptr, &path));
     EXPECT_EQ(100u, size);
     path.ClearPath();
+}
+
+// Lookups all over a tree, in no order, keep no more nodes than they were given room for.
+TEST_F(CommitTest, RandomLookupsStayWithinTheCacheBudget) {
+    constexpr u32 kRecords = 6000;
+    constexpr u64 kBudget = 64 << 10;
+    Make(4 << 20, Small());
+    for (u32 i = 0; i < kRecords; ++i) {
+        ASSERT_EQ(0, Insert(100 + i));
+    }
+    ASSERT_EQ(0, volume_->Commit(0));
+    ReopenWithBudget(kBudget);
+    u64 most = 0;
+    u32 number = 1;
+    for (u32 i = 0; i < 20000; ++i) {
+        number = number * 1664525 + 1013904223;
+        EXPECT_TRUE(Has(100 + (number >> 8) % kRecords));
+        most = std::max(most, volume_->CachedBytes());
+        volume_->TrimCache();
+    }
+    const u64 whole = u64{Catalog()->header.totalNodes} * 512;
+    EXPECT_GT(whole, 8 * kBudget);
+    EXPECT_GT(most, kBudget / 2);
+    EXPECT_LT(most, kBudget + 16 * 1024);
 }
 
 }  // namespace

@@ -1,8 +1,10 @@
 // Carries an insertion up the search path: one or two records go into the node at one level; what
 // its parent has to learn goes up as separators, by a call for the level above. The parent is
 // changed only after the whole level below is done.
+#include "hfs/treehfs/bytes.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
+#include "hfs/treehfs/path_check.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/separator.h"
 #include "platform/heap.h"
@@ -54,6 +56,31 @@ int PutRecords(CBTreeHfs* tree, HfsFindData* path, const InsertKey* first, const
             4665);
     HFS_ASSERT(!(change->firstKeyChanged && change->newRoot), 4666);
     return kOk;
+}
+
+bool KeysAreEqual(const BTHeaderMem* hdr, const HfsFindLevel& one, const HfsFindLevel& other) {
+    const NodeBytes bytes(hdr, one.node);
+    const NodeBytes otherBytes(hdr, other.node);
+    const u32 at = bytes.U16(SlotOffset(hdr, static_cast<u32>(one.index)));
+    const u32 otherAt = otherBytes.U16(SlotOffset(hdr, static_cast<u32>(other.index)));
+    const u32 size = u32{bytes.U16(at)} + kKeyLengthSize;
+    for (u32 i = 0; i < size; ++i) {
+        if (bytes.U8(at + i) != otherBytes.U8(otherAt + i)) {
+            return false;
+        }
+    }
+    return true;
+}
+
+// A record alone that goes into the left sibling leaves the node's first key as it was, and with it
+// the separator: here that is always the first key. Other writers leave a separator behind when the
+// record it was taken from goes. It is then below the first key, and lookups of the record that
+// went left would still be led into this node: such a separator has to follow.
+bool SeparatorStayedBehind(const CBTreeHfs* tree, const HfsFindData* path, HfsNode* node,
+                           const LevelChange& change, int level) {
+    return change.nodeNum != node->nodeNum && level != tree->header.treeDepth &&
+           ParentsLeadHere(tree, path, static_cast<u32>(level)) &&
+           !KeysAreEqual(&tree->header, path->path[level + 1], {node, 0});
 }
 
 // The parent's record for `node` must be there before it is replaced or followed by another.
@@ -150,8 +177,14 @@ int CBTreeHfs::InsertLevel(HfsFindData* path, InsertKey* first, const InsertKey*
     pathVersion += 1;
     LevelChange change;
     const int status = PutRecords(this, path, first, second, node, index, level, &change);
-    if (status != 0 || (!change.firstKeyChanged && !change.enterNewNode)) {
+    if (status != 0) {
         return status;
+    }
+    if (!change.firstKeyChanged && !change.enterNewNode) {
+        if (!SeparatorStayedBehind(this, path, node, change, level)) {
+            return kOk;
+        }
+        change.firstKeyChanged = true;
     }
     return TellParent(this, path, node, change, level);
 }

@@ -38,6 +38,9 @@ int WalkToLastRecord(MapWalk* walk) {
 // 64 bits or 32-bit node numbers cannot hold is refused.
 int PlanSize(const CBTreeHfs* tree, u64 requested, u32 clumpSize, u32 wantedNodes, Growth* growth) {
     const CFileSystemHfs* volume = tree->volume;
+    if (volume->allocBlockSize == 0) {
+        return Fail(kErrInvalid, kReasonInvalid, 9426);
+    }
     const u32 shift = volume->allocBlockShift;
     u64 clumpBlocks = (u64{clumpSize} + volume->allocBlockSize - 1) >> shift;
     HFS_ASSERT(clumpBlocks >= 1, 4016);
