@@ -35,9 +35,12 @@ def compiling(entry):
     return kept
 
 
-def judging(kind, build, entry):
+def judging(kind, entry):
     if kind == "tidy":
-        return ["clang-tidy", "--quiet", "-p", str(build), entry["file"]]
+        # A unit that the database holds twice would be judged twice by one process, which then
+        # finds faults in the second that are not there.
+        options = [word for word in compiling(entry)[1:] if word != entry["file"]]
+        return ["clang-tidy", "--quiet", entry["file"], "--", *options]
     return compiling(entry) + ["-fsyntax-only"]
 
 
@@ -79,11 +82,11 @@ class Memory:
         self.place(entry).write_text(text, encoding="utf-8")
 
 
-def judge(kind, build, memory, entry):
+def judge(kind, memory, entry):
     """What is to be said of a unit; nothing when it is clean."""
     if memory.knows(entry):
         return ""
-    done = subprocess.run(judging(kind, build, entry), cwd=entry["directory"], capture_output=True,
+    done = subprocess.run(judging(kind, entry), cwd=entry["directory"], capture_output=True,
                           text=True, check=False)
     text = re.sub(r"^\d+ warnings? .*generated.*\n", "", done.stdout + done.stderr, flags=re.M)
     if done.returncode == 0:
@@ -108,7 +111,7 @@ def main():
     memory = Memory(args.kind, build)
     failed = 0
     with concurrent.futures.ThreadPoolExecutor(args.jobs) as pool:
-        judged = pool.map(lambda entry: judge(args.kind, build, memory, entry), entries.values())
+        judged = pool.map(lambda entry: judge(args.kind, memory, entry), entries.values())
         for text in judged:
             if text:
                 failed += 1
