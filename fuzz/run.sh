@@ -1,11 +1,12 @@
 #!/usr/bin/env bash
-# run.sh BUILD_FOLDER SECONDS [TARGET...]: fuzzes each target for a while, from the seeds, the
-# corpus and what earlier runs found worth keeping, and says what came of it. The canary goes first:
-# it must fail.
+# run.sh libfuzzer|afl BUILD_FOLDER SECONDS [TARGET...]: fuzzes each target for a while, from the
+# seeds, the corpus and what earlier runs found worth keeping, and says what came of it. The canary
+# goes first: it must fail. Both fuzzers take up what the other one found.
 set -euo pipefail
-build=$(cd "$1" && pwd)
-seconds=$2
-shift 2
+fuzzer=$1
+build=$(cd "$2" && pwd)
+seconds=$3
+shift 3
 here=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd)
 work=$build/../fuzz-found
 mkdir -p "$work/seeds"
@@ -23,17 +24,53 @@ most_bytes() {
     esac
 }
 
-run_target() {
-    mkdir -p "$work/$1"
+libfuzzer_run() {
     "$build/fuzz_$1" -max_total_time="$seconds" -timeout=20 -rss_limit_mb=2048 \
         -max_len="$(most_bytes "$1")" -print_final_stats=1 -artifact_prefix="$work/$1-" \
         "$work/$1" "$work/seeds/$1" "$here/corpus/$1" >"$work/$1.log" 2>&1
 }
 
-runs_of() { sed -n 's/^stat::number_of_executed_units: *//p' "$work/$1.log"; }
+libfuzzer_runs() { sed -n 's/^stat::number_of_executed_units: *//p' "$work/$1.log"; }
 
-if "$build/fuzz_canary" -max_total_time=60 -artifact_prefix="$work/canary-" \
-    "$here/corpus/canary" >"$work/canary.log" 2>&1; then
+# Inputs that ended a run lie in AFL++'s folder of crashes and hangs.
+afl_run() {
+    local from=$work/afl-from-$1 to=$work/afl-$1
+    rm -rf "$from" "$to"
+    mkdir -p "$from"
+    find "$work/$1" "$work/seeds/$1" "$here/corpus/$1" -type f -exec cp -t "$from" {} +
+    AFL_NO_UI=1 AFL_SKIP_CPUFREQ=1 AFL_I_DONT_CARE_ABOUT_MISSING_CRASHES=1 AFL_NO_AFFINITY=1 \
+        AFL_IGNORE_SEED_PROBLEMS=1 afl-fuzz -i "$from" -o "$to" -V "$seconds" -t 20000+ -m none \
+        -G "$(most_bytes "$1")" -- "$build/fuzz_$1" >"$work/$1.log" 2>&1 || return 1
+    find "$to/default/queue" -maxdepth 1 -type f -name '*,op:*' -exec cp -t "$work/$1" {} +
+    [ -z "$(find "$to/default/crashes" "$to/default/hangs" -type f -name 'id:*')" ]
+}
+
+afl_runs() { sed -n 's/^execs_done *: *//p' "$work/afl-$1/default/fuzzer_stats"; }
+
+# The canary's input is in its corpus, so the targets' seeds are not needed to kill it.
+libfuzzer_canary() {
+    "$build/fuzz_canary" -max_total_time=60 -artifact_prefix="$work/canary-" "$here/corpus/canary" \
+        >"$work/canary.log" 2>&1
+}
+
+afl_canary() {
+    "$build/fuzz_canary" "$here"/corpus/canary/* >"$work/canary.log" 2>&1
+}
+
+case $fuzzer in
+    libfuzzer)
+        canary() { libfuzzer_canary; }
+        run_target() { libfuzzer_run "$1"; }
+        runs_of() { libfuzzer_runs "$1"; }
+        ;;
+    afl)
+        canary() { afl_canary; }
+        run_target() { afl_run "$1"; }
+        runs_of() { afl_runs "$1"; }
+        ;;
+esac
+
+if canary 2>/dev/null; then
     echo "fuzz: the canary lived: failures would not be seen" >&2
     exit 1
 fi
@@ -46,6 +83,7 @@ for target in "${targets[@]}"; do
         echo "fuzz: there is no target '$target'" >&2
         exit 16
     fi
+    mkdir -p "$work/$target"
     if run_target "$target"; then
         echo "$target: $(runs_of "$target") runs in $seconds s, nothing found"
     else
