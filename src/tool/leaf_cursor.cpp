@@ -12,9 +12,29 @@ namespace VELK::tool {
 
 namespace {
 
+// A step out of a ring of empty leaves asks for as many nodes as there are, and every leaf may lead
+// into one: so often may all nodes be asked for before the rest is given up.
+constexpr u64 kMostRounds = 4;
+
 const u8* NodeStart(const HfsNode* node) {
     return node->bufs[0].data;
 }
+
+// Adds the nodes asked for while it lives to a sum.
+class RequestCount {
+public:
+    RequestCount(const CBTreeHfs* tree, u64* sum) : tree_(tree), before_(Now()), sum_(sum) {}
+    ~RequestCount() { *sum_ += Now() - before_; }
+    RequestCount(const RequestCount&) = delete;
+    RequestCount& operator=(const RequestCount&) = delete;
+
+private:
+    u32 Now() const { return tree_->hitCount + tree_->readCount; }
+
+    const CBTreeHfs* tree_;
+    u32 before_;
+    u64* sum_;
+};
 
 }  // namespace
 
@@ -52,6 +72,7 @@ void LeafCursor::Seek(const SearchKey& key, bool* found) {
     isSound_ = false;
     hasLast_ = false;
     leaves_ = 1;
+    requests_ = 0;
     Last() = key;
     int status =
         tree_->FindEntry(key.Key(), key.id, &path_, &present, nullptr, nullptr, nullptr, nullptr);
@@ -145,9 +166,16 @@ u32 LeafCursor::SiblingInIndex(u32 damaged) {
     return next;
 }
 
+// Whether the walk has been longer than any that is sound.
+bool LeafCursor::IsOverdue() const {
+    const u64 nodes = tree_->header.totalNodes;
+    return leaves_ > nodes || requests_ > kMostRounds * nodes;
+}
+
 // Goes on at the first leaf behind `damaged` that can be read. False: there is none.
 bool LeafCursor::PassOver(u32 damaged) {
-    while (damaged != 0 && leaves_ <= tree_->header.totalNodes) {
+    while (damaged != 0 && !IsOverdue()) {
+        const RequestCount count(tree_, &requests_);
         leaves_ += 1;
         damaged = SiblingInIndex(damaged);
         if (OpenLeaf(damaged)) {
@@ -158,15 +186,19 @@ bool LeafCursor::PassOver(u32 damaged) {
 }
 
 bool LeafCursor::EnterNextLeaf() {
-    if (leaves_ > tree_->header.totalNodes) {
+    if (IsOverdue()) {
         Damaged(path_.path[1].node->nodeNum, kErrCorrupt, "more leaves than the tree has nodes");
         return false;
     }
     unsigned size = 0;
     u32 next = GetBe32(NodeStart(path_.path[1].node));
     path_.path[1].index = static_cast<s32>(count_);
-    const int status = tree_->IncPos(0, record_.data(), static_cast<unsigned>(record_.size()),
-                                     &size, nullptr, 0, nullptr, &path_);
+    int status = kOk;
+    {
+        const RequestCount count(tree_, &requests_);
+        status = tree_->IncPos(0, record_.data(), static_cast<unsigned>(record_.size()), &size,
+                               nullptr, 0, nullptr, &path_);
+    }
     if (status == kErrNotFound) {
         return false;
     }

@@ -31,8 +31,6 @@ public:
     // Delivers the next record; false at the end. Throws ToolError.
     bool Next(LeafRecord* record);
 
-    u64 LeavesSeen() const { return leaves_; }
-
 private:
     enum class KeyState { kSound, kUnsound, kNotAbove };
 
@@ -41,6 +39,7 @@ private:
     void StandOnLeaf();
     u32 DamagedChild() const;
     u32 SiblingInIndex(u32 damaged);
+    bool IsOverdue() const;
     bool PassOver(u32 damaged);
     KeyState TakeKey(const LeafRecord& record);
     void Damaged(u32 node, int status, const std::string& detail);
@@ -56,6 +55,7 @@ private:
     u32 count_ = 0;  // records of the current leaf
     u32 index_ = 0;  // next one to deliver
     u64 leaves_ = 0;
+    u64 requests_ = 0;  // nodes asked for on the way from leaf to leaf
     HfsFindData path_;
     SearchKey keys_[2];  // the last one, and the next one while it is compared
     RecordReader reader_;

@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "bench.h"
+#include "hfs/treehfs/noderef.h"
 
 namespace VELK::test {
 namespace {
@@ -31,6 +32,25 @@ protected:
 };
 
 // ---- SetDirty
+
+// The second change of a node in one block takes a shorter way; its range is looked at all the
+// same.
+TEST(DirtyNodeOfOneBlock, RangesPastItsEndAreRefusedEachTime) {
+    Bench bench(Blocks(4096));
+    bench.Open(SmallTree(4096));
+    HfsNode* node = nullptr;
+    ASSERT_EQ(bench->GetINode(1, &node, false), kOk);
+    for (int time = 0; time < 2; ++time) {
+        EXPECT_EQ(bench->SetDirty(node, 4000, 97), kErrCorrupt);
+        EXPECT_EQ(bench.capture.Take(), (Events{Asserted(777), Reported(kReasonNode, 778)}));
+        EXPECT_EQ(bench->SetDirty(node, 4097, 0), kErrCorrupt);
+        EXPECT_EQ(bench.capture.Take(),
+                  (Events{Asserted(776), Asserted(777), Reported(kReasonNode, 778)}));
+        EXPECT_EQ(bench->SetDirty(node, 4000, 96), kOk);
+        EXPECT_EQ(bench.capture.Take(), Events{});
+    }
+    ReleaseNode(node);
+}
 
 TEST_F(DirtyTest, MarksTheBlocksOfTheRange) {
     EXPECT_EQ(bench_->SetDirty(node_, 1020, 8), kOk);

@@ -7,6 +7,7 @@ add_executable(change_tests
   delete_test.cpp
   flat_tree.cpp
   hazard_test.cpp
+  insert_left_test.cpp
   insert_refusal_test.cpp
   insert_test.cpp
   record_delete_test.cpp

@@ -109,13 +109,18 @@ bool ParseDate(const std::string& text, u32* date) {
     unsigned month = 0, day = 0, hour = 0, minute = 0, second = 0;
     int used = 0;
     int end = 0;
+    // The widths keep every number far below what its type holds.
+    // NOLINTNEXTLINE(cert-err34-c)
     if (std::sscanf(text.c_str(), "%4d-%2u-%2u%n", &year, &month, &day, &used) != 3) {
         return false;
     }
     if (static_cast<std::size_t>(used) < text.size()) {
         const char* rest = text.c_str() + used;
-        if ((*rest != 'T' && *rest != ' ') ||
-            std::sscanf(rest + 1, "%2u:%2u:%2u%n", &hour, &minute, &second, &end) != 3) {
+        if (*rest != 'T' && *rest != ' ') {
+            return false;
+        }
+        // NOLINTNEXTLINE(cert-err34-c)
+        if (std::sscanf(rest + 1, "%2u:%2u:%2u%n", &hour, &minute, &second, &end) != 3) {
             return false;
         }
         rest += 1 + end;
