@@ -70,7 +70,9 @@ check_cpp() {
     local own
     mapfile -t own < <(printf '%s\n' "${units[@]}" | sed -n '/^src\//p')
     [ "${#own[@]}" -gt 0 ] || return 0
-    cppcheck --quiet --std=c++20 --language=c++ -j "$jobs" -I src --inline-suppr \
+    mkdir -p build/lint-cppcheck
+    cppcheck --quiet --cppcheck-build-dir=build/lint-cppcheck --std=c++20 --language=c++ \
+        -j "$jobs" -I src --inline-suppr \
         --enable=warning,performance,portability --error-exitcode=1 \
         --suppressions-list=tests/cppcheck.txt \
         --template='{file}:{line}: {severity}: {message} [{id}]' \
