@@ -167,7 +167,7 @@ u32 FolderTable::KeepName(const std::string& name) {
     char* target = chunks_.back().get() + chunkUsed_;
     const u16 length = static_cast<u16>(name.size());
     std::memcpy(target, &length, sizeof length);
-    std::memcpy(target + sizeof length, name.data(), name.size());
+    name.copy(target + sizeof length, name.size());
     const u32 position = (static_cast<u32>(chunks_.size() - 1) << kChunkShift) + chunkUsed_;
     chunkUsed_ += needed;
     return position;

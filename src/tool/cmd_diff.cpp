@@ -36,10 +36,10 @@ private:
     }
 
     std::string Line(const LeafRecord* before, const LeafRecord* after) const {
-        const LeafRecord& shown = before != nullptr ? *before : *after;
+        const LeafRecord* shown = before != nullptr ? before : after;  // one is there
         if (before == nullptr || after == nullptr) {
-            return fmt::format("{} {}  {}\n", before != nullptr ? '-' : '+', KeyOf(shown),
-                               EscapedText(RecordSummary(fileId_, shown.data, shown.dataSize)));
+            return fmt::format("{} {}  {}\n", before != nullptr ? '-' : '+', KeyOf(*shown),
+                               EscapedText(RecordSummary(fileId_, shown->data, shown->dataSize)));
         }
         std::string changes;
         for (const FieldChange& change : FieldChanges(fileId_, *before, *after, options_.ignored)) {
@@ -62,7 +62,7 @@ private:
     std::string Json(const LeafRecord* before, const LeafRecord* after) const {
         std::string text;
         JsonWriter json(&text);
-        const LeafRecord& shown = before != nullptr ? *before : *after;
+        const LeafRecord* shown = before != nullptr ? before : after;  // one is there
         json.BeginObject();
         json.Member("change", after == nullptr    ? "removed"
                               : before == nullptr ? "added"
@@ -70,7 +70,7 @@ private:
         json.Member("tree", ForkName(fileId_));
         json.Key("key");
         json.BeginObject();
-        KeyMembers(fileId_, shown.key, shown.keySize, &json);
+        KeyMembers(fileId_, shown->key, shown->keySize, &json);
         json.EndObject();
         if (before != nullptr && after != nullptr) {
             json.Key("fields");

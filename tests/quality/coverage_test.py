@@ -16,7 +16,9 @@ LINE = "a.cpp: return a > 0 && b > 0 ? 1 : 2;\n"
 
 def line(number, counts, throws=()):
     ways = [{"count": count, "throw": False, "fallthrough": False} for count in counts]
-    ways += [{"count": count, "throw": True, "fallthrough": False} for count in throws]
+    for count in throws:  # calls
+        ways += [{"count": 7, "throw": False, "fallthrough": True},
+                 {"count": count, "throw": True, "fallthrough": False}]
     return {"line_number": number, "count": sum(counts), "branches": ways}
 
 
@@ -66,6 +68,16 @@ class Judge(unittest.TestCase):
         file.add({"lines": [line(2, [0, 1])]})
         file.add({"lines": [line(2, [1, 0]), line(3, [])]})
         self.assertEqual(file.outcomes, {(2, 1): 1, (2, 2): 1})
+
+    def test_calls_are_no_conditions(self):
+        file = coverage.File()
+        file.add({"lines": [line(2, [0, 1], throws=[0, 3])]})
+        self.assertEqual(file.outcomes, {(2, 1): 0, (2, 2): 1})
+
+    def test_the_ways_of_a_switch_may_be_odd(self):
+        file = coverage.File()
+        file.add({"lines": [line(2, [0, 1, 5])]})
+        self.assertEqual(file.outcomes, {(2, 1): 0, (2, 2): 1, (2, 3): 5})
 
     def test_the_sites_nothing_leads_to_are_read(self):
         self.assertIn(3754, coverage.unreachable_sites())
