@@ -7,8 +7,6 @@
 // flush. Every answer is checked; a wrong one ends the run with exit status 1. Times are those of
 // the processor, so that a busy machine disturbs them less; small runs are repeated and their
 // median counts.
-#include <malloc.h>
-
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
@@ -55,17 +53,17 @@ struct CountingHeap {
     u64 most = 0;
 
     static void* Alloc(void* self, std::size_t size) {
-        void* memory = std::malloc(size);
+        void* memory = HostAlloc(size);
         auto* heap = static_cast<CountingHeap*>(self);
-        heap->now += memory != nullptr ? malloc_usable_size(memory) : 0;
+        heap->now += memory != nullptr ? HostSizeOf(memory) : 0;
         heap->most = heap->now > heap->most ? heap->now : heap->most;
         return memory;
     }
     static void Free(void* self, void* memory) {
         if (memory != nullptr) {
-            static_cast<CountingHeap*>(self)->now -= malloc_usable_size(memory);
+            static_cast<CountingHeap*>(self)->now -= HostSizeOf(memory);
         }
-        std::free(memory);
+        HostFree(memory);
     }
 };
 

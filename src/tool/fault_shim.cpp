@@ -63,14 +63,14 @@ struct ShimTables {
             return nullptr;
         }
         const HostHeap* next = shim->heapBefore_;
-        return next != nullptr ? next->Alloc(next->self, size) : std::malloc(size);
+        return next != nullptr ? next->Alloc(next->self, size) : HostAlloc(size);
     }
     static void Free(void* self, void* memory) {
         const HostHeap* next = Of(self)->heapBefore_;
         if (next != nullptr) {
             next->Free(next->self, memory);
         } else {
-            std::free(memory);
+            HostFree(memory);
         }
     }
 

@@ -9,7 +9,7 @@
 
 namespace VELK {
 
-// Stands in for malloc under heap.h. Both entries have to be there.
+// Stands in for the default heap under heap.h. Both entries have to be there.
 struct HostHeap {
     void* (*Alloc)(void* self, std::size_t size);  // null: no memory
     void (*Free)(void* self, void* memory);        // null is allowed
@@ -28,9 +28,16 @@ struct HostSinks {
 };
 
 // Installs hooks, which stay the caller's and must outlive their use; null puts the default back
-// (malloc; standard error, errors silent). Returns the hooks that were installed before, or null
+// (HostAlloc; standard error, errors silent). Returns the hooks that were installed before, or null
 // for the default.
 const HostHeap* SetHostHeap(const HostHeap* heap);
 const HostSinks* SetHostSinks(const HostSinks* sinks);
+
+// The default heap, for hooks that pass on what they are asked: node-sized blocks lie together in
+// huge pages (slabs.h), others come from malloc. Null: no memory; null is allowed. Any thread.
+void* HostAlloc(std::size_t size);
+void HostFree(void* memory);
+// Bytes that an allocation really takes. REQUIRES: `memory` came from HostAlloc.
+std::size_t HostSizeOf(void* memory);
 
 }  // namespace VELK
