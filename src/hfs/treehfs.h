@@ -67,26 +67,26 @@ struct NodePtr {
 
 struct HfsNode;
 
-// Shortcut from an index node to a cached child: the child, and where its first block lies. Beside
-// the red-black tree of cached nodes, never instead of it.
-struct HfsNodeHint {
-    HfsNode* node;   // not counted; null: none
-    const u8* data;  // the child's first block
-    u32 nodeNum;     // the child's number
+// Shortcuts from an index node to cached children: each child, and where its first block lies. They
+// stand beside the red-black tree of cached nodes, never instead of it. One line of a processor's
+// cache.
+struct HfsHintSet {
+    static constexpr u32 kPlaces = 3;
+    u32 nodeNum[kPlaces];     // the children's numbers
+    u32 next;                 // place to give up when one more child comes
+    HfsNode* node[kPlaces];   // not counted; null: the place is free
+    const u8* data[kPlaces];  // the children's first blocks
 };
 
 // A cached node. Its bytes are the blocks of `bufs` one after the other; they are not contiguous in
-// memory. Allocated with room for blocksPerNode blocks and one zero entry behind them.
+// memory. Allocated with room for blocksPerNode blocks.
 struct HfsNode {
     rb_node link;            // by nodeNum; first member
-    u32 nodeNum;             // its place in the file: byte nodeNum << nodeShift
     list_head modifiedLink;  // linked to itself when no block is dirty
+    HfsNode* hintedBy;       // the one node whose hints lead to this one; null: none
+    HfsHintSet* hints;       // of an index node, in the node's own heap block; null: none
+    u32 nodeNum;             // its place in the file: byte nodeNum << nodeShift
     s32 refCount;            // references held; 0: cached all the same, -1: discarded
-    u32 hintMask;            // entries of `hints` less one
-    HfsNodeHint* hints;      // of an index node, in the node's own heap block; null: none
-    HfsNodeHint* hintedBy;   // the one hint that leads to this node; null: none
-    HfsNode* left;           // neighbours met in the chain of the node's level, which know this one
-    HfsNode* right;          // as theirs; null: none met
     HfsBcbBuf bufs[1];       // the blocks, in order; blocksPerNode of them
 
     // Accessors (node_access.cpp). They change nothing and return 0 or kErrCorrupt, reported with
@@ -414,8 +414,8 @@ public:
     bool reservationOpen = false;  // ReserveSpace was called with a BTReserve, and not released
     bool isDirty = false;          // header or map changed since the last flush
     u64 pathVersion = 1;  // raised when records move so that a stored path may no longer lead right
-    HfsNodeHint rootHint{};  // leads to the root when that is cached
-    bool isAllOwn = false;   // Create made the tree and no node was read from the volume since
+    HfsNode* rootHint = nullptr;  // the root when that is cached and was met; else null
+    bool isAllOwn = false;        // Create made the tree and no node was read from the volume since
 };
 
 }  // namespace VELK

@@ -19,6 +19,7 @@ MEMORY_ALLOWED = {
     "bytes.h": "the window itself", "bytes.cpp": "the window itself",
     "cache.cpp": "a new node object and its zero-filled new blocks",
     "cache_dirty.cpp": "zero-filling of whole blocks",
+    "hints.cpp": "what a node remembers beside its blocks",
     "scratch.h": "the scratch buffer", "scratch.cpp": "the scratch buffer",
     "path_deliver.cpp": "buffers of the caller",
 }

@@ -5,6 +5,7 @@
 #include <cstring>
 
 #include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/report.h"
@@ -34,16 +35,17 @@ bool HasWholeBlocks(const BTHeaderMem& header) {
     return static_cast<u64>(header.blocksPerNode) << header.blockShift == header.nodeSize;
 }
 
-// Hints an index node has room for: several times the children it is likely to have, so that few
-// of them share a place.
-u32 HintCount(const CBTreeHfs* tree) {
-    constexpr u32 kNodeBytesPerHint = 16;
-    return (1u << tree->nodeShift) / kNodeBytesPerHint;
+std::size_t RoundUp(std::size_t size, std::size_t unit) {
+    return (size + unit - 1) / unit * unit;
 }
 
 HfsNode* NewNode(const CBTreeHfs* tree, u32 nodeNum, bool withHints) {
-    const std::size_t ownSize = sizeof(HfsNode) + tree->header.blocksPerNode * sizeof(HfsBcbBuf);
-    const std::size_t hintSize = withHints ? HintCount(tree) * sizeof(HfsNodeHint) : 0;
+    std::size_t ownSize = offsetof(HfsNode, bufs) + tree->header.blocksPerNode * sizeof(HfsBcbBuf);
+    std::size_t hintSize = 0;
+    if (withHints) {
+        ownSize = RoundUp(ownSize, sizeof(HfsHintSet));  // where the block begins with a line
+        hintSize = HintBytes(tree);
+    }
     HfsNode* node = static_cast<HfsNode*>(velk_heap_alloc(ownSize + hintSize));
     if (node == nullptr) {
         return nullptr;
@@ -53,58 +55,9 @@ HfsNode* NewNode(const CBTreeHfs* tree, u32 nodeNum, bool withHints) {
     node->modifiedLink.Init();
     node->link.MarkUnlinked();
     if (withHints) {
-        node->hints = reinterpret_cast<HfsNodeHint*>(reinterpret_cast<u8*>(node) + ownSize);
-        node->hintMask = HintCount(tree) - 1;
+        node->hints = reinterpret_cast<HfsHintSet*>(reinterpret_cast<u8*>(node) + ownSize);
     }
     return node;
-}
-
-// A child has two places among its parent's hints, side by side.
-HfsNodeHint* HintPlaces(HfsNode* parent, u32 nodeNum) {
-    return &parent->hints[nodeNum & parent->hintMask & ~1u];
-}
-
-HfsNodeHint* FindHint(HfsNodeHint* places, bool isPair, u32 nodeNum) {
-    if (places == nullptr) {
-        return nullptr;
-    }
-    HfsNodeHint* hint = places + (isPair && places->nodeNum != nodeNum ? 1 : 0);
-    return hint->nodeNum == nodeNum && hint->node != nullptr ? hint : nullptr;
-}
-
-// Takes an empty place, else one of the two by a bit of the number that did not choose the pair.
-void SetHint(HfsNodeHint* places, bool isPair, HfsNode* child) {
-    HfsNodeHint* hint = places + (isPair && places->node != nullptr ? 1 : 0);
-    if (hint->node != nullptr) {
-        hint = places + (isPair ? child->nodeNum & 1 : 0);
-        hint->node->hintedBy = nullptr;
-    }
-    if (child->hintedBy != nullptr) {
-        child->hintedBy->node = nullptr;
-    }
-    *hint = {child, child->bufs[0].data, child->nodeNum};
-    child->hintedBy = hint;
-}
-
-// No hint outlives the node it leads to or the node it belongs to, nor does acquaintance.
-void ForgetHints(HfsNode* node) {
-    if (node->left != nullptr) {
-        node->left->right = nullptr;
-    }
-    if (node->right != nullptr) {
-        node->right->left = nullptr;
-    }
-    if (node->hintedBy != nullptr) {
-        node->hintedBy->node = nullptr;
-    }
-    if (node->hints == nullptr) {
-        return;
-    }
-    for (u32 i = 0; i <= node->hintMask; ++i) {
-        if (node->hints[i].node != nullptr) {
-            node->hints[i].node->hintedBy = nullptr;
-        }
-    }
 }
 
 void FreeNodeMemory(CBTreeHfs* tree, HfsNode* node) {
@@ -176,6 +129,7 @@ u32 FirstNonZeroWord(const u8* data, u32 blockSize) {
 void EmptyExisting(CBTreeHfs* tree, HfsNode* node) {
     const BTHeaderMem& header = tree->header;
     tree->pathVersion += 1;
+    ForgetSeparators(tree, node);
     bool madeDirty = false;
     bool granted = true;
     for (u32 i = 0; i < header.blocksPerNode; ++i) {
@@ -286,7 +240,7 @@ void DiscardNode(CBTreeHfs* tree, HfsNode* node) {
         node->link.remove(&tree->nodeRoot);
     }
     node->modifiedLink.Unlink();
-    ForgetHints(node);
+    ForgetHints(tree, node);
     FreeNodeMemory(tree, node);
 }
 
@@ -333,63 +287,82 @@ int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
     return kOk;
 }
 
-int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNode** out) {
-    HfsNodeHint* places = parent == nullptr          ? &tree->rootHint
-                          : parent->hints != nullptr ? HintPlaces(parent, nodeNum)
-                                                     : nullptr;
-    HfsNodeHint* hint = FindHint(places, parent != nullptr, nodeNum);
-    if (hint == nullptr) {
-        const int status = FetchNode(tree, nodeNum, use, out);
-        if (status == kOk && places != nullptr) {
-            SetHint(places, parent != nullptr, *out);
-        }
-        return status;
-    }
-    // Asked for all at once, as each may be cold: the node's block entries, which lie in its
-    // second line, its descriptor, and its offset table, which is long in an index node.
-    const u8* end = hint->data + tree->header.blockSize;
-    __builtin_prefetch(&hint->node->bufs[0]);
-    __builtin_prefetch(hint->data);
+// A request met by a hint. What will be needed is asked for all at once, as each may be cold: the
+// node's block entries, its descriptor, and its offset table, which is long in an index node.
+void TakeHinted(CBTreeHfs* tree, HfsNode* node, const u8* data, NodeUse use, HfsNode** out) {
+    const u8* end = data + tree->header.blockSize;
+    __builtin_prefetch(&node->bufs[0]);
+    __builtin_prefetch(data);
     __builtin_prefetch(end - 64);
     if (use == NodeUse::kReadIndex) {
         __builtin_prefetch(end - 128);
         __builtin_prefetch(end - 192);
     }
-    TakeCached(tree, hint->node, out);
-    return kOk;
+    TakeCached(tree, node, out);
 }
 
-void Introduce(HfsNode* left, HfsNode* right) {
-    if (left->right != nullptr) {
-        left->right->left = nullptr;
-    }
-    if (right->left != nullptr) {
-        right->left->right = nullptr;
-    }
-    left->right = right;
-    right->left = left;
-}
-
-int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out) {
-    const u32 nodeNum = side == Side::kRight ? FLink(node) : BLink(node);
-    HfsNode* known = KnownSibling(node, side, nodeNum);
-    if (known != nullptr) {
-        TakeCached(tree, known, out);
+int FetchRoot(CBTreeHfs* tree, NodeUse use, HfsNode** out) {
+    HfsNode* root = tree->rootHint;
+    if (root != nullptr && root->nodeNum == tree->header.rootNode) {
+        TakeCached(tree, root, out);
         return kOk;
     }
-    const int status = FetchNode(tree, nodeNum, NodeUse::kRead, out);
-    if (status == kOk && *out != node) {
-        side == Side::kRight ? Introduce(node, *out) : Introduce(*out, node);
+    const int status = FetchNode(tree, tree->header.rootNode, use, out);
+    if (status == kOk) {
+        tree->rootHint = *out;
     }
     return status;
 }
 
-void PrefetchSibling(const CBTreeHfs* tree, const HfsNode* node, Side side) {
-    const HfsNode* known = side == Side::kRight ? node->right : node->left;
+int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNode** out) {
+    const HintPlace hint = FindHint(tree, parent, nodeNum);
+    if (hint) {
+        TakeHinted(tree, hint.Node(), hint.Data(), use, out);
+        return kOk;
+    }
+    const int status = FetchNode(tree, nodeNum, use, out);
+    if (status == kOk && parent->hints != nullptr) {
+        SetHint(tree, parent, *out);
+    }
+    return status;
+}
+
+u32 LinkOn(const HfsNode* node, Side side) {
+    return side == Side::kRight ? FLink(node) : BLink(node);
+}
+
+HfsNode* KnownSibling(const CBTreeHfs* tree, const HfsNode* node, u32 nodeNum) {
+    const HintPlace hint = FindHint(tree, node->hintedBy, nodeNum);
+    return hint && hint.Node() != node ? hint.Node() : nullptr;
+}
+
+void Introduce(CBTreeHfs* tree, const HfsNode* node, HfsNode* fresh) {
+    if (node->hintedBy != nullptr) {
+        SetHint(tree, node->hintedBy, fresh);
+    }
+}
+
+int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out) {
+    const u32 nodeNum = LinkOn(node, side);
+    HfsNode* known = KnownSibling(tree, node, nodeNum);
     if (known != nullptr) {
-        const u8* data = known->bufs[0].data;
-        __builtin_prefetch(data);
-        __builtin_prefetch(data + tree->header.blockSize - 64);
+        TakeCached(tree, known, out);
+        return kOk;
+    }
+    return FetchNode(tree, nodeNum, NodeUse::kRead, out);
+}
+
+void PrefetchSibling(const CBTreeHfs* tree, const HfsNode* node, Side side) {
+    // What the node's own removal from the tree of cached nodes will meet first.
+    __builtin_prefetch(node->link.Parent());
+    __builtin_prefetch(node->link.left);
+    __builtin_prefetch(node->link.right);
+    const HintPlace hint = FindHint(tree, node->hintedBy, LinkOn(node, side));
+    if (hint) {
+        __builtin_prefetch(hint.Node());
+        __builtin_prefetch(&hint.Node()->bufs[0]);
+        __builtin_prefetch(hint.Data());
+        __builtin_prefetch(hint.Data() + tree->header.blockSize - 64);
     }
 }
 

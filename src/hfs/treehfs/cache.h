@@ -41,20 +41,21 @@ enum class NodeUse {
 };
 int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out);
 
-// GetINode of a child of `parent`, by its hint when there is one; of the root with no parent.
+// GetINode of the root, and of a child of `parent`, by a hint when there is one.
+int FetchRoot(CBTreeHfs* tree, NodeUse use, HfsNode** out);
 int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNode** out);
 
-// Neighbours in the chain of a level know each other from splits and from having met. What a node
-// knows is only a way round the search by number: its links on disk decide.
+// Neighbours in the chain of a level.
 enum class Side { kLeft, kRight };
 
-// The neighbour of `node` on one side when it is known and has this number, else null.
-inline HfsNode* KnownSibling(const HfsNode* node, Side side, u32 nodeNum) {
-    HfsNode* known = side == Side::kRight ? node->right : node->left;
-    return known != nullptr && known->nodeNum == nodeNum ? known : nullptr;
-}
-// Makes two nodes known to each other in place of those they knew.
-void Introduce(HfsNode* left, HfsNode* right);
+// The number `node` links to on one side; 0: none.
+u32 LinkOn(const HfsNode* node, Side side);
+// The neighbour with number `nodeNum` as the parent of `node` knows it; null: it does not. A parent
+// is known only if a request for `node` came through it. What is known is only a way round the
+// search by number: the links on disk decide. Never `node` itself, which the caller may give up.
+HfsNode* KnownSibling(const CBTreeHfs* tree, const HfsNode* node, u32 nodeNum);
+// Lets the parent of `node` know the new neighbour `fresh`.
+void Introduce(CBTreeHfs* tree, const HfsNode* node, HfsNode* fresh);
 // GetINode of the node that `node` links to on one side. REQUIRES: there is such a link.
 int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out);
 // Asks for the memory of the neighbour of `node`, if it is known.

@@ -3,6 +3,7 @@
 #include <cstring>
 
 #include "hfs/treehfs/cache.h"
+#include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/report.h"
 
 namespace VELK {
@@ -103,6 +104,7 @@ int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset) {
 
 int CBTreeHfs::Zero(HfsNode* node) {
     pathVersion += 1;
+    ForgetSeparators(this, node);
     for (u32 i = 0; i < header.blocksPerNode; ++i) {
         const int status = MarkBlock(this, &node->bufs[i]);
         if (status != kOk) {

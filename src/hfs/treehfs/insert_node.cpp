@@ -91,7 +91,6 @@ int LinkRight(CBTreeHfs* tree, HfsNode* node, HfsNode* fresh) {
         HFS_TRY(CheckRightSibling(right.Get(), node), 4424);
         HFS_TRY(tree->SetDirty(right.Get(), 0), 4428);
         SetBLink(hdr, right.Get(), fresh->nodeNum);
-        Introduce(fresh, right.Get());
     }
     HFS_TRY(tree->SetDirty(fresh, 0), 9230);
     SetFLink(hdr, fresh, next);
@@ -100,7 +99,7 @@ int LinkRight(CBTreeHfs* tree, HfsNode* node, HfsNode* fresh) {
     SetHeight(hdr, fresh, Height(node));
     HFS_TRY(tree->SetDirty(node, 0), 4449);
     SetFLink(hdr, node, fresh->nodeNum);
-    Introduce(node, fresh);
+    Introduce(tree, node, fresh);
     if (IsLeaf(fresh) && next == 0) {
         tree->header.lastLeafNode = fresh->nodeNum;
         tree->isDirty = true;

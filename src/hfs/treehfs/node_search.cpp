@@ -3,7 +3,9 @@
 // doubt goes the careful way of FetchKey, which also reports what is wrong.
 #include "hfs/treehfs/node_search.h"
 
+#include "hfs/names.h"
 #include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/path_deliver.h"
 #include "hfs/treehfs/report.h"
@@ -145,6 +147,15 @@ public:
         return true;
     }
 
+    // The child that record `index`, whose key KeyAt gave, leads to; 0: its data is no child.
+    u32 ChildAt(u32 index, const u8* key) const {
+        const u32 slots = blocks_.SlotPair(index);
+        const u32 dataStart = (slots & 0xFFFF) + PaddedKeySize(GetBe16(key));
+        return (slots >> 16) - dataStart == kChildSize && blocks_.IsWhole(dataStart, kChildSize)
+                   ? GetBe32(blocks_.At(dataStart))
+                   : 0;
+    }
+
     void Prefetch(u32 index) const {
         const u32 start = blocks_.SlotPair(index) & 0xFFFF;
         if (start < nodeSize_) {
@@ -172,6 +183,58 @@ template <int kRounds, typename Keys>
         PrefetchProbes<kRounds - 1>(keys, middle + 1, high);
     }
 }
+
+// Folds a unit, ASCII without the table.
+u16 Fold(u16 unit) {
+    const u16 plain = FoldPlain(unit);
+    return plain != 0 ? plain : FoldHfsUnit(unit);
+}
+
+// Parent and first two units of a name, folded, as one number. A missing unit counts 0, as a name
+// sorts before those that go on. False: a unit that folding ignores, so that a later one decides.
+template <typename Unit>
+bool MakeOrder(u32 parent, u32 length, Unit unit, u64* order) {
+    const u16 first = length > 0 ? Fold(unit(0)) : u16{0};
+    const u16 second = length > 1 ? Fold(unit(1)) : u16{0};
+    *order = u64{parent} << 32 | u32{first} << 16 | second;
+    return (length == 0 || first != 0) && (length <= 1 || second != 0);
+}
+
+// What a search makes of the records it meets for the searches after it: nothing in a leaf, which
+// holds few.
+class NothingKnown {
+public:
+    static bool Decide(u32, const SearchKey&, int*) { return false; }
+    template <typename Keys>
+    static void Learn(const Keys&, u32, const u8*) {}
+};
+
+// In an index node of folded keys: their order in one number, and the child.
+class KnownSeparators {
+public:
+    explicit KnownSeparators(const Separators& separators) : separators_(separators) {}
+
+    bool Decide(u32 index, const SearchKey& key, int* order) const {
+        if (separators_.Child(index) == 0 || separators_.Order(index) == key.Order()) {
+            return false;
+        }
+        *order = key.Order() > separators_.Order(index) ? 1 : -1;
+        return true;
+    }
+    template <typename Keys>
+    void Learn(const Keys& keys, u32 index, const u8* key) const {
+        const auto unit = [key](u32 at) { return GetBe16(key + kCatKeyName + 2 * at); };
+        u64 order = 0;
+        const u32 child = keys.ChildAt(index, key);
+        if (child != 0 && MakeOrder(GetBe32(key + kCatKeyParentId),
+                                    GetBe16(key + kCatKeyNameLength), unit, &order)) {
+            separators_.Learn(index, order, child);
+        }
+    }
+
+private:
+    Separators separators_;
+};
 
 // Few nodes stand above the lowest index nodes: they stay in the processor's caches.
 template <typename Keys>
@@ -202,9 +265,13 @@ SearchKey::SearchKey(const CBTreeHfs* tree, const BTreeKey* key, unsigned id)
     isFolded_ = compare_ == CompareCatKeysCaseIns;
     // The whole key, not the two bytes of its length field.
     const u8* bytes = reinterpret_cast<const u8*>(key);
-    if (isFolded_ && GetHost16(bytes + kCatKeyNameLength) != 0) {
-        firstUnit_ = FoldPlain(GetHost16(bytes + kCatKeyName));
+    if (!isFolded_) {
+        return;
     }
+    const u32 length = GetHost16(bytes + kCatKeyNameLength);
+    const auto unit = [bytes](u32 at) { return GetHost16(bytes + kCatKeyName + 2 * at); };
+    firstUnit_ = length > 0 ? FoldPlain(unit(0)) : u16{0};
+    hasOrder_ = MakeOrder(id, length, unit, &order_);
 }
 
 // Decides by parent and first unit of the name; 0 when these are equal or not plain.
@@ -234,37 +301,41 @@ inline int SearchKey::Compare(const BTreeKey* nodeKey) const {
 
 namespace {
 
-template <typename Blocks, typename Shape>
-int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
+// The same search with and without what the node remembers: it probes the same records.
+template <typename Blocks, typename Shape, typename Known>
+int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key,
+           const QuickKeys<Blocks, Shape>& keys, const Known& known, SearchResult* result) {
     const u32 count = NumRecords(node);
     s32 low = 0;
     s32 high = static_cast<s32>(count) - 1;
-    const QuickKeys<Blocks, Shape> keys(&tree->header, node, key);
     const bool quick = HasQuickKeys(tree->header, key, count);
-    if (quick) {
-        PrefetchFor(keys, Height(node), high);
-    }
     while (low <= high) {
         const s32 middle = (low + high) >> 1;
-        const u8* bytes = quick ? keys.KeyAt(static_cast<u32>(middle)) : nullptr;
-        const BTreeKey* nodeKey = reinterpret_cast<const BTreeKey*>(bytes);
-        if (HFS_UNLIKELY(nodeKey == nullptr)) {
-            const int status = FetchKey(tree, node, middle, &result->record, &nodeKey);
-            if (HFS_UNLIKELY(status != kOk)) {
-                if (status != kErrNoMemory) {
-                    Report(status, 3005);
+        const u32 index = static_cast<u32>(middle);
+        int order = 0;
+        if (!known.Decide(index, key, &order)) {
+            const u8* bytes = quick ? keys.KeyAt(index) : nullptr;
+            const BTreeKey* nodeKey = reinterpret_cast<const BTreeKey*>(bytes);
+            if (HFS_UNLIKELY(nodeKey == nullptr)) {
+                const int status = FetchKey(tree, node, middle, &result->record, &nodeKey);
+                if (HFS_UNLIKELY(status != kOk)) {
+                    if (status != kErrNoMemory) {
+                        Report(status, 3005);
+                    }
+                    return status;
                 }
-                return status;
+            } else {
+                known.Learn(keys, index, bytes);
             }
-        }
-        const int order = Shape::Compare(key, nodeKey);
-        if (order == 0) {
-            result->found = true;
-            result->isLocated =
-                bytes == nullptr || keys.Describe(static_cast<u32>(middle), bytes, &result->record);
-            result->index = middle;
-            result->key = nodeKey;
-            return kOk;
+            order = Shape::Compare(key, nodeKey);
+            if (order == 0) {
+                result->found = true;
+                result->isLocated =
+                    bytes == nullptr || keys.Describe(index, bytes, &result->record);
+                result->index = middle;
+                result->key = nodeKey;
+                return kOk;
+            }
         }
         if (order < 0) {
             high = middle - 1;
@@ -275,6 +346,36 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchRes
     result->found = false;
     result->index = low;
     return kOk;
+}
+
+template <typename Blocks, typename Shape>
+int SearchPlain(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
+    const u32 count = NumRecords(node);
+    const QuickKeys<Blocks, Shape> keys(&tree->header, node, key);
+    if (HasQuickKeys(tree->header, key, count)) {
+        PrefetchFor(keys, Height(node), static_cast<s32>(count) - 1);
+    }
+    return Search(tree, node, key, keys, NothingKnown(), result);
+}
+
+template <typename Blocks>
+int SearchKnown(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
+    const u32 count = NumRecords(node);
+    const QuickKeys<Blocks, FoldedKeys> keys(&tree->header, node, key);
+    const Separators separators(tree, node);
+    if (separators.Child(count / 2) != 0) {
+        separators.Prefetch(count);
+    } else if (HasQuickKeys(tree->header, key, count)) {
+        PrefetchFor(keys, Height(node), static_cast<s32>(count) - 1);
+    }
+    return Search(tree, node, key, keys, KnownSeparators(separators), result);
+}
+
+template <typename Blocks>
+int SearchFolded(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
+    return node->hints != nullptr && key.HasOrder()
+               ? SearchKnown<Blocks>(tree, node, key, result)
+               : SearchPlain<Blocks, FoldedKeys>(tree, node, key, result);
 }
 
 // SearchInside without the search proper. True: the key lies between the first and the last.
@@ -299,11 +400,11 @@ bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, u32 
 int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
     const bool isWhole = tree->header.blocksPerNode == 1;
     if (key.IsFolded()) {
-        return isWhole ? Search<OneBlock, FoldedKeys>(tree, node, key, result)
-                       : Search<ManyBlocks, FoldedKeys>(tree, node, key, result);
+        return isWhole ? SearchFolded<OneBlock>(tree, node, key, result)
+                       : SearchFolded<ManyBlocks>(tree, node, key, result);
     }
-    return isWhole ? Search<OneBlock, OtherKeys>(tree, node, key, result)
-                   : Search<ManyBlocks, OtherKeys>(tree, node, key, result);
+    return isWhole ? SearchPlain<OneBlock, OtherKeys>(tree, node, key, result)
+                   : SearchPlain<ManyBlocks, OtherKeys>(tree, node, key, result);
 }
 
 bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key,
@@ -324,12 +425,14 @@ bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key,
     return isInside && SearchNode(tree, leaf, key, result) == kOk;
 }
 
-int ChildOf(const CBTreeHfs* tree, const HfsNode* node, s32 index, u32* child) {
-    const BTHeaderMem* hdr = &tree->header;
+namespace {
+
+// The child of a plain record in a node of one block; 0: the record is not so plain.
+u32 PlainChild(const BTHeaderMem* hdr, const HfsNode* node, s32 index) {
     const u32 count = NumRecords(node);
     if (hdr->blocksPerNode != 1 || index < 0 || static_cast<u32>(index) >= count ||
         kSlotSize * (count + 1) >= hdr->nodeSize) {
-        return node->GetChildNodeNum(hdr, index, child);
+        return 0;
     }
     const u8* data = node->bufs[0].data;
     const u32 start = GetBe16(data + SlotOffset(hdr, static_cast<u32>(index)));
@@ -337,10 +440,31 @@ int ChildOf(const CBTreeHfs* tree, const HfsNode* node, s32 index, u32* child) {
     if (HFS_UNLIKELY(end >= hdr->nodeSize || start + kKeyLengthSize > end) ||
         HFS_UNLIKELY(Kind(node) != kBTIndexNode) ||
         HFS_UNLIKELY(PaddedKeySize(GetBe16(data + start)) + kChildSize != end - start)) {
-        return node->GetChildNodeNum(hdr, index, child);
+        return 0;
     }
-    *child = GetBe32(data + end - kChildSize);
-    return kOk;
+    return GetBe32(data + end - kChildSize);
+}
+
+}  // namespace
+
+int ChildOf(const CBTreeHfs* tree, const HfsNode* node, s32 index, u32* child) {
+    *child = PlainChild(&tree->header, node, index);
+    return *child != 0 ? kOk : node->GetChildNodeNum(&tree->header, index, child);
+}
+
+u32 RememberedChild(const CBTreeHfs* tree, const HfsNode* node, s32 index, bool* isStale) {
+    if (node->hints == nullptr || tree->header.blocksPerNode != 1) {
+        return 0;
+    }
+    u32 child = Separators(tree, node).Child(static_cast<u32>(index));
+    if (child == 0) {
+        return 0;
+    }
+    *isStale = PlainChild(&tree->header, node, index) != child;
+    // What is remembered is there long before the node's bytes are: the way down goes on with it
+    // while they are still on their way, instead of with the equal number they hold.
+    asm("" : "+r"(child));
+    return *isStale ? 0 : child;
 }
 
 }  // namespace VELK

@@ -16,6 +16,10 @@ public:
     // The same of a key in folded order, as IsFolded tells.
     int CompareFolded(const BTreeKey* nodeKey) const;
     bool IsFolded() const { return isFolded_; }
+    // Parent and first two units of a key in folded order as one number: of two keys that have one,
+    // the key with the greater number sorts behind the other. False: the key has none.
+    bool HasOrder() const { return hasOrder_; }
+    u64 Order() const { return order_; }
 
     // Fewest bytes of a sound node key, and where its name length stands (0: it has no name).
     u32 Fixed() const { return fixed_; }
@@ -29,8 +33,10 @@ private:
     unsigned id_;
     u32 fixed_ = 0;
     u32 nameLengthAt_ = 0;
+    u64 order_ = 0;
     u16 firstUnit_ = 0;  // folded; 0: the comparator has to decide
     bool isFolded_ = false;
+    bool hasOrder_ = false;
 };
 
 // What a search in one node came to.
@@ -52,5 +58,9 @@ bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, Se
 
 // GetChildNodeNum without the way round for plain records.
 int ChildOf(const CBTreeHfs* tree, const HfsNode* node, s32 index, u32* child);
+
+// The child of a record as far as the node remembers it from searches; 0: it does not.
+// `*isStale`: the node's bytes say otherwise, so what it remembers is void.
+u32 RememberedChild(const CBTreeHfs* tree, const HfsNode* node, s32 index, bool* isStale);
 
 }  // namespace VELK

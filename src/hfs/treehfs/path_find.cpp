@@ -1,6 +1,7 @@
 // Lookup: from the root to a leaf by binary search in each node, leaving the search path behind.
 #include "hfs/treehfs/bytes.h"
 #include "hfs/treehfs/cache.h"
+#include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/node_search.h"
 #include "hfs/treehfs/noderef.h"
@@ -46,9 +47,11 @@ int FetchForLevel(CBTreeHfs* tree, u32 nodeNum, HfsNode* parent, HfsNode* known,
         TakeCached(tree, known, out);
         return kOk;
     }
-    const bool hasHint = parent != nullptr || nodeNum == tree->header.rootNode;
-    return hasHint ? FetchChild(tree, parent, nodeNum, use, out)
-                   : FetchNode(tree, nodeNum, use, out);
+    if (parent != nullptr) {
+        return FetchChild(tree, parent, nodeNum, use, out);
+    }
+    return nodeNum == tree->header.rootNode ? FetchRoot(tree, use, out)
+                                            : FetchNode(tree, nodeNum, use, out);
 }
 
 void DeliverFoundKey(const CBTreeHfs* tree, const SearchResult& found, void* keyOut,
@@ -73,6 +76,28 @@ int DeliverFoundRecord(CBTreeHfs* tree, const HfsNode* node, const SearchResult&
     return status;
 }
 
+// Searches an index node of the path and gives the child that leads on to the key.
+int SearchIndex(CBTreeHfs* tree, const SearchKey& key, HfsFindLevel* entry, bool* found,
+                SearchResult* result, u32* child) {
+    const int status = SearchNode(tree, entry->node, key, result);
+    if (HFS_UNLIKELY(status != kOk)) {
+        return status;
+    }
+    *found = result->found;
+    entry->index = !result->found && result->index > 0 ? result->index - 1 : result->index;
+    bool isStale = false;
+    *child = RememberedChild(tree, entry->node, entry->index, &isStale);
+    if (*child != 0) {
+        return kOk;
+    }
+    if (HFS_UNLIKELY(isStale)) {
+        ForgetSeparators(tree, entry->node);
+        return SearchIndex(tree, key, entry, found, result, child);
+    }
+    HFS_TRY(ChildOf(tree, entry->node, entry->index, child), 3095);
+    return kOk;
+}
+
 // Goes from the root to a leaf and searches each node on the way. `*found` tells of the node
 // searched last.
 int Descend(CBTreeHfs* tree, const SearchKey& key, HfsFindData* path, bool* found,
@@ -90,19 +115,16 @@ int Descend(CBTreeHfs* tree, const SearchKey& key, HfsFindData* path, bool* foun
         }
         HFS_TRY(status, 2982);
         HfsFindLevel* entry = &path->path[level];
-        status = SearchNode(tree, entry->node, key, result);
+        if (IsLeaf(entry->node)) {
+            status = SearchNode(tree, entry->node, key, result);
+            *found = status == kOk ? result->found : *found;
+            entry->index = status == kOk ? result->index : entry->index;
+            return status;
+        }
+        status = SearchIndex(tree, key, entry, found, result, &nodeNum);
         if (HFS_UNLIKELY(status != kOk)) {
             return status;
         }
-        *found = result->found;
-        entry->index = result->index;
-        if (IsLeaf(entry->node)) {
-            return kOk;
-        }
-        if (!result->found && result->index > 0) {
-            entry->index = result->index - 1;
-        }
-        HFS_TRY(ChildOf(tree, entry->node, entry->index, &nodeNum), 3095);
         parent = entry->node;
         level -= 1;
     }

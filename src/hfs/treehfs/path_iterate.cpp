@@ -28,13 +28,14 @@ void LeaveLeaf(CBTreeHfs* tree, HfsFindData* path) {
 
 // Steps from the current leaf to node `sibling` on one side; the index becomes 0.
 int EnterLeaf(CBTreeHfs* tree, u32 sibling, Side side, HfsFindData* path) {
-    HfsNode* known = KnownSibling(path->path[1].node, side, sibling);
+    HfsNode* known = KnownSibling(tree, path->path[1].node, sibling);
     LeaveLeaf(tree, path);
     path->leadsAsOf = 0;
-    if (known != nullptr) {
-        PrefetchSibling(tree, known, side);  // the one after
+    const int status = LoadLevel(tree, 1, sibling, nullptr, path, known);
+    if (status == kOk) {
+        PrefetchSibling(tree, path->path[1].node, side);  // the one after
     }
-    return LoadLevel(tree, 1, sibling, nullptr, path, known);
+    return status;
 }
 
 // A chain of leaves cannot be longer than the tree has nodes: a longer one is a ring.

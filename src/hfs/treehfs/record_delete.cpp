@@ -1,4 +1,5 @@
 // Takes one record out of one node and closes the gap. Looks at no other node.
+#include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/slots.h"
@@ -36,6 +37,19 @@ int CloseSlots(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 ind
     return kOk;
 }
 
+// Closes the gap that record `index` leaves.
+int CloseGap(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 index) {
+    HFS_TRY(tree->SetDirty(node, slots.limit), 962);
+    HFS_TRY(tree->SetDirty(node, slots.start, slots.free - slots.start), 1011);
+    const NodeBytes bytes(&tree->header, node);
+    bytes.Move(slots.start, slots.end, slots.free - slots.end);
+
+    HFS_TRY(tree->SetDirty(node, 0), 1054);
+    SetNumRecords(&tree->header, node, slots.count - 1);
+    bytes.SetU16(slots.limit, 0);
+    return CloseSlots(tree, node, slots, index);
+}
+
 }  // namespace
 
 int CBTreeHfs::_DeleteRecord(HfsNode* node, int index) {
@@ -46,15 +60,13 @@ int CBTreeHfs::_DeleteRecord(HfsNode* node, int index) {
     if (!LoadRecordSlots(&header, node, record, &slots)) {
         return Fail(kErrCorrupt, kReasonNode, 9210);
     }
-    HFS_TRY(SetDirty(node, slots.limit), 962);
-    HFS_TRY(SetDirty(node, slots.start, slots.free - slots.start), 1011);
-    const NodeBytes bytes(&header, node);
-    bytes.Move(slots.start, slots.end, slots.free - slots.end);
-
-    HFS_TRY(SetDirty(node, 0), 1054);
-    SetNumRecords(&header, node, count - 1);
-    bytes.SetU16(slots.limit, 0);
-    return CloseSlots(this, node, slots, record);
+    const int status = CloseGap(this, node, slots, record);
+    if (status != kOk) {
+        ForgetSeparators(this, node);
+    } else if (node->hints != nullptr) {
+        Separators(this, node).Remove(record, count);
+    }
+    return status;
 }
 
 }  // namespace VELK

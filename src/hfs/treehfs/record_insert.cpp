@@ -1,6 +1,7 @@
 // Puts one record into one node: _InsertRecord opens a gap and counts the record, _InsertKeyRecord
 // fills it with a key and its data, converted to disk form on the way. Neither looks at another
 // node. That a record does not fit is an answer to callers that ask for it.
+#include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/scratch.h"
@@ -45,7 +46,7 @@ int OpenSlots(CBTreeHfs* tree, HfsNode* node, u32 first, u32 slotCount, u32 size
 int OpenGap(CBTreeHfs* tree, HfsNode* node, int index, u32 size, NodeKey* key) {
     const BTHeaderMem* hdr = &tree->header;
     const u32 free = key->offset;
-    NodeKey record{};
+    NodeKey record;
     HFS_TRY(node->GetKey(hdr, index, &record), 1203);
     if (!IsInsertPoint(record.offset, free) || !IsInsertPoint(record.offset + record.size, free)) {
         return Fail(kErrCorrupt, kReasonNode, 9200);
@@ -96,6 +97,28 @@ int StoreData(CBTreeHfs* tree, const NodeBytes& bytes, u32 offset, const void* d
     return kOk;
 }
 
+// Makes a record of `size` bytes at `index`. `key` holds where free space starts and comes back
+// with the place of the record, whose bytes are not written.
+int MakeRecord(CBTreeHfs* tree, HfsNode* node, u32 index, u32 count, u32 size, NodeKey* key) {
+    const u32 limit = key->entryPos;
+    if (index == count) {
+        HFS_TRY(tree->SetDirty(node, key->offset, size), 1257);
+    } else {
+        const int status = OpenGap(tree, node, static_cast<int>(index), size, key);
+        if (status != 0) {
+            return status;
+        }
+    }
+    const int status = OpenSlots(tree, node, limit - kSlotSize, count - index + 1, size);
+    if (status != 0) {
+        return status;
+    }
+    HFS_TRY(tree->SetDirty(node, 0), 1295);
+    HFS_ASSERT(NodeBytes(&tree->header, node).IsDirty(0), 1296);
+    SetNumRecords(&tree->header, node, count + 1);
+    return kOk;
+}
+
 }  // namespace
 
 int CBTreeHfs::_InsertRecord(HfsNode* node, int index, unsigned size, NodeKey* key,
@@ -121,23 +144,14 @@ int CBTreeHfs::_InsertRecord(HfsNode* node, int index, unsigned size, NodeKey* k
         return kOk;
     }
 
-    if (static_cast<u32>(index) == count) {
-        HFS_TRY(SetDirty(node, free, size), 1257);
-    } else {
-        const int status = OpenGap(this, node, index, size, key);
-        if (status != 0) {
-            return status;
-        }
-    }
-    const u32 slotCount = count - static_cast<u32>(index) + 1;
-    const int status = OpenSlots(this, node, limit - kSlotSize, slotCount, size);
-    if (status != 0) {
+    const int status = MakeRecord(this, node, static_cast<u32>(index), count, size, key);
+    if (status != kOk) {
+        ForgetSeparators(this, node);
         return status;
     }
-
-    HFS_TRY(SetDirty(node, 0), 1295);
-    HFS_ASSERT(NodeBytes(&header, node).IsDirty(0), 1296);
-    SetNumRecords(&header, node, count + 1);
+    if (node->hints != nullptr) {
+        Separators(this, node).Insert(static_cast<u32>(index), count);
+    }
     if (inserted != nullptr) {
         *inserted = true;
     }
@@ -166,7 +180,7 @@ int CBTreeHfs::_InsertKeyRecord(HfsNode* node, int index, const BTreeKey* key, u
     const u64 recordSize = (static_cast<u64>(dataSize) + 1) / 2 * 2 + paddedKeySize;
     // A size beyond 32 bits fits no node either.
     const u32 size = recordSize > UINT32_MAX ? UINT32_MAX - 1 : static_cast<u32>(recordSize);
-    NodeKey record{};
+    NodeKey record;
     HFS_TRY(_InsertRecord(node, index, size, &record, inserted), 1370);
     if (inserted != nullptr && !*inserted) {
         return kOk;
