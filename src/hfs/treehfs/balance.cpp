@@ -2,6 +2,7 @@
 // front to the left sibling, _RotateRight from its back to the right one. How many entries go is
 // planned by bytes before the first record moves. Parents and sibling links are left alone.
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/record_move.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/slots.h"
 
@@ -111,6 +112,16 @@ bool CanShare(const BTHeaderMem* hdr, const HfsNode* giver, const HfsNode* recei
            TableIsSound(hdr, receiver);
 }
 
+int LendFront(CBTreeHfs* tree, HfsNode* left, HfsNode* node, u32 count) {
+    HFS_TRY(MoveRecordsLeft(tree, left, node, count), 1996);
+    return kOk;
+}
+
+int LendBack(CBTreeHfs* tree, HfsNode* right, HfsNode* node, u32 count) {
+    HFS_TRY(MoveRecordsRight(tree, right, node, count), 2122);
+    return kOk;
+}
+
 }  // namespace
 
 int CBTreeHfs::_RotateLeft(HfsNode* left, HfsNode* node, int index, const BTreeKey* key,
@@ -132,15 +143,17 @@ int CBTreeHfs::_RotateLeft(HfsNode* left, HfsNode* node, int index, const BTreeK
     }
 
     *moved = plan.moved;
-    for (u32 position = 0; position < plan.moved; ++position) {
-        if (position != entry.position) {
-            HFS_TRY(_RotateRecordLeft(left, node), 1996);
-            continue;
-        }
+    const bool goesLeft = entry.position < plan.moved;
+    int lent = LendFront(this, left, node, goesLeft ? entry.position : plan.moved);
+    if (lent == kOk && goesLeft) {
         const int last = static_cast<int>(NumRecords(left));
         HFS_TRY(_InsertKeyRecord(left, last, key, entry.keyLength, data, dataSize, hook), 1989);
         *outIndex = last;
         *outNodeNum = left->nodeNum;
+        lent = LendFront(this, left, node, plan.moved - entry.position - 1);
+    }
+    if (lent != kOk) {
+        return lent;
     }
     if (entry.position >= plan.moved) {
         const int kept = static_cast<int>(entry.position - plan.moved);
@@ -174,18 +187,20 @@ int CBTreeHfs::_RotateRight(HfsNode* node, HfsNode* right, int index, const BTre
 
     *moved = plan.moved;
     const u32 firstMoved = entry.count + 1 - plan.moved;
-    for (u32 position = entry.count + 1; position > firstMoved; --position) {
-        if (position - 1 != entry.position) {
-            HFS_TRY(_RotateRecordRight(right, node), 2122);
-            *outIndex += *outNodeNum != 0 ? 1 : 0;
-            continue;
-        }
+    const bool goesRight = entry.position >= firstMoved;
+    int lent = LendBack(this, right, node, goesRight ? entry.count - entry.position : plan.moved);
+    if (lent == kOk && goesRight) {
         if (entry.position == entry.count) {
             HFS_TRY(_InsertKeyRecord(right, 0, key, entry.keyLength, data, dataSize, hook), 2100);
         } else {
             HFS_TRY(_InsertKeyRecord(right, 0, key, entry.keyLength, data, dataSize, hook), 2113);
         }
         *outNodeNum = right->nodeNum;
+        *outIndex = static_cast<int>(entry.position - firstMoved);
+        lent = LendBack(this, right, node, entry.position - firstMoved);
+    }
+    if (lent != kOk) {
+        return lent;
     }
     if (entry.position < firstMoved) {
         HFS_TRY(_InsertKeyRecord(node, index, key, entry.keyLength, data, dataSize, hook), 2135);

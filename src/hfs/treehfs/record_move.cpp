@@ -1,19 +1,163 @@
-// Moves one record between two neighbouring nodes: a copy goes into one, then the record leaves
-// the other. Neither looks at parents or sibling links.
+// Moves records between two neighbouring nodes: a copy goes into one, then the record leaves the
+// other. Neither looks at parents or sibling links.
+#include "hfs/treehfs/record_move.h"
+
+#include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/slots.h"
 
 namespace VELK {
 
+namespace {
+
+// The offset table of a node that lies in one block.
+class Table {
+public:
+    Table(const BTHeaderMem* hdr, const HfsNode* node)
+        : hdr_(hdr), bytes_(hdr, node), count_(NumRecords(node)) {}
+
+    u32 Count() const { return count_; }
+    u32 Start(u32 index) const { return bytes_.U16(SlotOffset(hdr_, index)); }
+    u32 Free() const { return Start(count_); }
+    u32 Room() const { return SlotOffset(hdr_, count_) - Free(); }
+    void SetStart(u32 index, u32 start) const { bytes_.SetU16(SlotOffset(hdr_, index), start); }
+    const NodeBytes& Bytes() const { return bytes_; }
+
+private:
+    const BTHeaderMem* hdr_;
+    NodeBytes bytes_;
+    u32 count_;
+};
+
+// Whether records first .. first + count - 1 of `giver` can go to `receiver` in one go: nothing on
+// the way can be refused. REQUIRES: both tables are sound.
+bool CanMoveAtOnce(const CBTreeHfs* tree, const HfsNode* giver, const HfsNode* receiver, u32 first,
+                   u32 count) {
+    const BTHeaderMem* hdr = &tree->header;
+    if (hdr->blocksPerNode != 1 || !giver->bufs[0].dirty || !receiver->bufs[0].dirty) {
+        return false;
+    }
+    const Table table(hdr, giver);
+    const u32 size = table.Start(first + count) - table.Start(first);
+    if (size + count * kSlotSize > Table(hdr, receiver).Room()) {
+        return false;
+    }
+    for (u32 i = first; i < first + count; ++i) {
+        const u32 start = table.Start(i);
+        if (start + PaddedKeySize(table.Bytes().U16(start)) >= table.Start(i + 1)) {
+            return false;
+        }
+    }
+    return true;
+}
+
+// Closes the gap that the first `count` records of `table` leave, as if they had left one by one:
+// each leaves the last bytes there were, as many as it had, once more in front of those that the
+// ones before it left.
+void CloseFront(const Table& table, u32 count) {
+    const u32 base = table.Start(0);
+    const u32 free = table.Free();
+    const u32 gap = table.Start(count) - base;
+    table.Bytes().Move(base, base + gap, free - base - gap);
+    for (u32 i = count - 1; i > 0; --i) {
+        const u32 before = table.Start(i) - base;
+        const u32 size = table.Start(i + 1) - table.Start(i);
+        table.Bytes().Move(free - before - size, free - size, size);
+    }
+    for (u32 i = count; i <= table.Count(); ++i) {
+        table.SetStart(i - count, table.Start(i) - gap);
+    }
+    for (u32 i = table.Count() - count + 1; i <= table.Count(); ++i) {
+        table.SetStart(i, 0);
+    }
+}
+
+// The first `count` records of `right` behind those of `left`.
+void MoveFront(const CBTreeHfs* tree, HfsNode* left, HfsNode* right, u32 count) {
+    const BTHeaderMem* hdr = &tree->header;
+    const Table from(hdr, right);
+    const Table to(hdr, left);
+    const u32 base = from.Start(0);
+    const u32 free = to.Free();
+    CopyBetween(to.Bytes(), free, from.Bytes(), base, from.Start(count) - base);
+    for (u32 i = 1; i <= count; ++i) {
+        to.SetStart(to.Count() + i, free + from.Start(i) - base);
+    }
+    CloseFront(from, count);
+    SetNumRecords(hdr, left, to.Count() + count);
+    SetNumRecords(hdr, right, from.Count() - count);
+    ForgetSeparators(tree, left);
+    ForgetSeparators(tree, right);
+}
+
+// The last `count` records of `left` in front of those of `right`.
+void MoveBack(const CBTreeHfs* tree, HfsNode* right, HfsNode* left, u32 count) {
+    const BTHeaderMem* hdr = &tree->header;
+    const Table from(hdr, left);
+    const Table to(hdr, right);
+    const u32 first = from.Count() - count;
+    const u32 start = from.Start(first);
+    const u32 size = from.Free() - start;
+    const u32 base = to.Start(0);
+    to.Bytes().Move(base + size, base, to.Free() - base);
+    CopyBetween(to.Bytes(), base, from.Bytes(), start, size);
+    for (u32 i = to.Count() + 1; i > 0; --i) {
+        to.SetStart(i - 1 + count, to.Start(i - 1) + size);
+    }
+    for (u32 i = 0; i < count; ++i) {
+        to.SetStart(i, base + from.Start(first + i) - start);
+    }
+    for (u32 i = first + 1; i <= from.Count(); ++i) {
+        from.SetStart(i, 0);
+    }
+    SetNumRecords(hdr, right, to.Count() + count);
+    SetNumRecords(hdr, left, first);
+    ForgetSeparators(tree, left);
+    ForgetSeparators(tree, right);
+}
+
+}  // namespace
+
+// The first record goes alone: with it both nodes are announced as changed.
+int MoveRecordsLeft(CBTreeHfs* tree, HfsNode* left, HfsNode* right, u32 count) {
+    for (u32 moved = 0; moved < count; ++moved) {
+        const int status = tree->_RotateRecordLeft(left, right);
+        if (status != kOk) {
+            return status;
+        }
+        const u32 rest = count - moved - 1;
+        if (rest > 0 && CanMoveAtOnce(tree, right, left, 0, rest)) {
+            MoveFront(tree, left, right, rest);
+            return kOk;
+        }
+    }
+    return kOk;
+}
+
+int MoveRecordsRight(CBTreeHfs* tree, HfsNode* right, HfsNode* left, u32 count) {
+    for (u32 moved = 0; moved < count; ++moved) {
+        const int status = tree->_RotateRecordRight(right, left);
+        if (status != kOk) {
+            return status;
+        }
+        const u32 rest = count - moved - 1;
+        if (rest > 0 && CanMoveAtOnce(tree, left, right, NumRecords(left) - rest, rest)) {
+            MoveBack(tree, right, left, rest);
+            return kOk;
+        }
+    }
+    return kOk;
+}
+
 int CBTreeHfs::_RotateRecordLeft(HfsNode* left, HfsNode* right) {
-    NodeKey source{};
+    NodeKey source;
     HFS_TRY(right->GetKey(&header, 0, &source), 1616);
     RecordSlots slots;
     if (left == right || !LoadRecordSlots(&header, right, 0, &slots)) {
         return Fail(kErrCorrupt, kReasonNode, 9211);
     }
-    NodeKey target{};
+    NodeKey target;
     HFS_TRY(_InsertRecord(left, -1, source.size, &target, nullptr), 1623);
     CopyBetween(NodeBytes(&header, left), target.offset, NodeBytes(&header, right), source.offset,
                 source.size);
@@ -23,13 +167,13 @@ int CBTreeHfs::_RotateRecordLeft(HfsNode* left, HfsNode* right) {
 
 int CBTreeHfs::_RotateRecordRight(HfsNode* right, HfsNode* left) {
     const int last = static_cast<int>(NumRecords(left)) - 1;
-    NodeKey source{};
+    NodeKey source;
     HFS_TRY(left->GetKey(&header, last, &source), 1698);
     RecordSlots slots;
     if (left == right || !LoadRecordSlots(&header, left, static_cast<u32>(last), &slots)) {
         return Fail(kErrCorrupt, kReasonNode, 9212);
     }
-    NodeKey target{};
+    NodeKey target;
     HFS_TRY(_InsertRecord(right, 0, source.size, &target, nullptr), 1705);
     CopyBetween(NodeBytes(&header, right), target.offset, NodeBytes(&header, left), source.offset,
                 source.size);
