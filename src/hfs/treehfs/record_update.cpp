@@ -41,7 +41,7 @@ int CBTreeHfs::UpdateKeyAndRecord(const void* key, const void* data) {
     }
     HfsNode* node = findData.path[findData.level].node;
     const int index = findData.path[findData.level].index;
-    NodeKey record{};
+    NodeKey record;
     HFS_TRY(node->GetKey(&header, index, &record), 3556);
     HFS_ASSERT(key == nullptr, 3559);
     if (data == nullptr) {

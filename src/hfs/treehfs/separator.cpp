@@ -8,7 +8,7 @@
 namespace VELK {
 
 int FirstKey(CBTreeHfs* tree, HfsNode* node, const BTreeKey** key) {
-    NodeKey record{};
+    NodeKey record;
     const int status = node->GetKey(&tree->header, 0, &record);
     if (status != 0) {
         return status;
@@ -18,7 +18,7 @@ int FirstKey(CBTreeHfs* tree, HfsNode* node, const BTreeKey** key) {
 
 int FirstKeyAside(CBTreeHfs* tree, HfsNode* node, const BTreeKey** key, void** heap) {
     *heap = nullptr;
-    NodeKey record{};
+    NodeKey record;
     const int status = node->GetKey(&tree->header, 0, &record);
     if (status != 0) {
         return status;
