@@ -12,6 +12,7 @@ add_executable(change_tests
   insert_test.cpp
   record_delete_test.cpp
   record_insert_test.cpp
+  record_move_test.cpp
   split_limits_test.cpp
   update_test.cpp
 )

@@ -2,9 +2,11 @@
 // visited says and counts what the whole way down would.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstring>
 
 #include "bench.h"
+#include "hfs/treehfs/bytes.h"
 #include "platform/heap.h"
 
 namespace VELK::test {
@@ -81,6 +83,25 @@ TEST_F(FindAgain, AnIndexNodeEmptiedMeanwhileIsMet) {
     EXPECT_EQ(bench_.capture.Take(),
               (Events{Reported(kReasonTree, 2916), Reported(kErrCorrupt, 2982),
                       Reported(kErrCorrupt, 3126)}));
+}
+
+// What the root remembers of its records is void once its bytes say otherwise.
+TEST_F(FindAgain, ChildrenExchangedInTheRootAreFollowed) {
+    EXPECT_EQ(Find(0), kOk);
+    EXPECT_EQ(Find(39), kOk);
+    const HfsNode* root = bench_->findData.path[2].node;
+    const int last = static_cast<int>(GetBe16(root->bufs[0].data + kDescNumRecords)) - 1;
+    NodeKey first;
+    NodeKey second;
+    ASSERT_EQ(root->GetKey(&bench_->header, 0, &first), kOk);
+    ASSERT_EQ(root->GetKey(&bench_->header, last, &second), kOk);
+    std::swap_ranges(first.data, first.data + kChildSize, second.data);
+    EXPECT_EQ(Find(0), kErrNotFound);
+    EXPECT_EQ(Find(0), kErrNotFound);
+    std::swap_ranges(first.data, first.data + kChildSize, second.data);
+    bench_->findData.ClearPath();
+    EXPECT_EQ(Find(0), kOk);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
 TEST_F(FindAgain, APathClearedMeanwhileIsWalkedAgain) {

@@ -1,0 +1,112 @@
+// Moves of several records at once: every byte of both nodes, free space included, and every mark
+// is what moves one by one leave.
+#include "hfs/treehfs/record_move.h"
+
+#include <algorithm>
+
+#include "hfs/treehfs/bytes.h"
+#include "node_bench.h"
+
+namespace VELK::test {
+namespace {
+
+// A leaf of `count` records of different sizes whose free space holds what was there before.
+Bytes UsedLeaf(u32 nodeSize, u32 count, u32 seed) {
+    std::vector<Bytes> records;
+    u32 used = 14;
+    for (u32 n = 0; n < count; ++n) {
+        records.push_back(NthRecord(n, 2 + (n * 7 + seed) % 5 * 12));
+        used += static_cast<u32>(records.back().size());
+    }
+    Bytes leaf = LeafOf(nodeSize, records);
+    const Bytes rest = Pattern(nodeSize - used - 2 * (count + 1), seed);
+    std::copy(rest.begin(), rest.end(), leaf.begin() + used);
+    return leaf;
+}
+
+struct Pair {
+    Pair(const Geometry& geometry, u32 giverCount, u32 receiverCount)
+        : bench(geometry),
+          giver(bench.Node(UsedLeaf(geometry.nodeSize, giverCount, 3), 12)),
+          receiver(bench.Node(UsedLeaf(geometry.nodeSize, receiverCount, 5), 11)) {}
+
+    void ExpectEqual(const Pair& other) const {
+        EXPECT_EQ(giver->Content(), other.giver->Content());
+        EXPECT_EQ(receiver->Content(), other.receiver->Content());
+        EXPECT_EQ(DirtyBlocks(*giver), DirtyBlocks(*other.giver));
+        EXPECT_EQ(DirtyBlocks(*receiver), DirtyBlocks(*other.receiver));
+    }
+
+    NodeBench bench;
+    std::unique_ptr<LooseNode> giver;
+    std::unique_ptr<LooseNode> receiver;
+};
+
+class MoveRecords : public GeometryTest {
+protected:
+    static constexpr u32 kGiven = 7;  // records of the giver; fit the smallest node
+
+    // Moves `count` records both ways of moving them, to either side.
+    static void Compare(u32 count, u32 receiverCount, bool toTheLeft) {
+        Pair atOnce(GetParam(), kGiven, receiverCount);
+        Pair oneByOne(GetParam(), kGiven, receiverCount);
+        EXPECT_EQ(toTheLeft ? MoveRecordsLeft(&atOnce.bench.tree, atOnce.receiver->Get(),
+                                              atOnce.giver->Get(), count)
+                            : MoveRecordsRight(&atOnce.bench.tree, atOnce.receiver->Get(),
+                                               atOnce.giver->Get(), count),
+                  kOk);
+        for (u32 i = 0; i < count; ++i) {
+            CBTreeHfs& tree = oneByOne.bench.tree;
+            EXPECT_EQ(
+                toTheLeft
+                    ? tree._RotateRecordLeft(oneByOne.receiver->Get(), oneByOne.giver->Get())
+                    : tree._RotateRecordRight(oneByOne.receiver->Get(), oneByOne.giver->Get()),
+                kOk);
+        }
+        atOnce.ExpectEqual(oneByOne);
+    }
+};
+
+TEST_P(MoveRecords, LeaveTheBytesThatMovesOneByOneLeave) {
+    for (u32 count = 0; count <= kGiven; ++count) {
+        for (const u32 receiverCount : {0u, 1u, 3u}) {
+            Compare(count, receiverCount, true);
+            Compare(count, receiverCount, false);
+        }
+    }
+}
+
+// The third key claims to be longer than its record: the moves before it are done.
+TEST_P(MoveRecords, StopAtTheRecordThatCannotBeRead) {
+    for (const bool toTheLeft : {true, false}) {
+        Pair pair(GetParam(), kGiven, 1);
+        const u32 bad = toTheLeft ? 2 : kGiven - 3;
+        NodeKey record;
+        ASSERT_EQ((*pair.giver)->GetKey(&pair.bench.tree.header, static_cast<int>(bad), &record),
+                  kOk);
+        record.ptr[1] = 250;
+        const int status =
+            toTheLeft
+                ? MoveRecordsLeft(&pair.bench.tree, pair.receiver->Get(), pair.giver->Get(), 5)
+                : MoveRecordsRight(&pair.bench.tree, pair.receiver->Get(), pair.giver->Get(), 5);
+        EXPECT_EQ(status, kErrCorrupt);
+        EXPECT_EQ(GetBe16(pair.receiver->Content().data() + kDescNumRecords), 3u);
+        EXPECT_EQ(GetBe16(pair.giver->Content().data() + kDescNumRecords), kGiven - 2);
+        pair.bench.capture.Take();
+    }
+}
+
+TEST_P(MoveRecords, StopWhereTheReceiverIsFull) {
+    Pair pair(GetParam(), kGiven, 0);
+    const u32 room = GetParam().nodeSize - 14 - 2;
+    Bytes full = LeafOf(GetParam().nodeSize, {NthRecord(40, room - 2 - 100)});
+    pair.receiver = pair.bench.Node(full, 11);
+    EXPECT_EQ(MoveRecordsLeft(&pair.bench.tree, pair.receiver->Get(), pair.giver->Get(), kGiven),
+              kErrInvalid);
+    EXPECT_EQ(pair.bench.capture.Take().back(), Reported(kErrInvalid, 1623));
+}
+
+INSTANTIATE_GEOMETRIES(MoveRecords, ChangeGeometries);
+
+}  // namespace
+}  // namespace VELK::test
