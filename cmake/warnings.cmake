@@ -1,7 +1,12 @@
+# Whether a warning ends the build. Not where others build the project, with compilers and options
+# (a distribution's hardening) whose warnings nobody here has seen.
+option(TREEHFS_WARNINGS_END_BUILD "Treat warnings as errors" ${PROJECT_IS_TOP_LEVEL})
+
 # Options every target of the project is compiled with.
 add_library(treehfs_options INTERFACE)
 target_compile_options(treehfs_options INTERFACE
-  -Wall -Wextra -Wpedantic -Wshadow -Wconversion -Wsign-conversion -Werror)
+  -Wall -Wextra -Wpedantic -Wshadow -Wconversion -Wsign-conversion
+  $<$<BOOL:${TREEHFS_WARNINGS_END_BUILD}>:-Werror>)
 target_include_directories(treehfs_options INTERFACE ${PROJECT_SOURCE_DIR}/src)
 
 # What the engine and the platform code beneath it are compiled with besides.
