@@ -1,10 +1,15 @@
 #!/usr/bin/env bash
-# fresh.sh [COMMAND...]: runs ./dev COMMAND (run) in a new Debian 12 root that holds a shell and nothing
-# else, on a copy of what is committed. It answers what no working machine can: does the project
-# install all it needs by itself? Several commands are separated by commas: fresh.sh run , test.
+# fresh.sh [STEP...]: tries what is committed in a new Debian 12 root that holds a shell and nothing
+# else. It answers what no working machine can: does the project install all it needs by itself, and
+# do its packages name all they need?
 #
-# Wants root, debootstrap and a Debian mirror (MIRROR, or the one this system installs from). The
-# bare root is kept in build/fresh/base.tar and used again; FRESH_KEEP=1 keeps the used one.
+# A step is a command of ./dev, with its arguments: fresh.sh run "test cache". After the step
+# `package`, the packages are installed in another new root, and run there. Without steps: run, test,
+# package.
+#
+# Wants root, debootstrap and a Debian mirror (MIRROR, or the one this system installs from). What
+# apt is told here about proxies and dates it is told there. The bare root is kept in
+# build/fresh/base.tar and used again; FRESH_KEEP=1 keeps the used one.
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 project=$PWD
@@ -33,17 +38,32 @@ mirror() {
         awk -v suite="$suite" '$2 == suite { print $1; exit }'
 }
 
+# How this system reaches its mirror: proxies, retries, the dates it insists on.
+apt_settings() {
+    apt-config dump Acquire | grep -E '^Acquire::(https?|ftp|Retries|Check|ForceIPv)[:-]' || true
+}
+
 make_base() {
-    local from
+    local from proxy
     from=$(mirror)
     [ -n "$from" ] || die "this system installs from no $suite mirror: name one in MIRROR"
     say "making a bare $suite root (kept in build/fresh/base.tar)"
     rm -rf --one-file-system "$root"
     mkdir -p "$root"
-    debootstrap --variant=minbase "$suite" "$root" "$from" >"$work/debootstrap.log" 2>&1 ||
+    proxy=$(apt-config dump Acquire::http::Proxy | sed -n 's/^Acquire::http::Proxy "\(.*\)";/\1/p')
+    ${proxy:+env "http_proxy=$proxy"} \
+        debootstrap --variant=minbase "$suite" "$root" "$from" >"$work/debootstrap.log" 2>&1 ||
         die "debootstrap failed: see build/fresh/debootstrap.log"
     tar -C "$root" -cf "$base.part" .
     mv "$base.part" "$base"
+}
+
+new_root() {
+    rm -rf --one-file-system "$root"
+    mkdir -p "$root"
+    tar -C "$root" -xf "$base"
+    cp /etc/resolv.conf "$root/etc/resolv.conf"
+    apt_settings >"$root/etc/apt/apt.conf.d/90machine"
 }
 
 # The command runs in mount and process namespaces of its own: what it mounts or leaves running
@@ -51,41 +71,48 @@ make_base() {
 inside() {
     # shellcheck disable=SC2016  # expanded by the inner shell
     unshare --mount --pid --fork bash -c '
-        mount -t proc proc "$1/proc" && mount --rbind /dev "$1/dev" && shift_root=$1 && shift &&
-        exec chroot "$shift_root" /usr/bin/env -i HOME=/srv LANG=C.UTF-8 \
+        mount -t proc proc "$1/proc" && mount --rbind /dev "$1/dev" && root=$1 && shift &&
+        exec chroot "$root" /usr/bin/env -i HOME=/srv LANG=C.UTF-8 \
             PATH=/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin \
-            bash -c "cd /srv/treehfs && exec \"\$@\"" bash "$@"' fresh "$root" "$@"
+            bash -c "cd /srv/treehfs && exec \"\$@\"" bash "$@"' fresh "$root" "$@" </dev/null
+}
+
+timed() {
+    local started=$SECONDS status=0
+    say "fresh root: $*"
+    inside "$@" || status=$?
+    say "fresh root: $* ended with $status after $((SECONDS - started)) s"
+    return "$status"
+}
+
+# Runs what a user of the packages would, in a root that was not there when they were built.
+try_packages() {
+    say "another bare root, for the packages"
+    rm -rf "$work/packages"
+    mkdir -p "$work/packages"
+    cp "$root"/srv/treehfs/build/package/*.deb "$work/packages/"
+    new_root
+    mkdir -p "$root/srv/treehfs"
+    cp "$work"/packages/*.deb tools/try_packages.sh "$root/srv/treehfs/"
+    timed ./try_packages.sh
+}
+
+clear_up() {
+    [ -n "${FRESH_KEEP:-}" ] || rm -rf --one-file-system "$root"
 }
 
 mkdir -p "$work"
+trap clear_up EXIT
 [ -f "$base" ] || make_base
 say "unpacking the bare root and a copy of the last commit"
-rm -rf --one-file-system "$root"
-mkdir -p "$root"
-tar -C "$root" -xf "$base"
-cp /etc/resolv.conf "$root/etc/resolv.conf"
+new_root
 git clone -q --no-local "$project" "$root/srv/treehfs"
 rm -rf "$root/srv/treehfs/.git"
 
-separator=,
-status=0
-try() {
-    local started=$SECONDS
-    say "fresh root: ./dev $*"
-    inside ./dev "$@" </dev/null || status=$?
-    say "fresh root: ./dev $* ended with $status after $((SECONDS - started)) s"
-}
-
-[ $# -gt 0 ] || set -- run
-command=()
-for word in "$@" "$separator"; do
-    if [ "$word" != "$separator" ]; then
-        command+=("$word")
-        continue
-    fi
-    [ ${#command[@]} -eq 0 ] || try "${command[@]}"
-    command=()
-    [ "$status" -eq 0 ] || break
+[ $# -gt 0 ] || set -- run test package
+for step in "$@"; do
+    read -ra words <<<"$step"
+    timed ./dev "${words[@]}"
+    [ "${words[0]}" != package ] || try_packages
 done
-[ -n "${FRESH_KEEP:-}" ] || rm -rf --one-file-system "$root"
-exit "$status"
+say "all that was asked works in a bare root: $*"
