@@ -1,5 +1,5 @@
-# Whether a warning ends the build. Not where others build the project, with compilers and options
-# (a distribution's hardening) whose warnings nobody here has seen.
+# Whether a warning ends the build. Not where others build the project: their compilers and options
+# (a distribution's hardening, -O3) bring warnings that nobody here has seen.
 option(TREEHFS_WARNINGS_END_BUILD "Treat warnings as errors" ${PROJECT_IS_TOP_LEVEL})
 
 # Options every target of the project is compiled with.

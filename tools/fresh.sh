@@ -4,8 +4,8 @@
 # do its packages name all they need?
 #
 # A step is a command of ./dev, with its arguments: fresh.sh run "test cache". After the step
-# `package`, the packages are installed in another new root, and run there. Without steps: run, test,
-# package.
+# `package`, the packages are installed in another new root, and run there; the step `installed`
+# does so with those that ./dev package has made here. Without steps: run, test, package.
 #
 # Wants root, debootstrap and a Debian mirror (MIRROR, or the one this system installs from). What
 # apt is told here about proxies and dates it is told there. The bare root is kept in
@@ -77,20 +77,25 @@ inside() {
             bash -c "cd /srv/treehfs && exec \"\$@\"" bash "$@"' fresh "$root" "$@" </dev/null
 }
 
+# Says how long a step took, and how long processors were at it: on a machine that has other work
+# the second figure is the one to go by.
 timed() {
-    local started=$SECONDS status=0
+    local status=0
+    local TIMEFORMAT="== fresh root: $* took %0R s, %0U + %0S s of processors' time"
     say "fresh root: $*"
-    inside "$@" || status=$?
-    say "fresh root: $* ended with $status after $((SECONDS - started)) s"
+    time inside "$@" || status=$?
+    [ "$status" -eq 0 ] || say "fresh root: $* ended with $status"
     return "$status"
 }
 
 # Runs what a user of the packages would, in a root that was not there when they were built.
 try_packages() {
+    local made=$1/build/package
+    [ -n "$(find "$made" -name '*.deb' 2>/dev/null)" ] || die "no packages: ./dev package makes them"
     say "another bare root, for the packages"
     rm -rf "$work/packages"
     mkdir -p "$work/packages"
-    cp "$root"/srv/treehfs/build/package/*.deb "$work/packages/"
+    cp "$made"/*.deb "$work/packages/"
     new_root
     mkdir -p "$root/srv/treehfs"
     cp "$work"/packages/*.deb tools/try_packages.sh "$root/srv/treehfs/"
@@ -112,7 +117,11 @@ rm -rf "$root/srv/treehfs/.git"
 [ $# -gt 0 ] || set -- run test package
 for step in "$@"; do
     read -ra words <<<"$step"
+    if [ "$step" = installed ]; then
+        try_packages "$project"
+        continue
+    fi
     timed ./dev "${words[@]}"
-    [ "${words[0]}" != package ] || try_packages
+    [ "${words[0]}" != package ] || try_packages "$root/srv/treehfs"
 done
 say "all that was asked works in a bare root: $*"

@@ -4,7 +4,7 @@
 # development package brings.
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
-export DEBIAN_FRONTEND=noninteractive
+export DEBIAN_FRONTEND=noninteractive DEBCONF_NOWARNINGS=yes
 
 say() { printf '== %s\n' "$*"; }
 apt() { apt-get -qq "$@" --no-install-recommends -y </dev/null >/dev/null; }
@@ -36,4 +36,5 @@ gcc /tmp/version.c -o /tmp/version $(pkg-config --cflags --libs treehfs)
 
 say "removing them"
 apt purge treehfs libtreehfs-dev libtreehfs0
-! command -v treehfs >/dev/null
+[ ! -e /usr/bin/treehfs ] && [ ! -e /usr/include/treehfs ]
+say "the packages install, run and go away"
