@@ -6,6 +6,7 @@
 
 #include "hfs/records/key_text.h"
 #include "hfs/treehfs/bytes.h"
+#include "hfs/volume/journal_format.h"
 #include "tool/errors.h"
 #include "tool/node_reader.h"
 #include "tool/tree_survey.h"
@@ -14,7 +15,6 @@ namespace VELK::tool {
 
 namespace {
 
-constexpr u32 kSector = 512;  // the journal's blocks begin at multiples of it
 constexpr u64 kJournalWindow = u64{1} << 20;
 constexpr u32 kMostRecord = 1u << 16;
 
@@ -71,7 +71,7 @@ void OutsideScan::Node(u32 number, bool isReached, bool isFree) {
     const u8* bytes = bytes_.data();
     if (!isReached && IsLeafImage(bytes, nodeSize)) {
         LeafRecords(isFree ? OutsidePlace::kFreed : OutsidePlace::kStranded, number, bytes,
-                    *offset);
+                    [&](u32 at) { return *offset + at; });
     }
     const bool hasTable = isReached || IsLeafImage(bytes, nodeSize);
     const u32 from = hasTable ? GapStart(bytes, nodeSize) : kDescSize;
@@ -84,7 +84,8 @@ void OutsideScan::Node(u32 number, bool isReached, bool isFree) {
     });
 }
 
-void OutsideScan::LeafRecords(OutsidePlace place, s64 node, const u8* bytes, u64 offset) {
+void OutsideScan::LeafRecords(OutsidePlace place, s64 node, const u8* bytes,
+                              const std::function<u64(u32 at)>& imageOffset) {
     const u32 nodeSize = tree_->header.nodeSize;
     const u32 count = GetBe16(bytes + kDescNumRecords);
     CarvedRecord record;
@@ -92,7 +93,7 @@ void OutsideScan::LeafRecords(OutsidePlace place, s64 node, const u8* bytes, u64
         const u32 at = GetBe16(bytes + nodeSize - 2 * (i + 1));
         const u32 end = GetBe16(bytes + nodeSize - 2 * (i + 2));
         if (CarveRecord(fileId_, bytes + at, end - at, &record)) {
-            Found(place, node, offset + at, record);
+            Found(place, node, imageOffset(at), record);
         }
     }
 }
@@ -116,6 +117,24 @@ void OutsideScan::Found(OutsidePlace place, s64 node, u64 offset, const CarvedRe
     visit_({place, StateOf(record), node, offset, record});
 }
 
+// Where the ring begins behind the journal's header. A journal that was announced and never written
+// has none; its ring will begin behind one sector.
+u32 OutsideScan::RingStart(u64 journalStart, u64 journalSize) {
+    u8 sector[kJournalSector];
+    ReadJournal(journalStart, sector, sizeof sector);
+    JournalHeader header;
+    return DecodeJournalHeader(sector, journalSize, &header).empty() ? header.sectorSize
+                                                                     : kJournalSector;
+}
+
+void OutsideScan::ReadJournal(u64 volumeOffset, u8* target, u64 bytes) {
+    if (session_->Volume().ReadVolume(volumeOffset, target, bytes) != kOk) {
+        ThrowProblem(session_->Image(), session_->Volume().LastIoProblem());
+    }
+}
+
+// The journal is a ring: a node that runs over its end goes on at its start, so what is read of the
+// end is followed by as much of the start as a node can need.
 void OutsideScan::ScanJournal() {
     const JournalState& journal = session_->Volume().Journal();
     if (!journal.present || !journal.readable) {
@@ -123,19 +142,23 @@ void OutsideScan::ScanJournal() {
     }
     const u32 nodeSize = tree_->header.nodeSize;
     const u64 start = journal.offset - session_->Volume().Place().offset;
-    Progress progress(call_, std::string("scan journal ") + ForkName(fileId_), "B", journal.size,
-                      1);
+    const u32 ringStart = RingStart(start, journal.size);
+    const u64 ring = journal.size - ringStart;
+    Progress progress(call_, std::string("scan journal ") + ForkName(fileId_), "B", ring, 1);
     std::vector<u8> window(kJournalWindow + nodeSize);
-    for (u64 base = 0; base < journal.size; base += kJournalWindow) {
-        const u64 bytes = std::min<u64>(window.size(), journal.size - base);
-        if (session_->Volume().ReadVolume(start + base, window.data(), bytes) != kOk) {
-            ThrowProblem(session_->Image(), session_->Volume().LastIoProblem());
+    for (u64 base = 0; base < ring && nodeSize <= ring; base += kJournalWindow) {
+        const u64 bytes = std::min<u64>(window.size(), ring - base);
+        ReadJournal(start + ringStart + base, window.data(), bytes);
+        if (bytes < window.size()) {
+            const u64 more = std::min<u64>(window.size() - bytes, nodeSize);
+            ReadJournal(start + ringStart, window.data() + bytes, more);
         }
-        for (u64 at = 0; at < kJournalWindow && at + nodeSize <= bytes; at += kSector) {
+        for (u64 at = 0; at < std::min(kJournalWindow, bytes); at += kJournalSector) {
             progress.Update(base + at);
             if (IsLeafImage(window.data() + at, nodeSize)) {
-                LeafRecords(OutsidePlace::kJournal, -1, window.data() + at,
-                            journal.offset + base + at);
+                LeafRecords(OutsidePlace::kJournal, -1, window.data() + at, [&](u32 inNode) {
+                    return journal.offset + ringStart + (base + at + inNode) % ring;
+                });
             }
         }
     }

@@ -44,7 +44,11 @@ public:
 
 private:
     void Node(u32 number, bool isReached, bool isFree);
-    void LeafRecords(OutsidePlace place, s64 node, const u8* bytes, u64 offset);
+    // `imageOffset`: of the byte at `at` of the leaf.
+    void LeafRecords(OutsidePlace place, s64 node, const u8* bytes,
+                     const std::function<u64(u32 at)>& imageOffset);
+    u32 RingStart(u64 journalStart, u64 journalSize);
+    void ReadJournal(u64 volumeOffset, u8* target, u64 bytes);
     void Found(OutsidePlace place, s64 node, u64 offset, const CarvedRecord& record);
     OutsideState StateOf(const CarvedRecord& record);
 

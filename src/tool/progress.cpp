@@ -2,6 +2,7 @@
 #include "tool/progress.h"
 
 #include <fmt/format.h>
+#include <sys/ioctl.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -33,6 +34,21 @@ void ReportEnd(int fd, const std::string& what, u64 done, u64 total) {
     if (fd >= 0 && done != 0) {
         Report(fd, what, done, total);
     }
+}
+
+std::string Bar(double part) {
+    constexpr std::size_t kBarWidth = 24;
+    std::string bar(static_cast<std::size_t>(part * static_cast<double>(kBarWidth)), '#');
+    bar.resize(kBarWidth, ' ');
+    return bar;
+}
+
+// Bytes a line may have: one that runs on in the next row could not be erased.
+std::size_t LineWidth() {
+    constexpr std::size_t kUsual = 80;
+    winsize size{};
+    const bool isKnown = ioctl(STDERR_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col != 0;
+    return (isKnown ? size.ws_col : kUsual) - 1;
 }
 
 void OnInterrupt(int) {
@@ -102,14 +118,17 @@ void Progress::Look() {
     }
 }
 
+// Without a total (it is not known before the walk) only what was done is said.
 void Progress::Draw(double seconds) {
-    constexpr std::size_t kBarWidth = 24;
+    std::string line = what_;
     const double part =
         total_ == 0 ? 0.0 : std::min(1.0, static_cast<double>(done_) / static_cast<double>(total_));
-    std::string bar(static_cast<std::size_t>(part * static_cast<double>(kBarWidth)), '#');
-    bar.resize(kBarWidth, ' ');
-    std::string line = fmt::format("\r{} {:3.0f}% [{}]  {}/{} {}", what_, part * 100.0, bar,
-                                   Grouped(done_), Grouped(total_), unit_);
+    if (total_ == 0) {
+        line += fmt::format("  {} {}", Grouped(done_), unit_);
+    } else {
+        line += fmt::format(" {:3.0f}% [{}]  {}/{} {}", part * 100.0, Bar(part), Grouped(done_),
+                            Grouped(total_), unit_);
+    }
     if (unitBytes_ != 0) {
         const double rate = static_cast<double>(done_) * unitBytes_ / seconds;
         line += fmt::format("  {}/s", ShortBytes(static_cast<u64>(rate)));
@@ -118,7 +137,8 @@ void Progress::Draw(double seconds) {
         const u64 left = static_cast<u64>(seconds / part - seconds + 0.5);
         line += fmt::format("  {}:{:02} left", left / 60, left % 60);
     }
-    line += "\x1b[K";
+    line.resize(std::min(line.size(), LineWidth()));
+    line = "\r" + line + "\x1b[K";
     std::fwrite(line.data(), 1, line.size(), stderr);
     drawn_ = true;
 }

@@ -1,10 +1,14 @@
 """What a terminal and a program at the other end get: colours and progress, and none of either in
 files and pipes."""
 
+import fcntl
 import os
 import pty
 import re
+import struct
 import subprocess
+import termios
+import time
 
 import harness
 import volume_bytes as vb
@@ -64,4 +68,54 @@ checks.equal((done.returncode, done.stderr), (0, b""), "dump with --progress-fd"
 checks.check(len(lines) >= 1 and all(re.fullmatch(r"dump\.catalog \d+ 12", line)
                                      for line in lines), "lines for a program: %s" % lines)
 checks.equal(lines[-1:], ["dump.catalog 12 12"], "the last line says that all is done")
+
+# The program stops at a full pipe for over a second; then it has been long enough at work to draw.
+code, out, err = harness.text(
+    "apply", "--new", "4M", "-q", "--save", "many.img", "-", cwd=folder,
+    stdin=b"repeat 3000\ninsert 2:number-$i file{id:100}\nend\n")
+checks.equal((code, err), (0, ""), "a volume of many names")
+
+
+def drawn(*arguments, columns=100):
+    """What is drawn on a terminal of so many columns while standard output is a pipe."""
+    main, other = pty.openpty()
+    fcntl.ioctl(other, termios.TIOCSWINSZ, struct.pack("HHHH", 25, columns, 0, 0))
+    process = subprocess.Popen([harness.tool(), *arguments, "many.img"], cwd=folder,
+                               stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=other)
+    os.close(other)
+    out = process.stdout.read(1)
+    time.sleep(1.2)
+    out += process.stdout.read()
+    shown = b""
+    while True:
+        try:
+            piece = os.read(main, 65536)
+        except OSError:
+            break
+        if not piece:
+            break
+        shown += piece
+    os.close(main)
+    checks.equal(process.wait(), 0, " ".join(arguments))
+    checks.check(out.count(b"number-") >= 3000, "all is printed beside the drawing")
+    return shown.decode()
+
+
+shown = drawn("dump")
+match = re.fullmatch(r"(\rdump catalog +\d+% \[#* *\]  [\d,]+/3,002 records  \d:\d\d left\x1b\[K)+"
+                     r"\r\x1b\[K", shown)
+checks.check(match, "a bar is drawn and erased: %r" % shown)
+for part, bar, done in re.findall(r" +(\d+)% \[(#* *)\]  ([\d,]+)/", shown):
+    share = int(done.replace(",", "")) / 3002
+    checks.equal((int(part), len(bar), bar.count("#")),
+                 (round(share * 100), 24, int(share * 24)), "the bar shows its part")
+shown = drawn("dump", columns=30)
+checks.check(re.match(r"\rdump catalog +\d+% \[[# ]+\x1b\[K", shown) and
+             all(len(line.replace("\x1b[K", "")) <= 29 for line in shown.split("\r")),
+             "the line keeps to a narrow terminal: %r" % shown)
+checks.equal(drawn("dump", "--progress", "never"), "", "--progress never")
+checks.equal(drawn("dump", "-q"), "", "-q draws nothing")
+shown = drawn("ls", "-l")
+checks.check(re.match(r"\rls catalog  [\d,]+ records\x1b\[K", shown),
+             "what has no total shows what was done: %r" % shown)
 checks.finish()
