@@ -96,7 +96,7 @@ checks.check("catalog node 2: corrupt" in err and "passed over" in err, "blank l
 
 # --- names -----------------------------------------------------------------------------------
 nasty = ["a\x1b[31mred", "back\\slash", "bell\x07", "bidi\u202e", "colon/slash", "cr\r", "lf\n",
-         "lone\ud800", "\0nul"]
+         "lone\ud800", "\0nul", "true:colon", "sign\u2400"]
 records = sorted(nasty, key=lambda name: [0xFFFF if u == "\0" else ord(u) for u in name.lower()])
 listed = [vb.folder(1, "Vol", 2, len(nasty)), vb.thread(2, 1, "Vol")]
 listed += [vb.file(2, name, 16 + i) for i, name in enumerate(records)]
@@ -105,7 +105,8 @@ code, out, err = harness.text("ls", image)
 checks.equal(code, 0, "nasty names: " + err)
 checks.equal(sorted(out.splitlines()),
              sorted(["a\\x1b[31mred", "back\\\\slash", "bell\\x07", "bidi\\u202e", "colon:slash",
-                     "cr\\x0d", "lf\\x0a", "lone\\ud800", "\u2400nul"]), "nasty names")
+                     "cr\\x0d", "lf\\x0a", "lone\\ud800", "\u2400nul", "true\\x3acolon",
+                     "sign\\u2400"]), "nasty names")
 for line in out.splitlines():
     code, again, err = harness.text("ls", image, "/" + line)
     checks.equal((code, again), (0, line + "\n"), "a printed name is understood")

@@ -8,6 +8,7 @@ namespace VELK {
 namespace {
 
 constexpr char kHexDigits[] = "0123456789abcdef";
+constexpr u32 kVisibleNul = 0x2400;
 
 bool IsHigh(u32 unit) {
     return unit >= 0xD800 && unit < 0xDC00;
@@ -71,15 +72,6 @@ char* PutEscaped(char* out, u32 point) {
     return PutUnitEscape(out, point);
 }
 
-char* PutTextPoint(char* out, u32 point) {
-    if (point == '\\') {
-        *out++ = '\\';
-        *out++ = '\\';
-        return out;
-    }
-    return IsUnfitForTerminal(point) ? PutEscaped(out, point) : PutUtf8(out, point);
-}
-
 char* PutJsonPoint(char* out, u32 point) {
     if (point == '"' || point == '\\') {
         *out++ = '\\';
@@ -97,10 +89,22 @@ u32 Exchange(u32 unit) {
         case ':':
             return '/';
         case 0:
-            return 0x2400;
+            return kVisibleNul;
         default:
             return unit;
     }
+}
+
+// A stored colon would read as the separator, and U+2400 as NUL: these are escaped.
+char* PutTextPoint(char* out, u32 stored) {
+    if (stored == '\\') {
+        *out++ = '\\';
+        *out++ = '\\';
+        return out;
+    }
+    const u32 shown = Exchange(stored);
+    const bool misleads = stored == ':' || stored == kVisibleNul;
+    return misleads || IsUnfitForTerminal(shown) ? PutEscaped(out, stored) : PutUtf8(out, shown);
 }
 
 // The code point at `*index` of the big-endian units; a lone surrogate stands for itself.
@@ -195,16 +199,16 @@ char* PutName(char* out, const u8* unitsBe, u32 count, NameForm form) {
             index += 1;
             continue;
         }
-        const u32 point = Exchange(TakePoint(unitsBe, count, &index));
+        const u32 stored = TakePoint(unitsBe, count, &index);
         switch (form) {
             case NameForm::kText:
-                out = PutTextPoint(out, point);
+                out = PutTextPoint(out, stored);
                 break;
             case NameForm::kRaw:
-                out = PutUtf8(out, point);
+                out = PutUtf8(out, Exchange(stored));
                 break;
             case NameForm::kJson:
-                out = PutJsonPoint(out, point);
+                out = PutJsonPoint(out, Exchange(stored));
                 break;
         }
     }
@@ -264,7 +268,7 @@ std::u16string UnitsFromPath(std::string_view component) {
             continue;
         }
         const u32 point = TakeUtf8(component, &index);
-        AppendUnits(&units, point == 0x2400 ? 0 : point == ':' ? '/' : point);
+        AppendUnits(&units, point == kVisibleNul ? 0 : point == ':' ? '/' : point);
     }
     return units;
 }

@@ -1,7 +1,8 @@
 // Names on their way to a person or a program. On disk a name is UTF-16; `/` is an ordinary
-// character there and `:` is not used, so the two change places in a path, and NUL is shown as
-// U+2400. Whatever could move a terminal's cursor or reorder a line is written as \xNN or \uNNNN,
-// and a backslash as two, so every printed path can be given back as an argument.
+// character there and `:` is hardly used, so the two change places in a path, and NUL is shown as
+// U+2400. What is `:` or U+2400 on disk, and whatever could move a terminal's cursor or reorder a
+// line, is written as \xNN or \uNNNN, and a backslash as two, so every printed path can be given
+// back as an argument.
 #pragma once
 
 #include <string>

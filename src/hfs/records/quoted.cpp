@@ -104,6 +104,11 @@ std::string QuotedUnits(NameView units, Typed typed, Blanks blanks) {
     for (const char16_t unit : units) {
         isAscii = isAscii && unit < 0x80;
     }
+    // A script would take $i, $j and $k for the number of a repetition.
+    const auto isCounter = [&](std::size_t at) {
+        return units[at] == '$' && at + 1 < units.size() && units[at + 1] >= 'i' &&
+               units[at + 1] <= 'k';
+    };
     // Read back, text is decomposed once more; where that would change it, escapes say it all.
     const bool isPlain = isAscii || typed == Typed::kAsIs || DecomposedUnits(units) == units;
     std::string text = "\"";
@@ -117,7 +122,7 @@ std::string QuotedUnits(NameView units, Typed typed, Blanks blanks) {
             text.push_back('\\');
             text.push_back(static_cast<char>(unit));
         } else if (IsUnfit(unit) || (unit >= 0x80 && !isPlain) ||
-                   (unit == ' ' && blanks == Blanks::kEscaped)) {
+                   (unit == ' ' && blanks == Blanks::kEscaped) || isCounter(i)) {
             AppendEscape(unit, &text);
         } else if (unit < 0x80) {
             text.push_back(static_cast<char>(unit));
