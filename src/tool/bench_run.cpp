@@ -42,6 +42,11 @@ BenchTime Timed(u64 count, Each each) {
     return {count, std::chrono::duration<double>(Clock::now() - start).count()};
 }
 
+int Find(CBTreeHfs* tree, const SearchKey& key, std::vector<u8>* record) {
+    unsigned size = 0;
+    return tree->FindRecord(key.Key(), key.id, record->data(), kMostRecord - 1, &size, nullptr);
+}
+
 BenchTime WalkAll(CBTreeHfs* tree, std::vector<u8>* record) {
     HfsFindData path;
     const SearchKey least = CatalogSearchKey(0, u"");
@@ -131,22 +136,14 @@ BenchTime BenchTree::Insert() {
 BenchTime BenchTree::FindHit() {
     CBTreeHfs* tree = Tree();
     std::vector<u8> record(kMostRecord);
-    return Timed(records_, [&](u64 i) {
-        unsigned size = 0;
-        const SearchKey key = KeyOf(Pick(i), true);
-        Must(tree->FindRecord(key.Key(), key.id, record.data(), kMostRecord - 1, &size, nullptr),
-             "find");
-    });
+    return Timed(records_, [&](u64 i) { Must(Find(tree, KeyOf(Pick(i), true), &record), "find"); });
 }
 
 BenchTime BenchTree::FindMiss() {
     CBTreeHfs* tree = Tree();
     std::vector<u8> record(kMostRecord);
     return Timed(records_, [&](u64 i) {
-        unsigned size = 0;
-        const SearchKey key = KeyOf(Pick(i), false);
-        const int status =
-            tree->FindRecord(key.Key(), key.id, record.data(), kMostRecord - 1, &size, nullptr);
+        const int status = Find(tree, KeyOf(Pick(i), false), &record);
         Must(status == kErrNotFound ? kOk : kErrInvalid, "find absent");
     });
 }
@@ -160,10 +157,7 @@ BenchTime BenchTree::Update() {
     CBTreeHfs* tree = Tree();
     std::vector<u8> record(kMostRecord);
     return Timed(records_, [&](u64 i) {
-        unsigned size = 0;
-        const SearchKey key = KeyOf(Pick(i), true);
-        Must(tree->FindRecord(key.Key(), key.id, record.data(), kMostRecord - 1, &size, nullptr),
-             "find");
+        Must(Find(tree, KeyOf(Pick(i), true), &record), "find");
         Must(tree->UpdateKeyAndRecord(nullptr, record.data()), "update");
     });
 }
@@ -199,12 +193,7 @@ BenchReader::BenchReader(CBTreeHfs* tree, std::vector<SearchKey> keys, u64 seed)
 }
 
 BenchTime BenchReader::FindHit() {
-    return Timed(keys_.size(), [&](u64 i) {
-        unsigned size = 0;
-        Must(tree_->FindRecord(keys_[i].Key(), keys_[i].id, record_.data(), kMostRecord - 1, &size,
-                               nullptr),
-             "find");
-    });
+    return Timed(keys_.size(), [&](u64 i) { Must(Find(tree_, keys_[i], &record_), "find"); });
 }
 
 BenchTime BenchReader::Iterate() {

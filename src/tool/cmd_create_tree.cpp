@@ -16,12 +16,12 @@ int RunCreateTree(Invocation* call) {
     std::optional<u64> nodeSize;
     std::optional<u64> size;
     call->options.Argument("IMAGE", &call->image, "disk image");
-    call->DeclareTrees(TreeDefault::kCatalog);
+    call->DeclareTrees(TreeDefault::kAttributes);
     target.DeclareForImage(call);
     call->options.Size("--node-size", &nodeSize, "BYTES", "512 to 32768 (8192)");
     call->options.Size("--tree-size", &size, "BYTES", "first size of the file (one clump)");
     call->Parse();
-    const u32 fileId = call->treesGiven ? call->trees.front() : kAttributesFileId;
+    const u32 fileId = call->trees.front();
     const u32 nodeShift = NodeShiftOf(nodeSize.value_or(kDefaultNodeSize));
     const std::unique_ptr<ImageVolume> volume = OpenTarget(*call, target);
     const u64 before = volume->HandedOverBlocks();

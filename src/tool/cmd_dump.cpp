@@ -67,11 +67,7 @@ void DumpByKey(Session* session, Invocation* call, const RecordFilter& filter, D
     const CBTreeHfs* tree = session->Tree(fileId);
     const KeyRange range = RangeArgument(session, fileId, call->range);
     LeafCursor cursor(session, fileId, call->keepGoing);
-    if (range.from) {
-        cursor.Seek(*range.from, nullptr);
-    } else {
-        cursor.SeekFirst();
-    }
+    cursor.SeekFrom(range.from);
     Window window(*call);
     LeafRecord record;
     u64 done = 0;

@@ -3,6 +3,7 @@
 #include "hfs/records/record_json.h"
 #include "hfs/volume/volume_header.h"
 #include "tool/errors.h"
+#include "tool/key_argument.h"
 #include "tool/leaf_cursor.h"
 #include "tool/progress.h"
 #include "tool/record_digest.h"
@@ -43,6 +44,7 @@ int Run(Invocation* call) {
     RecordJsonOptions options;
     call->DeclareImage();
     call->DeclareTrees(TreeDefault::kCatalog);
+    call->DeclareRange();
     call->DeclareLimits();
     call->DeclareKeepGoing();
     call->DeclareOutputFile();
@@ -54,16 +56,22 @@ int Run(Invocation* call) {
     Session session(*call, Session::Truncated::kReadOn);
     const CBTreeHfs* tree = session.Tree(fileId);
     call->out.Write(HeaderLine(fileId, *tree));
+    const KeyRange range = RangeArgument(&session, fileId, call->range);
     LeafCursor cursor(&session, fileId, call->keepGoing);
-    cursor.SeekFirst();
+    cursor.SeekFrom(range.from);
     Progress progress(*call, std::string("export ") + ForkName(fileId), "records",
                       tree->header.leafRecords, 0);
     RecordDigest digest;
     LeafRecord record;
     std::string line;
-    for (u64 seen = 0; digest.Records() < call->limit && cursor.Next(&record); ++seen) {
+    u64 inRange = 0;
+    for (u64 seen = 1; digest.Records() < call->limit && cursor.Next(&record); ++seen) {
         progress.Update(seen);
-        if (seen < call->skipRecords) {
+        const int place = range.Place(*tree, record.key);
+        if (place > 0) {
+            break;
+        }
+        if (place < 0 || inRange++ < call->skipRecords) {
             continue;
         }
         line.clear();

@@ -165,10 +165,7 @@ int PrintDigests(Session* session, Invocation* call) {
     JsonWriter json(&text);
     json.BeginObject();
     json.Member("schema", "treehfs.info.digest/1");
-    for (const u32 fileId : call->trees) {
-        if (!call->treesGiven && !session->Volume().HasTree(fileId)) {
-            continue;
-        }
+    for (const u32 fileId : session->ChosenTrees(*call)) {
         RecordDigest digest;
         LeafCursor cursor(session, fileId, false);
         Progress progress(*call, std::string("info ") + ForkName(fileId), "records",

@@ -93,6 +93,9 @@ u64 ScanTree(Session* session, Invocation* call, const ScanOptions& options, u32
         scan.ScanNodes();
     }
     scan.ScanJournal();
+    if (!call->json && options.limit && printed > *options.limit) {
+        call->out.Write("... the others are only counted (--limit)\n");
+    }
     Summary(call, fileId, counts);
     return counts.All();
 }
@@ -119,10 +122,8 @@ int RunScan(Invocation* call) {
         call->out.Write("{\"schema\":\"treehfs.scan/1\"}\n");
     }
     u64 found = 0;
-    for (const u32 fileId : call->trees) {
-        if (call->treesGiven || session.Volume().HasTree(fileId)) {
-            found += ScanTree(&session, call, options, fileId);
-        }
+    for (const u32 fileId : session.ChosenTrees(*call)) {
+        found += ScanTree(&session, call, options, fileId);
     }
     if (session.PassedOver() != 0) {
         return kExitFailed;

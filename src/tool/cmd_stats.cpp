@@ -21,10 +21,7 @@ int RunStats(Invocation* call) {
     json.Key("trees");
     json.BeginArray();
     bool first = true;
-    for (const u32 fileId : call->trees) {
-        if (!call->treesGiven && !session.Volume().HasTree(fileId)) {
-            continue;
-        }
+    for (const u32 fileId : session.ChosenTrees(*call)) {
         const CBTreeHfs* tree = session.Tree(fileId);
         Progress progress(*call, std::string("stats ") + ForkName(fileId), "nodes",
                           tree->header.totalNodes, tree->header.nodeSize);

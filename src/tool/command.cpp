@@ -55,6 +55,8 @@ void Invocation::DeclareTrees(TreeDefault treeDefault) {
     options.List("-t,--tree", &treeNames_, "TREE",
                  treeDefault == TreeDefault::kAll
                      ? "catalog, extents or attributes (c e a), repeatable; default all"
+                 : treeDefault == TreeDefault::kAttributes
+                     ? "catalog, extents or attributes (c e a); default attributes"
                      : "catalog, extents or attributes (c e a); default catalog");
 }
 
@@ -105,7 +107,7 @@ void Invocation::ChooseTrees() {
             trees.push_back(id);
         }
     }
-    if (treeDefault_ == TreeDefault::kCatalog && trees.size() > 1) {
+    if (treeDefault_ != TreeDefault::kAll && trees.size() > 1) {
         ThrowUsage(command.name,
                    fmt::format("--tree is given twice, as '{}' and as '{}'", treeNames_.front(),
                                treeNames_.back()),
@@ -114,7 +116,8 @@ void Invocation::ChooseTrees() {
     if (!treesGiven) {
         trees = treeDefault_ == TreeDefault::kAll
                     ? std::vector<u32>{kCatalogFileId, kExtentsFileId, kAttributesFileId}
-                    : std::vector<u32>{kCatalogFileId};
+                : treeDefault_ == TreeDefault::kAttributes ? std::vector<u32>{kAttributesFileId}
+                                                           : std::vector<u32>{kCatalogFileId};
     }
 }
 
@@ -131,7 +134,6 @@ void Invocation::ChooseGeneral() {
     limit = limitNumber_.value_or(~u64{0});
     skipRecords = skipNumber_.value_or(0);
     color = WordIsOn(colorWord_, outputFile.empty() ? STDOUT_FILENO : -1);
-    errorColor = WordIsOn(colorWord_, STDERR_FILENO);
     showProgress = WordIsOn(progressWord_, STDERR_FILENO) && !quiet;
 }
 

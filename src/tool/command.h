@@ -32,8 +32,9 @@ const Command* FindCommand(const std::string& name);
 
 // How a command picks its trees.
 enum class TreeDefault {
-    kCatalog,  // one tree, the catalog unless told otherwise
-    kAll,      // any number, all of them unless told otherwise
+    kCatalog,     // one tree, the catalog unless told otherwise
+    kAttributes,  // one tree, the attributes unless told otherwise
+    kAll,         // any number, all of them unless told otherwise
 };
 
 // One call of a command: its options, and where its result goes.
@@ -79,7 +80,6 @@ public:
     bool verbose = false;
     bool trace = false;
     bool color = false;         // of standard output, decided
-    bool errorColor = false;    // of standard error, decided
     bool showProgress = false;  // decided
     int progressFd = -1;
 

@@ -9,6 +9,7 @@
 #include "hfs/records/record_fields.h"
 #include "hfs/records/record_text.h"
 #include "hfs/records/record_view.h"
+#include "hfs/records/text_format.h"
 #include "tool/hex_rows.h"
 
 namespace VELK::tool {
@@ -213,7 +214,7 @@ void DumpPrinter::FlushRows() {
     }
     widthsKnown_ = true;
     for (const Row& row : rows_) {
-        keyWidth_ = std::max(keyWidth_, std::min(kWidestKey, fmt::formatted_size("{}", row.key)));
+        keyWidth_ = std::max(keyWidth_, std::min(kWidestKey, ShownWidth(row.key)));
         typeWidth_ = std::max(typeWidth_, row.type.size());
         idWidth_ = std::max(idWidth_, row.id.size());
     }
@@ -225,8 +226,9 @@ void DumpPrinter::FlushRows() {
 }
 
 void DumpPrinter::PrintRow(const Row& row) {
-    std::string line = fmt::format("{:>4}  {:>3}  {:<{}}  {:<{}}  {:<{}}", row.node, row.record,
-                                   row.key, keyWidth_, row.type, typeWidth_, row.id, idWidth_);
+    std::string line =
+        fmt::format("{:>4}  {:>3}  {}  {:<{}}  {:<{}}", row.node, row.record,
+                    Padded(row.key, keyWidth_), row.type, typeWidth_, row.id, idWidth_);
     if (style_.values != DumpStyle::Values::kNone || row.type == "index") {
         line += "  " + row.rest;
     }

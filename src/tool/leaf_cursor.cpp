@@ -55,6 +55,14 @@ void LeafCursor::Damaged(u32 node, int status, const std::string& detail) {
     session_->NotePassedOver(problem);
 }
 
+void LeafCursor::SeekFrom(const std::optional<SearchKey>& from) {
+    if (from) {
+        Seek(*from, nullptr);
+    } else {
+        SeekFirst();
+    }
+}
+
 void LeafCursor::SeekFirst() {
     SearchKey least;
     if (fileId_ == kExtentsFileId) {

@@ -5,6 +5,7 @@
 // the walk with a message (and with it every ring of leaves); --keep-going passes it over.
 #pragma once
 
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -27,6 +28,8 @@ public:
     // Throws ToolError. `*found` (optional): the key is there.
     void SeekFirst();
     void Seek(const SearchKey& key, bool* found);
+    // The second where there is a key, else the first.
+    void SeekFrom(const std::optional<SearchKey>& from);
 
     // Delivers the next record; false at the end. Throws ToolError.
     bool Next(LeafRecord* record);

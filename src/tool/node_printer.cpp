@@ -105,14 +105,14 @@ std::vector<NodePrinter::Line> NodePrinter::RecordLines(const HeldNode& node, st
 void NodePrinter::PrintRecords(const std::vector<Line>& lines) {
     std::size_t keyWidth = 0;
     for (const Line& line : lines) {
-        keyWidth = std::max(keyWidth, std::min(line.key.size(), kWidestKey));
+        keyWidth = std::max(keyWidth, std::min(ShownWidth(line.key), kWidestKey));
     }
     const u32 indexWidth = DigitCount(lines.empty() ? 0 : lines.size() - 1);
     for (std::size_t i = 0; i < lines.size(); ++i) {
         const Line& line = lines[i];
-        out_->Print("{}  [{:>{}}]  key {:>2} B  {:<{}}  data {:>3} B   {}\n",
-                    OffsetName(line.offset), i, indexWidth, line.keySize, line.key, keyWidth,
-                    line.dataSize, line.what);
+        out_->Print("{}  [{:>{}}]  key {:>2} B  {}  data {:>3} B   {}\n", OffsetName(line.offset),
+                    i, indexWidth, line.keySize, Padded(line.key, keyWidth), line.dataSize,
+                    line.what);
         WriteHexRows(out_, line.bytes.data(), line.bytes.size(), line.offset, 2);
     }
 }

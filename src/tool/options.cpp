@@ -50,6 +50,29 @@ std::string ShownNames(const Entry& entry) {
     return entry.meta.empty() ? shown : shown + " " + entry.meta;
 }
 
+// The words of `text` in lines of a help text, of which all but the first begin with `indent`
+// blanks.
+std::string Filled(const std::string& text, std::size_t indent) {
+    constexpr std::size_t kWidth = 94;
+    std::string filled;
+    std::size_t column = indent;
+    for (std::size_t at = 0; at < text.size();) {
+        const std::size_t end = std::min(text.find_first_of(" \n", at), text.size());
+        const std::size_t size = end - at;
+        if (column + 1 + size > kWidth) {
+            filled += "\n" + std::string(indent, ' ');
+            column = indent;
+        } else if (!filled.empty()) {
+            filled.push_back(' ');
+            column += 1;
+        }
+        filled.append(text, at, size);
+        column += size;
+        at = end + 1;
+    }
+    return filled;
+}
+
 bool ParseWithUnits(const std::string& text, const char* units, const u64* factors, u64* value) {
     std::size_t used = 0;
     const bool hex = text.size() > 2 && text[0] == '0' && (text[1] == 'x' || text[1] == 'X');
@@ -332,8 +355,12 @@ void OptionSet::Impl::PrintEntries(const char* title, bool general, bool argumen
             continue;
         }
         std::string left = "  " + ShownNames(*entry);
-        left.resize(std::max(left.size() + 2, kColumn), ' ');
-        block += left + entry->help + "\n";
+        if (left.size() + 2 > kColumn) {
+            block += left + "\n";
+            left.clear();
+        }
+        left.resize(kColumn, ' ');
+        block += left + Filled(entry->help, kColumn) + "\n";
     }
     if (general && !argument) {
         block += fmt::format("{:<{}}this text\n", "  -h, --help", kColumn);
@@ -348,7 +375,7 @@ std::string OptionSet::Impl::Help() const {
         fmt::format("treehfs {} [options]{}{}\n{}\n", command.name,
                     command.arguments[0] != 0 ? " " : "", command.arguments, command.summary);
     if (command.details[0] != 0) {
-        text += fmt::format("\n{}\n", command.details);
+        text += fmt::format("\n{}\n", Filled(command.details, 0));
     }
     PrintEntries("Arguments", false, true, &text);
     PrintEntries("Options", false, false, &text);

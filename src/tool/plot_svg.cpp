@@ -116,21 +116,12 @@ std::string SvgPicture::Finish() {
 }
 
 std::string StyleOf(const NodeFacts& facts) {
-    switch (facts.state) {
-        case NodeState::kFree:
-            return "free";
-        case NodeState::kHeader:
-            return "header";
-        case NodeState::kMap:
-            return "map";
-        case NodeState::kIndex:
-            return fmt::format("index i{}", FillStep(facts.fillPermille));
-        case NodeState::kLeaf:
-            return fmt::format("leaf f{}", FillStep(facts.fillPermille));
-        case NodeState::kUnreadable:
-            break;
+    const std::string kind = KindWord(facts.state);
+    const bool isIndex = facts.state == NodeState::kIndex;
+    if (!isIndex && facts.state != NodeState::kLeaf) {
+        return kind;
     }
-    return "bad";
+    return fmt::format("{} {}{}", kind, isIndex ? 'i' : 'f', FillStep(facts.fillPermille));
 }
 
 std::string TooltipOf(u32 nodeNum, const NodeFacts& facts) {

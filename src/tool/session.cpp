@@ -81,6 +81,14 @@ Session::Session(const Invocation& call, const std::string& image, Truncated tru
     }
 }
 
+std::vector<u32> Session::ChosenTrees(const Invocation& call) const {
+    std::vector<u32> chosen = call.trees;
+    if (!call.treesGiven) {
+        std::erase_if(chosen, [&](u32 fileId) { return !volume_->HasTree(fileId); });
+    }
+    return chosen;
+}
+
 CBTreeHfs* Session::Tree(u32 fileId) {
     Problem problem;
     CBTreeHfs* tree = volume_->Tree(fileId, &problem);

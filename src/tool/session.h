@@ -4,6 +4,7 @@
 
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "hfs/volume/image_volume.h"
 #include "tool/command.h"
@@ -33,6 +34,8 @@ public:
     const VolumeScan& Scan() const { return scan_; }
     const std::string& Image() const { return image_; }
 
+    // Of the trees the call is about: those it names, present or not, or else those the volume has.
+    std::vector<u32> ChosenTrees(const Invocation& call) const;
     // The open tree; throws when it is absent or cannot be opened.
     CBTreeHfs* Tree(u32 fileId);
     // The same, with null instead of a throw.

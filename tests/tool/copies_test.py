@@ -251,6 +251,8 @@ checks.equal(out.splitlines()[-2:],
              ["catalog: 5 records outside the tree: 3 gone from it, 1 with other data, 1 the same;",
               "    2 in stranded leaves, 2 in freed nodes, 1 in gaps, 0 in the journal"],
              "scan: summary")
+out = ask("scan", "-t", "catalog", "--limit", "2", "scan.img").splitlines()
+checks.equal((len(out), out[2]), (5, "... the others are only counted (--limit)"), "scan --limit")
 out = ask("scan", "--deleted", "--json", "scan.img")
 lines = [json.loads(line) for line in out.splitlines()]
 checks.equal([line["id"] for line in lines if "id" in line], [78, 77], "deleted files")
@@ -262,6 +264,25 @@ ask("apply", "log.img", script("one.tr", ["insert 2:once file{id:50}", "flush",
 ask("apply", "log.img", script("two.tr", ["delete 2:once"]), "--write", "-q")
 out = ask("scan", "--journal", "--deleted", "log.img")
 checks.check('gone    2:"once"  file id 50' in out, "scan of the journal: " + out)
+
+
+# A leaf at the end of the journal's ring goes on at the ring's start; so do the places of records.
+ask("format", "ring.img", "--size", "4M", "--journal", "256K", "--node-size", "1024")
+ring = bytearray((folder / "ring.img").read_bytes())
+journal = ring.index(b"JNLx")                                        # the sector before the ring
+end = journal + 256 * 1024
+lost = [vb.file(2, name, 51 + i) for i, name in enumerate(("before", "middle", "onwards"))]
+leaf = vb.node(-1, 1, lost, size=1024)
+ring[end - 512:end], ring[journal + 512:journal + 1024] = leaf[:512], leaf[512:]
+(folder / "ring.img").write_bytes(ring)
+rows = [line.split(None, 4) for line in ask("scan", "--journal", "-t", "c",
+                                            "ring.img").splitlines()[:-2]]
+starts = [14, 14 + len(lost[0]), 14 + len(lost[0]) + len(lost[1])]
+places = [end - 512 + starts[0], end - 512 + starts[1], journal + starts[2]]
+checks.equal([(row[2], row[4]) for row in rows],
+             [(hex(place), '2:"%s"  file id %d, size 0' % (name, 51 + i))
+              for i, (name, place) in enumerate(zip(("before", "middle", "onwards"), places))],
+             "scan around the end of the journal")
 
 # --- format --wrap -----------------------------------------------------------------------------
 for scheme, partition in (("apm", 2), ("gpt", 1)):

@@ -34,9 +34,9 @@ def help_section(shown, title):
 
 
 def options_of_help(lines):
-    """(names, meta) of each option."""
-    return [re.match(r"^  ((?:-\w, |    )--[\w-]+(?: \S+)?)  +", line).group(1).strip()
-            for line in lines]
+    """(names, meta) of each option; what goes on below its names is deeper than any of them."""
+    return [re.match(r"^  ((?:-\w, |    )--[\w-]+(?: \S+)?)(?:  +|$)", line).group(1).strip()
+            for line in lines if not line.startswith(" " * 30)]
 
 
 def options_of_page(text):
@@ -63,7 +63,7 @@ for name, summary in commands.items():
                 for line in plain(section(text, "SYNOPSIS")).strip().splitlines()]
     checks.equal(", ".join(synopsis), usage, what + "synopsis")
     arguments = [re.match(r"^  (.*?)  +", line).group(1)
-                 for line in help_section(shown, "Arguments")]
+                 for line in help_section(shown, "Arguments") if not line.startswith(" " * 30)]
     checks.equal([plain(line) for line in
                   re.findall(r"^(_.*)\n\t", section(text, "ARGUMENTS"), re.M)], arguments,
                  what + "arguments")

@@ -1,9 +1,12 @@
 // Numbers and dates.
 #include "hfs/records/text_format.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <cstring>
+#include <iterator>
 
+#include "hfs/names_text.h"
 #include "hfs/volume/problem.h"
 #include "hfs/volume/volume_header.h"
 
@@ -67,7 +70,45 @@ std::string Scaled(u64 bytes, u64 step, const char* const* units) {
     return Format(whole ? "%.0f %s" : "%.1f %s", value, units[unit]);
 }
 
+struct Columns {
+    char16_t first;
+    char16_t last;
+    std::size_t width;
+};
+// Units that do not take one column. A surrogate pair counts at its first half: the planes of
+// pictures and of further ideographs are wide.
+constexpr Columns kColumns[] = {
+    {0x0300, 0x036F, 0}, {0x0483, 0x0489, 0}, {0x0591, 0x05BD, 0}, {0x064B, 0x065F, 0},
+    {0x093C, 0x093C, 0}, {0x094D, 0x094D, 0}, {0x0E31, 0x0E31, 0}, {0x0E34, 0x0E3A, 0},
+    {0x0E47, 0x0E4E, 0}, {0x1100, 0x115F, 2}, {0x1160, 0x11FF, 0}, {0x200B, 0x200F, 0},
+    {0x20D0, 0x20FF, 0}, {0x2E80, 0x303E, 2}, {0x3041, 0x3098, 2}, {0x3099, 0x309A, 0},
+    {0x309B, 0xA4CF, 2}, {0xAC00, 0xD7A3, 2}, {0xD83C, 0xD83E, 2}, {0xD840, 0xD8BF, 2},
+    {0xDC00, 0xDFFF, 0}, {0xF900, 0xFAFF, 2}, {0xFE00, 0xFE0F, 0}, {0xFE20, 0xFE2F, 0},
+    {0xFE30, 0xFE6F, 2}, {0xFF00, 0xFF60, 2}, {0xFFE0, 0xFFE6, 2},
+};
+
 }  // namespace
+
+std::size_t ShownWidth(std::string_view text) {
+    NameUnits units;
+    if (!UnitsFromUtf8(text, &units)) {
+        return text.size();
+    }
+    std::size_t width = units.size();
+    for (const char16_t unit : units) {
+        const auto* const odd = std::lower_bound(
+            std::begin(kColumns), std::end(kColumns), unit,
+            [](const Columns& each, char16_t sought) { return each.last < sought; });
+        width += odd != std::end(kColumns) && unit >= odd->first ? odd->width - 1 : 0;
+    }
+    return width;
+}
+
+std::string Padded(std::string text, std::size_t width) {
+    const std::size_t shown = ShownWidth(text);
+    text.append(width > shown ? width - shown : 0, ' ');
+    return text;
+}
 
 char* PutDate(char* out, u32 date) {
     if (date == 0) {

@@ -1,7 +1,8 @@
-// Numbers and dates as they are printed, and arithmetic on nothing else.
+// Numbers, dates and columns as they are printed, and arithmetic on nothing else.
 #pragma once
 
 #include <string>
+#include <string_view>
 
 #include "platform/types.h"
 
@@ -23,6 +24,11 @@ std::string BinaryBytes(u64 bytes);  // binary: 512 KiB
 
 // Plural form: "1 file", "2 files", with grouped digits.
 std::string Counted(u64 count, const char* singular, const char* plural);
+
+// Columns that a terminal gives to UTF-8: one a character, none to marks, two to ideographs.
+std::size_t ShownWidth(std::string_view text);
+// With blanks behind it, so that it takes `width` columns or more.
+std::string Padded(std::string text, std::size_t width);
 
 char* PutNumber(char* out, u64 value, u32 width);  // right-aligned
 u32 DigitCount(u64 value);                         // decimal digits
