@@ -3,6 +3,7 @@
 // takes bytes in a row.
 //
 // usage: commit_bench FOLDER [--transactions N] [--bulk MIB] [--rounds N]
+//   N transactions, or 0 for changes in bulk alone
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
@@ -51,9 +52,9 @@ double Median(std::vector<double> values) {
     return values[values.size() / 2];
 }
 
-void Must(bool done, const std::string& what) {
+void Must(bool done, const char* what) {
     if (!done) {
-        std::fprintf(stderr, "commit_bench: %s failed\n", what.c_str());
+        std::fprintf(stderr, "commit_bench: %s failed\n", what);
         std::exit(1);
     }
 }
@@ -97,16 +98,17 @@ void MeasureTransactions(const Arguments& arguments, const Contestant& contestan
     const std::vector<std::uint32_t> numbers = Shuffled(kStartRecords + arguments.transactions);
     std::uint8_t data[kRecordSize] = {};
     for (std::uint32_t i = 0; i < kStartRecords; ++i) {
-        Must(store->Put(numbers[i], data), contestant.name);
+        Must(store->Put(numbers[i], data), contestant.name.c_str());
         if (store->IsCommitDue()) {
-            Must(store->Commit(), contestant.name);
+            Must(store->Commit(), contestant.name.c_str());
         }
     }
-    Must(store->Commit(), contestant.name);
+    Must(store->Commit(), contestant.name.c_str());
     const HostTally before = Tally();
     const auto start = Clock::now();
     for (std::uint32_t i = 0; i < arguments.transactions; ++i) {
-        Must(store->Put(numbers[kStartRecords + i], data) && store->Commit(), contestant.name);
+        Must(store->Put(numbers[kStartRecords + i], data) && store->Commit(),
+             contestant.name.c_str());
     }
     const double count = arguments.transactions;
     figures->seconds.push_back(SecondsSince(start) / count);
@@ -114,18 +116,35 @@ void MeasureTransactions(const Arguments& arguments, const Contestant& contestan
     figures->syncs = static_cast<double>(after.syncs - before.syncs) / count;
     figures->syncedWrites = static_cast<double>(after.syncedWrites - before.syncedWrites) / count;
     figures->bytes = static_cast<double>(after.bytes - before.bytes) / count;
-    Must(store->Count() == kStartRecords + arguments.transactions, contestant.name + ": count");
+    Must(store->Count() == kStartRecords + arguments.transactions, "counting what was put in");
 }
 
+// Seconds, and bytes handed to the host in them.
 struct BulkFigures {
-    double rate = 0;   // bytes a second
-    double share = 0;  // of the disk's rate, measured right after
+    double seconds = 0;        // from the first record to the end of the last commit
+    double commitSeconds = 0;  // of these: inside commits
+    double diskSeconds = 0;    // for as many bytes in a row into a plain file, right after
     double bytes = 0;
+    std::uint32_t commits = 0;
 };
+
+using Tracked = double BulkFigures::*;
+
+// Of the disk's rate in a row, as bytes written over the seconds of `part`.
+double Share(const BulkFigures& figures, Tracked part) {
+    return figures.diskSeconds / (figures.*part);
+}
 
 // Records put in, and every one of them put in again, committed in batches. `numbers`: the order.
 BulkFigures MeasureBulk(const Arguments& arguments, const std::vector<std::uint32_t>& numbers) {
     const auto store = MakeTreehfs(EmptyFolder(arguments), kBulkJournalBytes);
+    BulkFigures figures;
+    const auto commit = [&] {
+        const auto start = Clock::now();
+        Must(store->Commit(), "bulk");
+        figures.commitSeconds += SecondsSince(start);
+        figures.commits += 1;
+    };
     std::uint8_t data[kRecordSize] = {};
     const HostTally before = Tally();
     const auto start = Clock::now();
@@ -134,18 +153,15 @@ BulkFigures MeasureBulk(const Arguments& arguments, const std::vector<std::uint3
         for (const std::uint32_t number : numbers) {
             Must(store->Put(number, data), "bulk");
             if (store->IsCommitDue()) {
-                Must(store->Commit(), "bulk");
+                commit();
             }
         }
     }
-    Must(store->Commit(), "bulk");
-    const double seconds = SecondsSince(start);
-    BulkFigures figures;
+    commit();
+    figures.seconds = SecondsSince(start);
     figures.bytes = static_cast<double>(Tally().bytes - before.bytes);
-    figures.rate = figures.bytes / seconds;
-    const std::uint64_t same = static_cast<std::uint64_t>(figures.bytes);
-    const double alone = SecondsToWrite(arguments.folder + "/row", same);
-    figures.share = figures.rate / (static_cast<double>(same) / alone);
+    figures.diskSeconds =
+        SecondsToWrite(arguments.folder + "/row", static_cast<std::uint64_t>(figures.bytes));
     return figures;
 }
 
@@ -172,6 +188,29 @@ void CompareTransactions(const Arguments& arguments) {
     }
 }
 
+// Medians. The rates are of bytes written, as shares of the disk's for the same bytes in a row:
+// while a commit is under way, and over everything, the work on the tree among it.
+void PrintBulk(const char* order, const std::vector<BulkFigures>& rounds) {
+    const auto median = [&](const std::function<double(const BulkFigures&)>& figure) {
+        std::vector<double> values;
+        for (const BulkFigures& round : rounds) {
+            values.push_back(figure(round));
+        }
+        return Median(values);
+    };
+    const auto seconds = [&](Tracked part) {
+        return median([&](const BulkFigures& round) { return round.*part; });
+    };
+    const auto share = [&](Tracked part) {
+        return 100 * median([&](const BulkFigures& round) { return Share(round, part); });
+    };
+    std::printf("%-18s %10.0f %8u %9.2f %9.2f %9.2f %13.0f%% %13.0f%%\n", order,
+                rounds.back().bytes / 1e6, rounds.back().commits,
+                seconds(&BulkFigures::diskSeconds), seconds(&BulkFigures::commitSeconds),
+                seconds(&BulkFigures::seconds), share(&BulkFigures::commitSeconds),
+                share(&BulkFigures::seconds));
+}
+
 void MeasureBulks(const Arguments& arguments) {
     const std::uint32_t count =
         static_cast<std::uint32_t>((arguments.bulkMib << 20) / (kRecordSize + 10));
@@ -181,16 +220,14 @@ void MeasureBulks(const Arguments& arguments) {
     }
     std::printf("\nin bulk: %u records put in and put in again, journal of %u MiB\n", count,
                 static_cast<unsigned>(kBulkJournalBytes >> 20));
+    std::printf("%-18s %10s %8s %9s %9s %9s %14s %14s\n", "", "MB written", "commits", "disk s",
+                "commits s", "all s", "commits' rate", "rate of all");
     for (const bool inOrder : {true, false}) {
-        std::vector<double> shares;
-        BulkFigures found;
+        std::vector<BulkFigures> rounds;
         for (std::uint32_t round = 0; round < arguments.rounds; ++round) {
-            found = MeasureBulk(arguments, inOrder ? rising : Shuffled(count));
-            shares.push_back(found.share);
+            rounds.push_back(MeasureBulk(arguments, inOrder ? rising : Shuffled(count)));
         }
-        std::printf("%-18s %6.0f MB written, %6.0f MB/s, %3.0f%% of the disk's rate in a row\n",
-                    inOrder ? "in order" : "in no order", found.bytes / 1e6, found.rate / 1e6,
-                    Median(shares) * 100);
+        PrintBulk(inOrder ? "in order" : "in no order", rounds);
     }
 }
 
@@ -202,8 +239,9 @@ int main(int count, char** words) {
     bench::Arguments arguments;
     for (int i = 1; i < count; ++i) {
         const std::string word = words[i];
-        const unsigned long value = i + 1 < count ? std::strtoul(words[i + 1], nullptr, 10) : 0;
-        if (word == "--transactions" && value != 0) {
+        const bool hasValue = i + 1 < count;
+        const unsigned long value = hasValue ? std::strtoul(words[i + 1], nullptr, 10) : 0;
+        if (word == "--transactions" && hasValue) {
             arguments.transactions = static_cast<std::uint32_t>(value);
             ++i;
         } else if (word == "--bulk" && value != 0) {
@@ -226,7 +264,9 @@ int main(int count, char** words) {
         return 16;
     }
     std::filesystem::create_directories(arguments.folder);
-    bench::CompareTransactions(arguments);
+    if (arguments.transactions != 0) {
+        bench::CompareTransactions(arguments);
+    }
     bench::MeasureBulks(arguments);
     std::filesystem::remove_all(arguments.folder + "/store");
     return 0;

@@ -56,10 +56,8 @@ public:
         record[1] = 0xFF;
         int status = tree_->InsertRecord(key.bytes, number + 1000, record, sizeof record);
         if (status == kErrExists) {
-            bool found = false;
-            status = tree_->FindEntry(reinterpret_cast<const BTreeKey*>(key.bytes), number + 1000,
-                                      nullptr, &found, nullptr, nullptr, nullptr, nullptr);
-            status = status == kOk ? tree_->UpdateKeyAndRecord(nullptr, record) : status;
+            // Looking for its place has left the tree on the record that is there.
+            status = tree_->UpdateKeyAndRecord(nullptr, record);
         }
         volume_->TrimCache();
         return status == kOk;

@@ -15,29 +15,36 @@ constexpr u32 kVersionInHeader = 8;
 constexpr u32 kLargestBlock = 32768;  // bytes of one block of a list
 constexpr std::size_t kLargestWrite = std::size_t{1} << 20;
 
+// Room for gathering `bytes` bytes that are written in large pieces.
+std::size_t PieceSize(u64 bytes) {
+    return static_cast<std::size_t>(std::min<u64>(bytes, kLargestWrite));
+}
+
 // Collects the bytes of a transaction and writes them into the ring in large pieces.
 class RingWriter {
 public:
-    RingWriter(BlockDevice* volume, JournalPlace* place)
+    // `expected`: bytes of the transaction, which the ring can hold.
+    RingWriter(BlockDevice* volume, JournalPlace* place, u64 expected)
         : volume_(volume),
           place_(place),
           position_(place->header.end),
-          most_(static_cast<std::size_t>(std::min<u64>(kLargestWrite, place->header.Capacity()))) {}
+          room_(PieceSize(expected)) {}
     u64 Position() const { return position_; }
     // Room for `bytes` more bytes, to be filled in before the next call; null: a write failed.
     u8* Take(u32 bytes) {
-        if (bytes_.size() + bytes > most_) {
+        if (used_ + bytes > room_.size()) {
             Flush();
+            room_.resize(std::max<std::size_t>(room_.size(), bytes));
         }
-        bytes_.resize(bytes_.size() + bytes);
-        return result_.Ok() ? bytes_.data() + bytes_.size() - bytes : nullptr;
+        used_ += bytes;
+        return result_.Ok() ? room_.data() + used_ - bytes : nullptr;
     }
     IoResult Flush() {
-        if (result_.Ok() && !bytes_.empty()) {
-            result_ = WriteRing(volume_, *place_, position_, bytes_.data(), bytes_.size());
-            position_ = place_->header.Advance(position_, bytes_.size());
+        if (result_.Ok() && used_ != 0) {
+            result_ = WriteRing(volume_, *place_, position_, room_.data(), used_);
+            position_ = place_->header.Advance(position_, used_);
         }
-        bytes_.clear();
+        used_ = 0;
         return result_;
     }
 
@@ -45,8 +52,8 @@ private:
     BlockDevice* volume_;
     JournalPlace* place_;
     u64 position_;
-    std::size_t most_;
-    std::vector<u8> bytes_;
+    std::vector<u8> room_;
+    std::size_t used_ = 0;
     IoResult result_;
 };
 
@@ -156,7 +163,7 @@ IoResult JournalSink::Empty(BlockDevice* home) {
 IoResult JournalSink::Log(const OverlayDevice& staged, const std::vector<Stretch>& stretches,
                           BlockDevice* home, u64* bytesWritten) {
     SliceDevice volume(home, options_.volumeOffset, options_.volumeBytes);
-    RingWriter ring(&volume, &place_);
+    RingWriter ring(&volume, &place_, needed_);
     const u32 perList = BlocksPerList(place_.header.listSize);
     for (std::size_t first = 0; first < stretches.size(); first += perList) {
         const std::size_t last = std::min(stretches.size(), first + perList);
@@ -199,24 +206,22 @@ IoResult JournalSink::Log(const OverlayDevice& staged, const std::vector<Stretch
 // In rising order, neighbours in one write. Not synced: the next commit or Finish does that.
 IoResult JournalSink::WriteHome(const OverlayDevice& staged, const std::vector<Stretch>& stretches,
                                 BlockDevice* home, u64* bytesWritten) {
-    std::vector<u8> bytes;
+    std::vector<u8> room(PieceSize(needed_));  // of which any stretch is a part
     for (std::size_t first = 0; first < stretches.size();) {
         const u64 start = stretches[first].offset;
-        bytes.clear();
+        std::size_t used = 0;
         std::size_t next = first;
-        for (; next < stretches.size() && stretches[next].offset == start + bytes.size() &&
-               bytes.size() < kLargestWrite;
+        for (; next < stretches.size() && stretches[next].offset == start + used &&
+               used + stretches[next].bytes <= room.size();
              ++next) {
-            bytes.resize(bytes.size() + stretches[next].bytes);
-            const IoResult result = ReadStaged(staged, stretches[next],
-                                               bytes.data() + bytes.size() - stretches[next].bytes);
+            const IoResult result = ReadStaged(staged, stretches[next], room.data() + used);
             if (!result.Ok()) {
                 return result;
             }
+            used += stretches[next].bytes;
         }
-        *bytesWritten += bytes.size();
-        const IoResult result =
-            home->Write(options_.volumeOffset + start, bytes.data(), bytes.size());
+        *bytesWritten += used;
+        const IoResult result = home->Write(options_.volumeOffset + start, room.data(), used);
         if (!result.Ok()) {
             return result;
         }
