@@ -8,6 +8,7 @@
 #include "hfs/treehfs/bytes.h"
 #include "tool/command.h"
 #include "tool/errors.h"
+#include "tool/kept_positions.h"
 #include "tool/progress.h"
 #include "tool/script_words.h"
 
@@ -51,23 +52,9 @@ bool ChangesTree(ScriptOp op) {
     }
 }
 
-// Whether nothing such an operation does depends on where the tree stands.
-bool IgnoresPosition(ScriptOp op, u32 count) {
-    switch (op) {
-        case ScriptOp::kUse:
-        case ScriptOp::kInsert:
-        case ScriptOp::kReplace:
-        case ScriptOp::kFind:
-        case ScriptOp::kSeek:
-        case ScriptOp::kGoto:
-            return true;
-        case ScriptOp::kUpdate:
-            return count == 2;
-        case ScriptOp::kDelete:
-            return count == 1;
-        default:
-            return false;
-    }
+// Whether such an operation may need more of the journal than the commits it asks for itself.
+bool NeedsRoom(ScriptOp op) {
+    return ChangesTree(op) && op != ScriptOp::kFlush && op != ScriptOp::kClear;
 }
 
 // The key of the item that a stored thread record names.
@@ -191,9 +178,12 @@ ScriptRunner::Outcome ScriptRunner::Execute(ScriptOp op, const std::string_view*
     if (ChangesTree(op) && !volume_->IsWritable()) {
         return {kErrVolumeReadOnly, " readonly=yes"};
     }
-    // A commit lets go of positions, so it waits for an operation that needs none.
-    if (IgnoresPosition(op, count) && volume_->IsCommitDue()) {
-        const Outcome kept = KeepAll(0);
+    if (NeedsRoom(op) && volume_->IsCommitDue()) {
+        const KeptPositions positions(volume_);
+        Outcome kept = KeepAll(0);
+        if (kept.status == kOk) {
+            kept.status = positions.PutBack();
+        }
         if (kept.status != kOk) {
             return kept;
         }

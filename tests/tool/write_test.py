@@ -123,15 +123,25 @@ out, _ = run("import", copy, "records.jsonl", "--write")
 checks.check("digest equals the source" in out, "import through a small journal: " + out)
 sound(copy)
 
-# One that cannot be cut: positions have to stay. Nothing of it is kept.
-whole = script("whole.tr", "seek first\nnext 8\nrepeat 690\nupdate same\nnext\nend\n")
-shutil.copy(folder / image, folder / "whole.img")
-before = names_in("whole.img")
-_, err = run("apply", "whole.img", whole, "--write", code=8)
+# Changes that go on from a position, with nothing between them that names its place: the tree goes on
+# standing where it stood, as it does where nothing is kept in between.
+steps = script("steps.tr", "seek first\nnext 8\nrepeat 500\nupdate file{id:$i}\nnext\nend\n"
+                           "repeat 150\ndelete\nhere\nend\nprev 3\nhere\npos\n")
+shutil.copy(folder / image, folder / "steps.img")
+in_memory, _ = run("apply", "steps.img", steps, "--save", "saved.img")
+checks.equal(in_memory.count(" delete 00000000 ok"), 150, "deletions by position: " + in_memory)
+written, _ = run("apply", "steps.img", steps, "--write")
+checks.equal(written, in_memory, "steps through a small journal")
+checks.equal(run("export", "steps.img"), run("export", "saved.img"), "records after steps")
+sound("steps.img")
+
+# A single change that no commit can make smaller: nothing of it is kept.
+volume("whole.img", "--node-size", "32K", "--journal", "64K")
+_, err = run("apply", "whole.img", some, "--write", code=8)
 checks.check(re.search(r"^treehfs: whole\.img: the last changes could not be kept: the changes "
-                       r"take [\d,]+ bytes of the journal, which holds 31,744: commit more often$",
+                       r"take [\d,]+ bytes of the journal, which holds 65,024: commit more often$",
                        err, re.M), "too large: " + err)
-checks.equal(names_in("whole.img"), before, "names after a transaction too large")
+checks.equal(names_in("whole.img"), [], "names after a transaction too large")
 checks.check(is_clean("whole.img"), "clean after a transaction too large")
 
 # --- import tells up to where the records are kept -------------------------------------------

@@ -8,6 +8,7 @@
 #include "hfs/volume/extents_key.h"
 #include "hfs/volume/reservation.h"
 #include "hfs/volume/wire.h"
+#include "recording_device.h"
 
 namespace VELK::test {
 
@@ -193,11 +194,28 @@ int ReserveAndInsert(ImageVolume* volume) {
     return status == kOk ? InsertBetween(volume) : status;
 }
 
+// What `log` left of a volume when the power went as soon as the first transaction counted: its
+// copies had been synced, and then the journal's header.
+std::vector<u8> CutBeforeAnyPlace(const std::vector<u8>& base,
+                                  const std::vector<DeviceEvent>& log) {
+    auto device = DeviceWith(base);
+    u32 syncs = 0;
+    for (auto event = log.begin(); event != log.end() && syncs < 2; ++event) {
+        if (event->isSync) {
+            syncs += 1;
+        } else {
+            EXPECT_TRUE(
+                device->Write(event->offset, event->bytes.data(), event->bytes.size()).Ok());
+        }
+    }
+    EXPECT_NE(0u, JournalOf(device.get()).header.Used());
+    return BytesOf(device.get());
+}
+
 }  // namespace
 
-// The first five are the smallest.
 const FaultScenario kFaultScenario[kFaultScenarios] = {
-    {"Open", MakeAttributes, Nothing, OpenTrees},
+    {"Open", MakeAttributes, Nothing, OpenTrees, 0, true},
     {"FirstInsertion", MakeAttributes, OpenTrees,
      [](ImageVolume* volume) { return Committed(volume, InsertAttribute(volume)); }},
     {"Insertion", Nothing, OpenTrees,
@@ -263,6 +281,7 @@ const FaultScenario kFaultScenario[kFaultScenarios] = {
          volume->Restore();
          return volume->IsWritable() ? kOk : kErrVolumeReadOnly;
      }},
+    {"Replay", MakeAttributes, Nothing, nullptr},
 };
 
 std::vector<u8> MakeFaultBase(const FaultScenario& scenario) {
@@ -276,13 +295,15 @@ std::vector<u8> MakeFaultBase(const FaultScenario& scenario) {
     }
     const CutBase base = MakeCutBase(shape);
     auto device = DeviceWith(base.bytes);
+    std::vector<DeviceEvent> log;
+    RecordingDevice recorder(device.get(), &log);
     Problem problem;
-    auto volume = MountOn(device.get(), Writing(), &problem);
+    auto volume = MountOn(&recorder, Writing(), &problem);
     EXPECT_NE(nullptr, volume) << problem.Text();
     EXPECT_EQ(kOk, Committed(volume.get(), scenario.prepare(volume.get()))) << scenario.name;
     EXPECT_EQ(kOk, volume->Close());
     volume.reset();
-    return BytesOf(device.get());
+    return Mounts(scenario) ? CutBeforeAnyPlace(base.bytes, log) : BytesOf(device.get());
 }
 
 }  // namespace VELK::test

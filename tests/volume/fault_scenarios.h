@@ -12,15 +12,23 @@ struct FaultScenario {
     int (*prepare)(ImageVolume* volume);
     // At the start of every run, with everything working.
     int (*begin)(ImageVolume* volume);
-    // What has to cope with failures.
+    // What has to cope with failures. Null: mounting, which carries out what waits in the journal.
     int (*work)(ImageVolume* volume);
     u32 catalogNodes = 0;
+    bool needsFreshMount = false;  // the work can be done once in a mount
 };
 
-constexpr u32 kFaultScenarios = 19;
+constexpr u32 kFaultScenarios = 20;
+constexpr u32 kSmallestScenarios = 5;  // the first of them
 extern const FaultScenario kFaultScenario[kFaultScenarios];
 
-// The volume a scenario starts from.
+// Whether a scenario's work is mounting.
+inline bool Mounts(const FaultScenario& scenario) {
+    return scenario.work == nullptr;
+}
+
+// The volume a scenario starts from. Where the work is mounting, what was prepared waits in the
+// journal: the power was cut before any of it reached its place.
 std::vector<u8> MakeFaultBase(const FaultScenario& scenario);
 
 }  // namespace VELK::test

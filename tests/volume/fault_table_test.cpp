@@ -11,119 +11,15 @@
 #include <set>
 
 #include "capture.h"
-#include "fault_scenarios.h"
-#include "fault_service.h"
-#include "heap_guard.h"
+#include "fault_lab.h"
 #include "ledger.h"
-#include "recording_device.h"
 
 namespace VELK {
 namespace {
 
-using test::Call;
-using test::DeviceFaults;
-using test::FaultScenario;
-
-enum class Service {
-    kMap,
-    kDirtyMeta,
-    kWriteAccess,
-    kCreateAccess,
-    kResize,
-    kZero,
-    kAllocation,
-    kRead,
-    kWrite,
-    kSync,
-};
-constexpr const char* kServiceNames[] = {"Map",    "DirtyMeta", "WriteAccess", "CreateAccess",
-                                         "Resize", "Zero",      "Allocation",  "Read",
-                                         "Write",  "Sync"};
-constexpr Service kServices[] = {Service::kMap,          Service::kDirtyMeta, Service::kWriteAccess,
-                                 Service::kCreateAccess, Service::kResize,    Service::kZero,
-                                 Service::kAllocation,   Service::kRead,      Service::kWrite,
-                                 Service::kSync};
-
-bool IsOfDevice(Service service) {
-    return service >= Service::kRead;
-}
-
-int StatusOf(Service service) {
-    return service == Service::kAllocation ? kErrNoMemory
-           : IsOfDevice(service)           ? kErrVolumeIo
-                                           : test::kFaultStatus;
-}
-
-Call CallOf(Service service) {
-    constexpr Call kCalls[] = {Call::kMap,          Call::kDirtyMeta, Call::kWriteAccess,
-                               Call::kCreateAccess, Call::kResize,    Call::kZero};
-    return kCalls[static_cast<int>(service)];
-}
-
-// A volume with everything under it that can fail.
-class Lab {
-public:
-    Lab(const std::vector<u8>& base, const FaultScenario& scenario)
-        : scenario_(scenario), device_(test::DeviceWith(base)) {
-        Mount();
-    }
-
-    // Takes the volume up anew, on a medium that works.
-    void Mount() {
-        calls_.reset();
-        volume_.reset();
-        faults_ = DeviceFaults{};
-        faulty_ = std::make_unique<test::FaultyDevice>(device_.get(), &faults_);
-        Problem problem;
-        volume_ = test::MountOn(faulty_.get(), test::Writing(), &problem);
-        ASSERT_NE(nullptr, volume_) << problem.Text();
-        calls_ = std::make_unique<test::FaultService>(volume_->Fs());
-    }
-    int Begin() { return scenario_.begin(volume_.get()); }
-    int Work() { return scenario_.work(volume_.get()); }
-
-    void Arm(Service service, u32 nth, bool forEver) {
-        faults_.forEver = forEver;
-        switch (service) {
-            case Service::kAllocation:
-                heap_.FailNth(nth, forEver);
-                break;
-            case Service::kRead:
-                faults_.failRead = faults_.reads + nth;
-                break;
-            case Service::kWrite:
-                faults_.failWrite = faults_.writes + nth;
-                break;
-            case Service::kSync:
-                faults_.failSync = faults_.syncs + nth;
-                break;
-            default:
-                calls_->Fail(CallOf(service), nth, test::kFaultStatus, forEver);
-        }
-    }
-    // Whether a failure was met; from here on everything works again.
-    bool Disarm() {
-        const bool hasStruck = heap_.HasFailed() || faults_.hasFailed || calls_->HasFailed();
-        heap_.FailNone();
-        calls_->FailNone();
-        faults_.failRead = 0;
-        faults_.failWrite = 0;
-        faults_.failSync = 0;
-        return hasStruck;
-    }
-
-    ImageVolume* Volume() { return volume_.get(); }
-    std::vector<u8> Medium() { return test::BytesOf(device_.get()); }
-
-private:
-    const FaultScenario& scenario_;
-    test::HeapGuard heap_;
-    std::unique_ptr<MemoryDevice> device_;
-    DeviceFaults faults_;
-    std::unique_ptr<test::FaultyDevice> faulty_;
-    std::unique_ptr<ImageVolume> volume_;
-    std::unique_ptr<test::FaultService> calls_;
-};
+using test::Fault;
+using test::FaultLab;
+using test::Service;
 
 // Report lines by what failed: "Split Map: 2916 2982 3012".
 class ReportTable {
@@ -150,61 +46,53 @@ public:
 
 class FaultTable : public testing::TestWithParam<u32> {
 protected:
-    void SetUp() override {
-        base_ = test::MakeFaultBase(Scenario());
-        place_ = test::JournalOf(test::DeviceWith(base_).get());
-        before_ = test::Essence(base_, place_);
-        Lab lab(base_, Scenario());
-        ASSERT_EQ(kOk, lab.Begin());
-        ASSERT_EQ(kOk, lab.Work());
-        after_ = test::Essence(lab.Medium(), place_);
-        capture_.Take();
-    }
-    const FaultScenario& Scenario() const { return test::kFaultScenario[GetParam()]; }
+    FaultTable() : case_(test::kFaultScenario[GetParam()]) { capture_.Take(); }
 
-    // Fails the nth call; false when it never came to that.
-    bool FailNth(Service service, u32 nth, bool forEver) {
-        Lab lab(base_, Scenario());
+    const char* Name() const { return case_.Scenario().name; }
+
+    // False when it never came to the failure.
+    bool Fail(const Fault& fault) {
+        FaultLab lab = case_.NewLab();
         EXPECT_EQ(kOk, lab.Begin());
         capture_.Take();
-        lab.Arm(service, nth, forEver);
+        lab.Arm(fault);
         const int status = lab.Work();
         const bool hasStruck = lab.Disarm();
         if (!hasStruck) {
             EXPECT_EQ(kOk, status);
-            EXPECT_EQ(after_, test::Essence(lab.Medium(), place_));
+            EXPECT_TRUE(case_.IsAfter(&lab));
             return false;
         }
-        JudgeReports(service, status, forEver);
+        JudgeReports(fault, status);
         if (status == kOk) {
             // Nothing depended on it: a hint, memory that can be done without.
-            EXPECT_EQ(after_, test::Essence(lab.Medium(), place_));
+            EXPECT_TRUE(case_.IsAfter(&lab));
             return true;
         }
-        EXPECT_TRUE(status == StatusOf(service) || IsRestore()) << StatusText(status);
-        lab.Volume()->RestoreAfter(status);
-        JudgeReferences(lab.Volume());
-        JudgeRecovery(&lab, service);
+        EXPECT_TRUE(status == StatusOf(fault.service) || IsRestore()) << StatusText(status);
+        if (lab.Volume() != nullptr) {
+            lab.Volume()->RestoreAfter(status);
+            JudgeReferences(lab.Volume());
+        }
+        case_.JudgeRecovery(&lab, IsOfDevice(fault.service));
         return true;
     }
 
-    bool IsRestore() const { return std::string(Scenario().name) == "Restore"; }
-    bool IsOpen() const { return std::string(Scenario().name) == "Open"; }
+    bool IsRestore() const { return std::string(Name()) == "Restore"; }
 
-    void JudgeReports(Service service, int status, bool forEver) {
-        std::string line = std::string(Scenario().name) + " " +
-                           kServiceNames[static_cast<int>(service)] + ":" +
+    void JudgeReports(const Fault& fault, int status) {
+        std::string line = std::string(Name()) + " " + NameOf(fault.service) + ":" +
                            (status == kOk ? " passed" : "");
         for (const test::Event& event : capture_.Take()) {
             if (event.kind == test::Event::Kind::kReport) {
-                EXPECT_EQ(static_cast<u32>(StatusOf(service)), event.code) << event.site;
+                EXPECT_EQ(static_cast<u32>(StatusOf(fault.service)), event.code) << event.site;
                 line += " " + std::to_string(event.site);
             } else if (event.kind == test::Event::Kind::kAssertion) {
                 line += " assert " + std::to_string(event.site);
             }
         }
         // What goes on failing fails in the recovery too: other lines follow.
-        if (!forEver) {
+        if (!fault.forEver) {
             seen_.insert(line);
         }
     }
@@ -217,42 +105,19 @@ protected:
         }
     }
 
-    void JudgeRecovery(Lab* lab, Service service) {
-        std::vector<u8> stands = test::Essence(lab->Medium(), place_);
-        if (IsOfDevice(service)) {
-            // The commit under way stands or not: the next mount shows which.
-            lab->Mount();
-            stands = test::Essence(lab->Medium(), place_);
-            if (stands == after_) {
-                return;
-            }
-        }
-        ASSERT_EQ(before_, stands);
-        if (!lab->Volume()->IsWritable() || IsOpen()) {
-            lab->Mount();
-        }
-        ASSERT_EQ(kOk, lab->Begin());
-        ASSERT_EQ(kOk, lab->Work());
-        ASSERT_EQ(after_, test::Essence(lab->Medium(), place_));
-    }
-
     test::Capture capture_;
-    std::vector<u8> base_;
-    JournalPlace place_;
-    std::vector<u8> before_;
-    std::vector<u8> after_;
+    test::FaultCase case_;
     std::set<std::string> seen_;
 };
 
 TEST_P(FaultTable, EachCallOfEachServiceInTurn) {
     u32 failures = 0;
-    for (const Service service : kServices) {
+    for (const Service service : test::kServices) {
         for (const bool forEver : {false, true}) {
             u32 nth = 1;
-            for (; FailNth(service, nth, forEver); ++nth) {
-                ASSERT_FALSE(HasFailure())
-                    << Scenario().name << " " << kServiceNames[static_cast<int>(service)] << " "
-                    << nth << (forEver ? " and from then on" : "");
+            for (; Fail({service, nth, forEver}); ++nth) {
+                ASSERT_FALSE(HasFailure()) << Name() << " " << NameOf(service) << " " << nth
+                                           << (forEver ? " and from then on" : "");
             }
             failures += nth - 1;
         }
@@ -261,7 +126,7 @@ TEST_P(FaultTable, EachCallOfEachServiceInTurn) {
     ReportTable::Write(seen_);
     std::set<std::string> expected;
     for (const std::string& line : ReportTable::Read()) {
-        if (line.starts_with(std::string(Scenario().name) + " ")) {
+        if (line.starts_with(std::string(Name()) + " ")) {
             expected.insert(line);
         }
     }

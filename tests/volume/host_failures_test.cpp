@@ -230,6 +230,47 @@ TEST(ReplayFailures, EachTransferInTurn) {
     }
 }
 
+// A place that cannot be read is not one where nothing is: who writes then would leave an alternate
+// header as it was, or take a journal for broken.
+TEST(MountingFailures, AReadErrorAnywhereKeepsFromWriting) {
+    test::Capture capture;
+    auto device = test::FreshDevice(kSize, SmallFormat(32 << 10));
+    const std::vector<u8> before = BytesOf(device.get());
+    const std::string ofAlternate =
+        "read error at 0x2fc00: Input/output error: the volume can only be read";
+    u32 failures = 0;
+    u32 alternates = 0;
+    for (u32 nth = 1;; ++nth) {
+        const auto mount = [&](const OpenOptions& options, Problem* problem) {
+            DeviceFaults faults;
+            faults.failRead = nth;
+            test::FaultyDevice faulty(device.get(), &faults);
+            const auto volume = MountOn(&faulty, options, problem);
+            failures += faults.hasFailed ? 1u : 0u;
+            return volume != nullptr;
+        };
+        Problem problem;
+        const u32 failuresBefore = failures;
+        const bool isMounted = mount(Writing(), &problem);
+        if (failures == failuresBefore) {
+            EXPECT_TRUE(isMounted) << problem.Text();
+            break;
+        }
+        ASSERT_FALSE(isMounted) << nth;
+        ASSERT_EQ(kErrVolumeIo, problem.status) << problem.Text();
+        ASSERT_EQ("read error at 0x", problem.what.substr(0, 16)) << nth;
+        ASSERT_EQ(before, BytesOf(device.get())) << nth;
+        if (problem.Text() == ofAlternate) {
+            alternates += 1;
+            EXPECT_TRUE(mount(OpenOptions{}, &problem)) << problem.Text();
+            EXPECT_TRUE(mount(Writing(true), &problem)) << problem.Text();
+            ASSERT_TRUE(device->Write(0, before.data(), before.size()).Ok());
+        }
+    }
+    EXPECT_GE(failures, 8u);
+    EXPECT_EQ(1u, alternates);
+}
+
 // --- files of the host ---------------------------------------------------------------------------
 
 class HostFile : public testing::Test {

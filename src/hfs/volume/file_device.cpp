@@ -26,6 +26,8 @@ std::string IoErrorText(int error) {
             return "device is read-only";
         case kIoNoMemory:
             return "out of memory";
+        case kIoTooLarge:
+            return "more changes than the journal holds";
         default:
             return std::strerror(error);
     }

@@ -4,10 +4,30 @@
 #include <algorithm>
 
 #include "hfs/volume/journal_sink.h"
+#include "hfs/volume/read_witness.h"
 #include "hfs/volume/volume_state.h"
 #include "hfs/volume/wire.h"
 
 namespace VELK {
+
+namespace {
+
+// What a mount comes to on a medium that failed to read something: a failure has its reason there,
+// and nobody writes to it who is not told to do so whatever the volume is like.
+Problem ReadTrouble(const Problem& problem, const IoResult& failure, const OpenOptions& options) {
+    const bool isRefused = options.access == Access::kWrite && !options.force;
+    if (failure.Ok() || (problem ? problem.status != 0 : !isRefused)) {
+        return problem;
+    }
+    Problem trouble =
+        FailureAt(failure.offset,
+                  "read error at " + HexOffset(failure.offset) + ": " + IoErrorText(failure.error),
+                  problem ? problem.advice : "the volume can only be read");
+    trouble.status = failure.error == kIoNoMemory ? kErrNoMemory : kErrVolumeIo;
+    return trouble;
+}
+
+}  // namespace
 
 ImageVolume::ImageVolume(std::unique_ptr<State> state) : state_(std::move(state)) {}
 ImageVolume::~ImageVolume() = default;
@@ -17,9 +37,12 @@ std::unique_ptr<ImageVolume> ImageVolume::Open(std::unique_ptr<BlockDevice> imag
                                                Problem* problem) {
     VolumeScan ownScan;
     auto state = std::make_unique<State>();
-    state->image = std::move(image);
+    auto watched = std::make_unique<ReadWitness>(std::move(image));
+    const ReadWitness& witness = *watched;
+    state->image = std::move(watched);
     state->options = options;
     *problem = state->Mount(scan != nullptr ? scan : &ownScan);
+    *problem = ReadTrouble(*problem, witness.FirstFailure(), options);
     if (*problem) {
         return nullptr;
     }

@@ -46,12 +46,16 @@ std::string HexOffset(u64 number) {
 }
 
 std::string Format(const char* format, ...) {
-    char buffer[512];
     va_list arguments;
+    va_list again;
     va_start(arguments, format);
-    std::vsnprintf(buffer, sizeof buffer, format, arguments);
+    va_copy(again, arguments);
+    const int size = std::vsnprintf(nullptr, 0, format, arguments);
     va_end(arguments);
-    return buffer;
+    std::string text(size > 0 ? static_cast<std::size_t>(size) : 0, '\0');
+    std::vsnprintf(text.data(), text.size() + 1, format, again);
+    va_end(again);
+    return text;
 }
 
 std::string StatusWithCode(int status) {

@@ -48,7 +48,7 @@ std::string Grouped(u64 number);
 std::string Position(u64 offset);
 // "0x15810".
 std::string HexOffset(u64 number);
-// printf into a string; what goes beyond 511 bytes is cut.
+// printf into a string of any length.
 #if defined(__GNUC__)
 __attribute__((format(printf, 1, 2)))
 #endif

@@ -107,7 +107,11 @@ void FreeBlocks(ImageVolume::State* state, HfsRuns* runs, u32 keep) {
 Problem ImageVolume::State::LoadBitmap() {
     const u64 bytes = CeilDiv(fs.totalBlocks, 8);
     bitmapBytes.assign(static_cast<std::size_t>(bytes), 0);
-    MapFork(kAllocationFileId);
+    if (MapFork(kAllocationFileId) == kErrNoMemory) {
+        Problem problem = Failure("allocation file: " + StatusWithCode(kErrNoMemory), "");
+        problem.status = kErrNoMemory;
+        return problem;
+    }
     const SpecialFile* file = File(kAllocationFileId);
     const u64 mapped = u64{MappedBlocks(*file->runs)} << fs.allocBlockShift;
     if (mapped < bytes) {
