@@ -4,7 +4,7 @@
 
 #include "hfs/records/json_writer.h"
 #include "hfs/records/record_json.h"
-#include "hfs/treehfs/bytes.h"
+#include "hfs/records/stored_records.h"
 #include "tool/errors.h"
 #include "tool/progress.h"
 #include "tool/record_digest.h"
@@ -181,18 +181,20 @@ private:
         if (problem) {
             Wrong(problem.Text());
         }
-        int status = Insert(key, stored);
+        u64* counted = &counts_.inserted;
+        int status = InsertStored(volume_, fileId_, key, stored);
         if (status == kErrExists && onExists_ == "replace") {
-            status = Replace(key, stored);
+            counted = &counts_.replaced;
+            status = UpdateStored(volume_, fileId_, key, stored);
         }
         if (status == kErrExists || status == kErrTooLarge) {
             ++counts_.refused;
             return onExists_ != "stop";
         }
         if (status != kOk) {
-            volume_->RestoreAfter(status);
             Wrong(StatusWithCode(status));
         }
+        ++*counted;
         ++sinceFlush_;
         volume_->TrimCache();
         if (sinceFlush_ >= batch_ || volume_->IsCommitDue()) {
@@ -208,41 +210,6 @@ private:
         }
         sinceFlush_ = 0;
         keptLine_ = reader_.Number();
-    }
-
-    int Insert(const SearchKey& key, const std::vector<u8>& stored) {
-        const u32 size = static_cast<u32>(stored.size());
-        std::vector<u8> host(stored.size() + 2);
-        tree_->convert.DataToMemory(host.data(), stored.data(), size);
-        const int status = tree_->InsertRecord(key.Key(), key.id, host.data(), size);
-        if (status == kOk) {
-            ++counts_.inserted;
-            if (fileId_ == kCatalogFileId) {
-                CountRecord(volume_, stored.data(), size, 1);
-            }
-        }
-        return status;
-    }
-
-    int Replace(const SearchKey& key, const std::vector<u8>& stored) {
-        std::vector<u8> old(65536);
-        unsigned oldSize = 0;
-        int status = tree_->FindRecord(key.Key(), key.id, old.data(),
-                                       static_cast<unsigned>(old.size()), &oldSize, nullptr);
-        if (status == kOk) {
-            status = tree_->DeleteRecord(key.Key(), key.id, false);
-        }
-        if (status == kOk && fileId_ == kCatalogFileId) {
-            std::vector<u8> oldStored(oldSize);
-            tree_->convert.DataToDisk(oldStored.data(), old.data(), oldSize);
-            CountRecord(volume_, oldStored.data(), oldSize, -1);
-        }
-        if (status == kOk) {
-            status = Insert(key, stored);
-            --counts_.inserted;
-            counts_.replaced += 1;
-        }
-        return status;
     }
 
     ImageVolume* volume_ = nullptr;

@@ -1,52 +1,34 @@
 // Operations of scripts that change records.
 #include <fmt/format.h>
 
-#include "hfs/records/record_fields.h"
+#include "hfs/records/stored_records.h"
 #include "hfs/records/text_format.h"
-#include "hfs/treehfs/bytes.h"
 #include "tool/script_run.h"
 
 namespace VELK::tool {
 namespace {
 
-// Bytes of the record the tree's own path stands on; false when it stands on none.
-bool StoredHere(CBTreeHfs* tree, const HfsFindData& path, std::vector<u8>* stored) {
-    const HfsFindLevel& leaf = path.path[1];
-    if (!path.valid || path.level != 1 || leaf.node == nullptr || leaf.index < 0) {
-        return false;
+// Data of the record the tree's own path stands on; false when it stands on none.
+bool StoredHere(const CBTreeHfs* tree, std::vector<u8>* stored) {
+    StoredRecord record;
+    const bool isThere = tree->findData.valid && ReadStored(*tree, tree->findData, &record) == kOk;
+    if (isThere) {
+        *stored = std::move(record.data);
     }
-    const NodeBytes bytes(&tree->header, leaf.node);
-    if (static_cast<u32>(leaf.index) >= bytes.U16(kDescNumRecords)) {
-        return false;
-    }
-    NodeKey record{};
-    if (leaf.node->GetKey(&tree->header, leaf.index, &record) != kOk || record.data == nullptr) {
-        return false;
-    }
-    stored->resize(record.dataSize);
-    bytes.CopyOut(stored->data(), record.offset + record.size - record.dataSize, record.dataSize);
-    return true;
+    return isThere;
 }
 
-// The data of the record with this key, by a path of its own.
-bool StoredAt(CBTreeHfs* tree, const SearchKey& key, std::vector<u8>* stored) {
-    HfsFindData path;
-    bool found = false;
-    const int status =
-        tree->FindEntry(key.Key(), key.id, &path, &found, nullptr, nullptr, nullptr, nullptr);
-    const bool isThere = status == kOk && found && StoredHere(tree, path, stored);
-    path.ClearPath();
+// The same of the record with this key; the tree goes on standing where it stands.
+bool StoredAt(ImageVolume* volume, u32 fileId, const SearchKey& key, std::vector<u8>* stored) {
+    StoredRecord record;
+    const bool isThere = FindStored(volume, fileId, key, &record) == kOk;
+    if (isThere) {
+        *stored = std::move(record.data);
+    }
     return isThere;
 }
 
 }  // namespace
-
-void CountRecord(ImageVolume* volume, const u8* stored, u32 size, int change) {
-    const u32 idOffset = 8;
-    if (size >= idOffset + 4) {
-        volume->CountCatalogRecord(GetBe16(stored), GetBe32(stored + idOffset), change);
-    }
-}
 
 // Data as it is to be stored; `same` is what the record holds now.
 int ScriptRunner::TakeData(CBTreeHfs* tree, std::string_view word, const SearchKey* key,
@@ -60,7 +42,7 @@ int ScriptRunner::TakeData(CBTreeHfs* tree, std::string_view word, const SearchK
         return kOk;
     }
     const bool isThere =
-        key != nullptr ? StoredAt(tree, *key, stored) : StoredHere(tree, tree->findData, stored);
+        key != nullptr ? StoredAt(volume_, fileId_, *key, stored) : StoredHere(tree, stored);
     return isThere ? kOk : kErrNotFound;
 }
 
@@ -77,30 +59,19 @@ void ScriptRunner::ExplainInsert(CBTreeHfs* tree, int status, u32 size) {
 ScriptRunner::Outcome ScriptRunner::InsertRecord(CBTreeHfs* tree, const SearchKey& key,
                                                  const std::vector<u8>& stored) {
     const u32 size = static_cast<u32>(stored.size());
-    // The engine pads odd data; one byte more lets it read a whole word.
-    std::vector<u8> host(stored.size() + 2);
-    if (size != 0) {
-        tree->convert.DataToMemory(host.data(), stored.data(), size);
-    }
     Outcome outcome;
-    outcome.status = tree->InsertRecord(key.Key(), key.id, host.data(), size);
+    outcome.status = tree->InsertRecord(key.Key(), key.id, HostData(*tree, stored).data(), size);
     if (outcome.status != kOk) {
         ExplainInsert(tree, outcome.status, key.size + size);
         Settle(&outcome);
         return outcome;
     }
-    if (fileId_ == kCatalogFileId) {
-        CountRecord(volume_, stored.data(), size, 1);
-    }
+    CountStored(volume_, fileId_, stored, 1);
     // A split may have moved the record since the engine placed it, so look where it is.
-    HfsFindData path;
-    bool found = false;
-    if (tree->FindEntry(key.Key(), key.id, &path, &found, nullptr, nullptr, nullptr, nullptr) ==
-            kOk &&
-        found) {
-        outcome.fields = fmt::format(" at={}/{}", path.path[1].node->nodeNum, path.path[1].index);
+    StoredRecord placed;
+    if (FindStored(volume_, fileId_, key, &placed) == kOk) {
+        outcome.fields = fmt::format(" at={}/{}", placed.node, placed.index);
     }
-    path.ClearPath();
     return outcome;
 }
 
@@ -131,7 +102,7 @@ ScriptRunner::Outcome ScriptRunner::Update(const std::string_view* words, u32 co
     }
     std::vector<u8> present;
     std::vector<u8> stored;
-    const bool isThere = StoredHere(tree, tree->findData, &present);
+    const bool isThere = StoredHere(tree, &present);
     const int status = TakeData(tree, words[count - 1], nullptr, &stored);
     if (status != kOk) {
         return {status, {}};
@@ -141,14 +112,10 @@ ScriptRunner::Outcome ScriptRunner::Update(const std::string_view* words, u32 co
                            stored.size()));
         return {kErrInvalid, fmt::format(" holds={} given={}", present.size(), stored.size())};
     }
-    std::vector<u8> host(stored.size() + 2);
-    if (!stored.empty()) {
-        tree->convert.DataToMemory(host.data(), stored.data(), static_cast<u32>(stored.size()));
-    }
     Outcome outcome;
     // Without a position the engine is asked all the same: it is its answer that counts. It reads
     // no more than the record has, which is then nothing.
-    outcome.status = tree->UpdateKeyAndRecord(nullptr, host.data());
+    outcome.status = tree->UpdateKeyAndRecord(nullptr, HostData(*tree, stored).data());
     Settle(&outcome);
     return outcome;
 }
@@ -165,14 +132,13 @@ ScriptRunner::Outcome ScriptRunner::Delete(const std::string_view* words, u32 co
         }
     }
     if (fileId_ == kCatalogFileId) {
-        isThere =
-            count != 0 ? StoredAt(tree, key, &stored) : StoredHere(tree, tree->findData, &stored);
+        isThere = count != 0 ? StoredAt(volume_, fileId_, key, &stored) : StoredHere(tree, &stored);
     }
     Outcome outcome;
     outcome.status = count != 0 ? tree->DeleteRecord(key.Key(), key.id, false)
                                 : tree->DeleteRecord(nullptr, 0, true);
     if (outcome.status == kOk && isThere) {
-        CountRecord(volume_, stored.data(), static_cast<u32>(stored.size()), -1);
+        CountStored(volume_, fileId_, stored, -1);
     }
     Settle(&outcome);
     return outcome;

@@ -181,6 +181,7 @@ ScriptRunner::Outcome ScriptRunner::Execute(ScriptOp op, const std::string_view*
     if (NeedsRoom(op) && volume_->IsCommitDue()) {
         const KeptPositions positions(volume_);
         Outcome kept = KeepAll(0);
+        hasLost_ = hasLost_ || kept.status != kOk;
         if (kept.status == kOk) {
             kept.status = positions.PutBack();
         }

@@ -15,6 +15,7 @@
 #include "hfs/records/record_text.h"
 #include "hfs/volume/image_volume.h"
 #include "tool/engine_log.h"
+#include "tool/errors.h"
 #include "tool/fault_shim.h"
 #include "tool/output.h"
 #include "tool/record_digest.h"
@@ -41,8 +42,11 @@ public:
 
     // The last line: "split.tr: 8 operations, 7 ok, 1 exists (expected), 0 unexpected".
     void PrintSummary(const std::string& name);
-    // 0, or 1 when an `expect` failed or the run was stopped by a status.
-    int ExitCode() const { return failedExpects_ != 0 || wasStopped_ ? 1 : 0; }
+    // 8 when changes were lost that no line had asked to keep yet, else 1 when an `expect` failed
+    // or the run was stopped by a status, else 0.
+    int ExitCode() const {
+        return hasLost_ ? kExitFailed : failedExpects_ != 0 || wasStopped_ ? kExitNo : kExitDone;
+    }
     u32 FileId() const { return fileId_; }
     // Ends what the script left open, so that the volume can be committed.
     void EndReservations();
@@ -148,15 +152,13 @@ private:
     u64 failedExpects_ = 0;
     u64 remarks_ = 0;
     bool wasStopped_ = false;
+    bool hasLost_ = false;  // a commit between the lines failed
 
     std::vector<u8> record_;  // the delivered one, host order
     u32 recordSize_ = 0;
     alignas(8) u8 key_[kKeyLengthSize + kMaxKeyLength + 6] = {};  // the delivered one
     u32 keySize_ = 0;
 };
-
-// Where a catalog record counts in the volume's header.
-void CountRecord(ImageVolume* volume, const u8* stored, u32 size, int change);
 
 // A tree file as it stands in memory, changes that no flush has seen included: what a checker
 // reads. 0, or the status of a failed read.

@@ -126,20 +126,27 @@ sound(copy)
 # Changes that go on from a position, with nothing between them that names its place: the tree goes on
 # standing where it stood, as it does where nothing is kept in between.
 steps = script("steps.tr", "seek first\nnext 8\nrepeat 500\nupdate file{id:$i}\nnext\nend\n"
-                           "repeat 150\ndelete\nhere\nend\nprev 3\nhere\npos\n")
+                           "pos\nrepeat 150\nfind 2:\"name $i\"\ndelete\nend\nseek last\n")
 shutil.copy(folder / image, folder / "steps.img")
 in_memory, _ = run("apply", "steps.img", steps, "--save", "saved.img")
-checks.equal(in_memory.count(" delete 00000000 ok"), 150, "deletions by position: " + in_memory)
+checks.equal(in_memory.count(" 00000000 ok"), 1304, "steps in memory: " + in_memory)
 written, _ = run("apply", "steps.img", steps, "--write")
-checks.equal(written, in_memory, "steps through a small journal")
-checks.equal(run("export", "steps.img"), run("export", "saved.img"), "records after steps")
+checks.check(written == in_memory, "steps through a small journal: " + written)
+checks.check(run("export", "steps.img") == run("export", "saved.img"), "records after steps")
 sound("steps.img")
 
 # A single change that no commit can make smaller: nothing of it is kept.
 volume("whole.img", "--node-size", "32K", "--journal", "64K")
-_, err = run("apply", "whole.img", some, "--write", code=8)
+out, err = run("apply", "whole.img", some, "--write", code=8)
+checks.check(re.search(r"^3 insert \w+ journal-full restored=yes$", out, re.M), "too large: " + out)
+checks.check(re.search(r"^line 3: insert: the changes could not be kept: the changes take [\d,]+ bytes "
+                       r"of the journal, which holds 64,512: commit more often$", err, re.M),
+             "too large in between: " + err)
+checks.equal(names_in("whole.img"), [], "names after changes too large")
+one = script("one.tr", INSERTS % 1)
+_, err = run("apply", "whole.img", one, "--write", code=8)
 checks.check(re.search(r"^treehfs: whole\.img: the last changes could not be kept: the changes "
-                       r"take [\d,]+ bytes of the journal, which holds 65,024: commit more often$",
+                       r"take [\d,]+ bytes of the journal, which holds 64,512: commit more often$",
                        err, re.M), "too large: " + err)
 checks.equal(names_in("whole.img"), [], "names after a transaction too large")
 checks.check(is_clean("whole.img"), "clean after a transaction too large")

@@ -18,30 +18,13 @@ int OpenTree(ImageVolume* volume, u32 fileId, CBTreeHfs** tree) {
     return problem.status != kOk ? problem.status : kErrVolumeNoTree;
 }
 
-// Type and ID of a catalog record, as far as it has them.
-void CountCatalog(ImageVolume* volume, u32 fileId, const std::vector<u8>& data, int change) {
-    constexpr u32 kIdOffset = 8;
-    if (fileId == kCatalogFileId && data.size() >= kIdOffset + 4) {
-        volume->CountCatalogRecord(GetBe16(data.data()), GetBe32(data.data() + kIdOffset), change);
-    }
-}
-
-// Data in host order; the engine pads odd data, and one byte more lets it read a whole word.
-std::vector<u8> HostData(const CBTreeHfs& tree, const std::vector<u8>& data) {
-    std::vector<u8> host(data.size() + 2);
-    if (!data.empty()) {
-        tree.convert.DataToMemory(host.data(), data.data(), static_cast<unsigned>(data.size()));
-    }
-    return host;
-}
-
 int Insert(ImageVolume* volume, CBTreeHfs* tree, const SearchKey& key,
            const std::vector<u8>& data) {
     const std::vector<u8> host = HostData(*tree, data);
     const int status =
         tree->InsertRecord(key.Key(), key.id, host.data(), static_cast<unsigned>(data.size()));
     if (status == kOk) {
-        CountCatalog(volume, tree->fileId, data, 1);
+        CountStored(volume, tree->fileId, data, 1);
     }
     return status;
 }
@@ -51,7 +34,7 @@ int Delete(ImageVolume* volume, CBTreeHfs* tree, const SearchKey& key,
            const std::vector<u8>& before) {
     const int status = tree->DeleteRecord(key.Key(), key.id, false);
     if (status == kOk) {
-        CountCatalog(volume, tree->fileId, before, -1);
+        CountStored(volume, tree->fileId, before, -1);
     }
     return status;
 }
@@ -131,6 +114,22 @@ int ReadStored(const CBTreeHfs& tree, const HfsFindData& path, StoredRecord* rec
     }
     record->id = key.id;
     return kOk;
+}
+
+// Type and ID of a catalog record, as far as it has them.
+void CountStored(ImageVolume* volume, u32 fileId, const std::vector<u8>& data, int change) {
+    constexpr u32 kIdOffset = 8;
+    if (fileId == kCatalogFileId && data.size() >= kIdOffset + 4) {
+        volume->CountCatalogRecord(GetBe16(data.data()), GetBe32(data.data() + kIdOffset), change);
+    }
+}
+
+std::vector<u8> HostData(const CBTreeHfs& tree, const std::vector<u8>& data) {
+    std::vector<u8> host(data.size() + 2);
+    if (!data.empty()) {
+        tree.convert.DataToMemory(host.data(), data.data(), static_cast<unsigned>(data.size()));
+    }
+    return host;
 }
 
 std::string KeyText(u32 fileId, const StoredRecord& record) {

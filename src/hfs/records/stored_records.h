@@ -22,6 +22,12 @@ struct StoredRecord {
 
 // Copies the record that a path stands on: kErrNotFound when it stands on none.
 int ReadStored(const CBTreeHfs& tree, const HfsFindData& path, StoredRecord* record);
+// Data as the engine takes it, in host order. The engine pads odd data, and one byte more lets it
+// read a whole word.
+std::vector<u8> HostData(const CBTreeHfs& tree, const std::vector<u8>& data);
+// Keeps the volume's counts of files and folders in step with a record that was put in (`change` 1)
+// or taken out (-1).
+void CountStored(ImageVolume* volume, u32 fileId, const std::vector<u8>& data, int change);
 // The key as text, as in `2:"alpha"`.
 std::string KeyText(u32 fileId, const StoredRecord& record);
 
