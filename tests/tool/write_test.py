@@ -123,8 +123,8 @@ out, _ = run("import", copy, "records.jsonl", "--write")
 checks.check("digest equals the source" in out, "import through a small journal: " + out)
 sound(copy)
 
-# Changes that go on from a position, with nothing between them that names its place: the tree goes on
-# standing where it stood, as it does where nothing is kept in between.
+# Changes that go on from a position, with nothing between them that names its place: the tree goes
+# on standing where it stood, as it does where nothing is kept in between.
 steps = script("steps.tr", "seek first\nnext 8\nrepeat 500\nupdate file{id:$i}\nnext\nend\n"
                            "pos\nrepeat 150\nfind 2:\"name $i\"\ndelete\nend\nseek last\n")
 shutil.copy(folder / image, folder / "steps.img")
@@ -139,8 +139,8 @@ sound("steps.img")
 volume("whole.img", "--node-size", "32K", "--journal", "64K")
 out, err = run("apply", "whole.img", some, "--write", code=8)
 checks.check(re.search(r"^3 insert \w+ journal-full restored=yes$", out, re.M), "too large: " + out)
-checks.check(re.search(r"^line 3: insert: the changes could not be kept: the changes take [\d,]+ bytes "
-                       r"of the journal, which holds 64,512: commit more often$", err, re.M),
+checks.check(re.search(r"^line 3: insert: the changes could not be kept: the changes take [\d,]+ "
+                       r"bytes of the journal, which holds 64,512: commit more often$", err, re.M),
              "too large in between: " + err)
 checks.equal(names_in("whole.img"), [], "names after changes too large")
 one = script("one.tr", INSERTS % 1)
