@@ -19,12 +19,18 @@ constexpr u32 kMagic = 0x53564C31;
 constexpr u32 kSizeBlock = SafeVolume::kLogBlocks;
 constexpr u32 kTreeBlock = kSizeBlock + 1;
 
-// Begins the log; the numbers of the blocks follow, then the blocks. The checksum covers all of it,
-// so a log that the power cut in the middle does not count.
+// Begins the log; entries follow. The checksum covers all of them, so a log that the power cut in
+// the middle does not count.
 struct LogHead {
     u32 magic;
     u32 count;
     u64 checksum;
+};
+
+// A block with its number in the file.
+struct LogEntry {
+    u32 number;
+    std::array<u8, SafeVolume::kBlock> bytes;
 };
 
 u64 Checksum(const std::vector<u8>& bytes) {
@@ -91,7 +97,11 @@ int SafeVolume::Commit(CBTreeHfs* tree) {
         status = done ? kOk : kIo;
     }
     if (status != kOk) {
-        Abort(tree);
+        // When a write has failed, some blocks may be in their places and others not. What was
+        // staged stays in front of them, so that what is read goes on agreeing with itself.
+        if (!hasFailed_) {
+            Abort(tree);
+        }
         return status;
     }
     staged_.clear();
@@ -133,11 +143,9 @@ bool SafeVolume::Sync() {
 bool SafeVolume::WriteLog(const Blocks& blocks) {
     std::vector<u8> log(sizeof(LogHead));
     for (const auto& [number, block] : blocks) {
-        const u8* bytes = reinterpret_cast<const u8*>(&number);
-        log.insert(log.end(), bytes, bytes + sizeof number);
-    }
-    for (const auto& [number, block] : blocks) {
-        log.insert(log.end(), block.begin(), block.end());
+        const LogEntry entry = {number, block};
+        const u8* bytes = reinterpret_cast<const u8*>(&entry);
+        log.insert(log.end(), bytes, bytes + sizeof entry);
     }
     const LogHead head = {kMagic, static_cast<u32>(blocks.size()), Checksum(log)};
     std::memcpy(log.data(), &head, sizeof head);
@@ -154,7 +162,7 @@ bool SafeVolume::ReadLog(Blocks* blocks) {
         return false;
     }
     std::memcpy(&head, log.data(), sizeof head);
-    const u64 size = sizeof head + u64{head.count} * (sizeof(u32) + kBlock);
+    const u64 size = sizeof head + u64{head.count} * sizeof(LogEntry);
     if (head.magic != kMagic || size > log.size()) {
         return false;
     }
@@ -162,11 +170,10 @@ bool SafeVolume::ReadLog(Blocks* blocks) {
     if (head.checksum != Checksum(log)) {
         return false;
     }
-    for (u32 i = 0; i < head.count; ++i) {
-        u32 number;
-        std::memcpy(&number, &log[sizeof head + i * sizeof number], sizeof number);
-        std::memcpy((*blocks)[number].data(),
-                    &log[sizeof head + head.count * sizeof number + u64{i} * kBlock], kBlock);
+    for (u64 at = sizeof head; at < size; at += sizeof(LogEntry)) {
+        LogEntry entry;
+        std::memcpy(&entry, &log[at], sizeof entry);
+        (*blocks)[entry.number] = entry.bytes;
     }
     return true;
 }
@@ -180,6 +187,16 @@ bool SafeVolume::WriteHome(const Blocks& blocks) {
     return true;
 }
 
+// A block as the tree last handed it over, committed or not.
+bool SafeVolume::Get(u32 block, u8* target) {
+    const auto staged = staged_.find(block);
+    if (staged == staged_.end()) {
+        return Read(block, target, 1);
+    }
+    std::memcpy(target, staged->second.data(), kBlock);
+    return true;
+}
+
 int SafeVolume::Map(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u32 fileId,
                     u64 byteOffset, u32 bytes, bool noRead, HfsBcbBuf* bufs) {
     auto* volume = static_cast<SafeVolume*>(self);
@@ -188,24 +205,21 @@ int SafeVolume::Map(void* self, CFileSystemHfs* fs, HfsRuns*, HfsFork*, u8, u32 
     }
     for (u32 i = 0; i < bytes / kBlock; ++i) {
         auto* bh = static_cast<buffer_head*>(velk_heap_alloc(sizeof(buffer_head)));
-        if (bh != nullptr) {
-            bh->number = kTreeBlock + static_cast<u32>(byteOffset / kBlock) + i;
-            const auto staged = volume->staged_.find(bh->number);
-            volume->lentBlocks += 1;
-            bufs[i] = {bh, bh->bytes, bufs[i].dirty};
-            if (staged != volume->staged_.end()) {
-                std::memcpy(bh->bytes, staged->second.data(), kBlock);
-                continue;
+        const u32 number = kTreeBlock + static_cast<u32>(byteOffset / kBlock) + i;
+        const int status = bh == nullptr                              ? kErrNoMemory
+                           : noRead || volume->Get(number, bh->bytes) ? kOk
+                                                                      : kIo;
+        if (status != kOk) {
+            velk_heap_free(bh);
+            while (i > 0) {  // all or nothing
+                Release(self, bufs[--i].bh, 0);
+                bufs[i] = {nullptr, nullptr, bufs[i].dirty};
             }
-            if (noRead || volume->Read(bh->number, bh->bytes, 1)) {
-                continue;
-            }
+            return status;
         }
-        for (u32 k = bh != nullptr ? i + 1 : i; k > 0; --k) {  // all or nothing
-            Release(self, bufs[k - 1].bh, 0);
-            bufs[k - 1] = {nullptr, nullptr, bufs[k - 1].dirty};
-        }
-        return bh != nullptr ? kIo : kErrNoMemory;
+        bh->number = number;
+        bufs[i] = {bh, bh->bytes, bufs[i].dirty};
+        volume->lentBlocks += 1;
     }
     return kOk;
 }

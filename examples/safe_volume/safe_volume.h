@@ -26,8 +26,9 @@ public:
 
     bool IsOpen() const { return file_ >= 0; }
     bool IsNew() const { return fs.attributesFork.logicalSize == 0; }
-    // Everything the tree has changed is on the medium when this returns 0; on failure the tree
-    // and the medium are as the last commit left them.
+    // Everything the tree has changed is on the medium when this returns 0. On failure the tree and
+    // the medium are as the last commit left them; or, when the medium itself failed, nothing is
+    // written any more, and who opens the file next finds that commit or this one.
     int Commit(VELK::CBTreeHfs* tree);
     // Back to the last commit, after an operation that failed.
     void Abort(VELK::CBTreeHfs* tree);
@@ -50,6 +51,7 @@ private:
     static void Release(void* self, VELK::buffer_head* bh, int flag);
     static void Modify(void*, VELK::buffer_head*) {}
 
+    bool Get(VELK::u32 block, VELK::u8* target);
     bool Read(VELK::u32 block, void* target, unsigned blocks);
     bool Write(VELK::u32 block, const void* source, unsigned blocks);
     bool Sync();
