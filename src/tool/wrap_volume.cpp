@@ -2,6 +2,7 @@
 #include "tool/wrap_volume.h"
 
 #include <cstring>
+#include <string_view>
 #include <vector>
 
 #include "hfs/treehfs/bytes.h"
@@ -39,6 +40,11 @@ void PutLe32(u8* bytes, u32 value) {
     }
 }
 
+// The characters alone, without a zero behind them.
+void PutText(u8* bytes, std::string_view text) {
+    text.copy(reinterpret_cast<char*>(bytes), text.size());
+}
+
 void PutLe64(u8* bytes, u64 value) {
     PutLe32(bytes, static_cast<u32>(value));
     PutLe32(bytes + 4, static_cast<u32>(value >> 32));
@@ -68,7 +74,7 @@ u64 SectorsOf(u64 volumeBytes) {
 }
 
 void ApmEntry(u8* entry, u32 start, u32 count, const char* name, const char* type) {
-    std::memcpy(entry, "PM", 2);
+    PutText(entry, "PM");
     PutBe32(entry + 4, 2);  // entries in the map
     PutBe32(entry + 8, start);
     PutBe32(entry + 12, count);
@@ -80,7 +86,7 @@ void ApmEntry(u8* entry, u32 start, u32 count, const char* name, const char* typ
 
 IoResult WriteApm(BlockDevice* image, const WrappedVolume& volume) {
     u8 map[3 * kSector] = {};
-    std::memcpy(map, "ER", 2);
+    PutText(map, "ER");
     PutBe16(map + 2, kSector);
     PutBe32(map + 4, static_cast<u32>(image->Size() / kSector));
     ApmEntry(map + kSector, 1, kFirstSector - 1, "Apple", "Apple_partition_map");
@@ -102,7 +108,7 @@ void ProtectiveMbr(u8* sector, u64 sectors) {
 }
 
 void GptHeader(u8* header, u64 own, u64 other, u64 table, u64 sectors, u64 uuid, u32 tableCrc) {
-    std::memcpy(header, "EFI PART", 8);
+    PutText(header, "EFI PART");
     PutLe32(header + 8, kGptRevision);
     PutLe32(header + 12, kGptHeaderSize);
     PutLe64(header + 24, own);
