@@ -15,6 +15,7 @@ cd "$(dirname "${BASH_SOURCE[0]}")/.."
 project=$PWD
 work=$project/build/fresh
 root=$work/root
+second=$work/packages-root
 base=$work/base.tar
 suite=bookworm
 
@@ -91,6 +92,7 @@ timed() {
 # Runs what a user of the packages would, in a root that was not there when they were built.
 try_packages() {
     local made=$1/build/package
+    local root=$second  # for new_root and inside; the project's root stays
     [ -n "$(find "$made" -name '*.deb' 2>/dev/null)" ] || die "no packages: ./dev package makes them"
     say "another bare root, for the packages"
     rm -rf "$work/packages"
@@ -100,10 +102,11 @@ try_packages() {
     mkdir -p "$root/srv/treehfs"
     cp "$work"/packages/*.deb tools/try_packages.sh "$root/srv/treehfs/"
     timed ./try_packages.sh
+    [ -n "${FRESH_KEEP:-}" ] || rm -rf --one-file-system "$second"
 }
 
 clear_up() {
-    [ -n "${FRESH_KEEP:-}" ] || rm -rf --one-file-system "$root"
+    [ -n "${FRESH_KEEP:-}" ] || rm -rf --one-file-system "$root" "$second"
 }
 
 mkdir -p "$work"
