@@ -327,14 +327,13 @@ int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNo
     return status;
 }
 
+namespace {
+
 u32 LinkOn(const HfsNode* node, Side side) {
     return side == Side::kRight ? FLink(node) : BLink(node);
 }
 
-HfsNode* KnownSibling(const CBTreeHfs* tree, const HfsNode* node, u32 nodeNum) {
-    const HintPlace hint = FindHint(tree, node->hintedBy, nodeNum);
-    return hint && hint.Node() != node ? hint.Node() : nullptr;
-}
+}  // namespace
 
 void Introduce(CBTreeHfs* tree, const HfsNode* node, HfsNode* fresh) {
     if (node->hintedBy != nullptr) {
@@ -342,14 +341,21 @@ void Introduce(CBTreeHfs* tree, const HfsNode* node, HfsNode* fresh) {
     }
 }
 
-int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out) {
-    const u32 nodeNum = LinkOn(node, side);
-    HfsNode* known = KnownSibling(tree, node, nodeNum);
-    if (known != nullptr) {
-        TakeCached(tree, known, out);
+int FetchBeside(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, HfsNode** out) {
+    const HintPlace hint = FindHint(tree, parent, nodeNum);
+    if (hint) {
+        TakeHinted(tree, hint.Node(), hint.Data(), NodeUse::kRead, out);
         return kOk;
     }
-    return FetchNode(tree, nodeNum, NodeUse::kRead, out);
+    const int status = FetchNode(tree, nodeNum, NodeUse::kRead, out);
+    if (status == kOk && parent != nullptr && (*out)->hintedBy == nullptr) {
+        SetHint(tree, parent, *out);
+    }
+    return status;
+}
+
+int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out) {
+    return FetchBeside(tree, node->hintedBy, LinkOn(node, side), out);
 }
 
 void PrefetchSibling(const CBTreeHfs* tree, const HfsNode* node, Side side) {

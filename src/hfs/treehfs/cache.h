@@ -48,17 +48,16 @@ int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNo
 // Neighbours in the chain of a level.
 enum class Side { kLeft, kRight };
 
-// The number `node` links to on one side; 0: none.
-u32 LinkOn(const HfsNode* node, Side side);
-// The neighbour with number `nodeNum` as the parent of `node` knows it; null: it does not. A parent
-// is known only if a request for `node` came through it. What is known is only a way round the
-// search by number: the links on disk decide. Never `node` itself, which the caller may give up.
-HfsNode* KnownSibling(const CBTreeHfs* tree, const HfsNode* node, u32 nodeNum);
+// The parent that leads to `node` by a hint leads to its neighbours as well, as far as it can: that
+// is only a way round the search by number, and a hint at a child of another node does no harm.
+
 // Lets the parent of `node` know the new neighbour `fresh`.
 void Introduce(CBTreeHfs* tree, const HfsNode* node, HfsNode* fresh);
+// GetINode of a neighbour of a child of `parent` (null: nobody), which may have another parent.
+int FetchBeside(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, HfsNode** out);
 // GetINode of the node that `node` links to on one side. REQUIRES: there is such a link.
 int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out);
-// Asks for the memory of the neighbour of `node`, if it is known.
+// Asks for the memory of the neighbour of `node`, if a hint leads there.
 void PrefetchSibling(const CBTreeHfs* tree, const HfsNode* node, Side side);
 
 // Links `node` into the tree of cached nodes by its number. False: the number is there already.

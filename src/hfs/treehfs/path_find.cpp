@@ -41,11 +41,10 @@ int CheckPlace(const HfsNode* node, int level) {
 }
 
 // Brings a node by the shortest way there is.
-int FetchForLevel(CBTreeHfs* tree, u32 nodeNum, HfsNode* parent, HfsNode* known, NodeUse use,
+int FetchForLevel(CBTreeHfs* tree, u32 nodeNum, HfsNode* parent, bool isBeside, NodeUse use,
                   HfsNode** out) {
-    if (known != nullptr) {
-        TakeCached(tree, known, out);
-        return kOk;
+    if (isBeside) {
+        return FetchBeside(tree, parent, nodeNum, out);
     }
     if (parent != nullptr) {
         return FetchChild(tree, parent, nodeNum, use, out);
@@ -185,14 +184,14 @@ int CheckLevel(int level) {
 }
 
 int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, HfsNode* parent, HfsFindData* path,
-              HfsNode* known) {
+              bool isBeside) {
     HfsFindLevel* entry = &path->path[level];
     entry->index = 0;
     ReleaseNode(entry->node);
     entry->node = nullptr;
     const u32 readBefore = tree->readCount;
     const NodeUse use = level > 1 ? NodeUse::kReadIndex : NodeUse::kRead;
-    HFS_TRY(FetchForLevel(tree, nodeNum, parent, known, use, &entry->node), 2909);
+    HFS_TRY(FetchForLevel(tree, nodeNum, parent, isBeside, use, &entry->node), 2909);
     const int status = CheckPlace(entry->node, level);
     if (HFS_UNLIKELY(status != kOk && nodeNum >= tree->validNodes &&
                      tree->readCount != readBefore)) {

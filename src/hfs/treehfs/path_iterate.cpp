@@ -28,10 +28,10 @@ void LeaveLeaf(CBTreeHfs* tree, HfsFindData* path) {
 
 // Steps from the current leaf to node `sibling` on one side; the index becomes 0.
 int EnterLeaf(CBTreeHfs* tree, u32 sibling, Side side, HfsFindData* path) {
-    HfsNode* known = KnownSibling(tree, path->path[1].node, sibling);
+    HfsNode* parent = path->path[1].node->hintedBy;
     LeaveLeaf(tree, path);
     path->leadsAsOf = 0;
-    const int status = LoadLevel(tree, 1, sibling, nullptr, path, known);
+    const int status = LoadLevel(tree, 1, sibling, parent, path, true);
     if (status == kOk) {
         PrefetchSibling(tree, path->path[1].node, side);  // the one after
     }
