@@ -233,5 +233,19 @@ TEST(TransactionTest, CarriesExactlyTheChangedSectors) {
     EXPECT_EQ(512u + 5632u, transaction.BytesWritten());
 }
 
+TEST(Texts, HaveAnyLength) {
+    const std::string longText(5000, 'x');
+    EXPECT_EQ(longText + " 7", Format("%s %d", longText.c_str(), 7));
+    EXPECT_EQ("", Format("%s", ""));
+}
+
+TEST(Texts, EachErrorOfADeviceHasOne) {
+    EXPECT_EQ("past the end", IoErrorText(kIoPastEnd));
+    EXPECT_EQ("device is read-only", IoErrorText(kIoReadOnly));
+    EXPECT_EQ("out of memory", IoErrorText(kIoNoMemory));
+    EXPECT_EQ("more changes than the journal holds", IoErrorText(kIoTooLarge));
+    EXPECT_EQ("Input/output error", IoErrorText(EIO));
+}
+
 }  // namespace
 }  // namespace VELK
