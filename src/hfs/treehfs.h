@@ -71,6 +71,7 @@ struct HfsNode;
 // stand beside the red-black tree of cached nodes, never instead of it. One line of a processor's
 // cache.
 struct HfsHintSet {
+    // Children that one set leads to.
     static constexpr u32 kPlaces = 3;
     u32 nodeNum[kPlaces];     // the children's numbers
     u32 next;                 // place to give up when one more child comes

@@ -1,6 +1,8 @@
 // Every sample volume opened: place, header facts and the headers of its trees.
 #include <gtest/gtest.h>
 
+#include <ostream>
+
 #include "hfs/volume/image_volume.h"
 #include "samples.h"
 
@@ -28,6 +30,10 @@ struct Sample {
     u32 files;
     u32 folders;
 };
+
+void PrintTo(const Sample& sample, std::ostream* out) {
+    *out << sample.name;
+}
 
 constexpr TreeFacts kNone = {0, 0, 0, 0, 0};
 
