@@ -72,7 +72,8 @@ new_root() {
 inside() {
     # shellcheck disable=SC2016  # expanded by the inner shell
     unshare --mount --pid --fork bash -c '
-        mount -t proc proc "$1/proc" && mount --rbind /dev "$1/dev" && root=$1 && shift &&
+        mount -t proc proc "$1/proc" && mount --rbind /dev "$1/dev" &&
+        mount --rbind /sys "$1/sys" && root=$1 && shift &&
         exec chroot "$root" /usr/bin/env -i HOME=/srv LANG=C.UTF-8 \
             PATH=/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin \
             bash -c "cd /srv/treehfs && exec \"\$@\"" bash "$@"' fresh "$root" "$@" </dev/null

@@ -4,6 +4,7 @@ so that self_test.py can run it over small trees made to fail."""
 
 import pathlib
 import re
+import shutil
 import subprocess
 import sys
 
@@ -23,13 +24,21 @@ def files(root, folders, patterns):
     return sorted({f for f in found if not SKIPPED_FOLDERS & set(f.relative_to(root).parts)})
 
 
+def listed_by_git(root):
+    """What git tracks or would track; None where the sources are no repository of it, or it is not
+    installed."""
+    if not (root / ".git").exists() or shutil.which("git") is None:
+        return None
+    listed = subprocess.run(["git", "-C", str(root), "ls-files", "-co", "--exclude-standard"],
+                            capture_output=True, text=True, check=False)
+    return listed.stdout.splitlines() if listed.returncode == 0 else None
+
+
 def text_files(root):
-    """Every file that belongs to the project: what git tracks or would track, else all there is."""
-    listed = subprocess.run(
-        ["git", "-C", str(root), "ls-files", "-co", "--exclude-standard"],
-        capture_output=True, text=True, check=False)
-    if listed.returncode == 0 and (root / ".git").exists():
-        names = [root / name for name in listed.stdout.splitlines()]
+    """Every file that belongs to the project: what git knows of, else all there is."""
+    known = listed_by_git(root)
+    if known is not None:
+        names = [root / name for name in known]
     else:
         names = [f for f in root.glob("**/*")
                  if not SKIPPED_FOLDERS & set(f.relative_to(root).parts)]

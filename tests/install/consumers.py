@@ -41,7 +41,7 @@ class Step:
             sys.exit(f"{' '.join(map(str, command))}: '{have}', wanted '{text}'")
 
     def configure(self, way, folder, target="all"):
-        self.run("cmake", "-S", HERE / "consumer", "-B", folder, f"-DWAY={way}",
+        self.run("cmake", "-G", "Ninja", "-S", HERE / "consumer", "-B", folder, f"-DWAY={way}",
                  f"-DTREEHFS_SOURCE={ROOT}", f"-DEXAMPLES={ROOT / 'examples'}",
                  f"-DCMAKE_C_COMPILER={self.cc}", f"-DCMAKE_CXX_COMPILER={self.cxx}",
                  f"-DCMAKE_PREFIX_PATH={self.prefix}", "-DCMAKE_BUILD_TYPE=",
