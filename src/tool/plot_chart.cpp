@@ -57,8 +57,9 @@ std::string PlotFill(const TreeSurvey& survey) {
                        fmt::format("Fill of the {} tree", ForkName(survey.fileId)),
                        SubtitleOf(survey));
     double top = SvgPicture::kTitleHeight + 30;
-    for (u32 level = levels; level >= 1; --level, top += kRow) {
+    for (u32 level = levels; level >= 1; --level) {
         DrawHistogram(&picture, top, level, counts[level]);
+        top += kRow;
     }
     return picture.Finish();
 }
