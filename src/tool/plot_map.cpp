@@ -84,9 +84,10 @@ std::string PlotMap(const TreeSurvey& survey) {
         const std::string tooltip =
             grid.perSquare == 1 ? TooltipOf(from, facts)
                                 : fmt::format("nodes {} to {}", Grouped(from), Grouped(to - 1));
-        picture.Box(SvgPicture::kMargin + square % grid.columns * grid.size,
-                    top + square / grid.columns * grid.size, grid.size - gap, grid.size - gap,
-                    StyleOf(facts), tooltip);
+        const auto column = square % grid.columns;
+        const auto row = square / grid.columns;
+        picture.Box(SvgPicture::kMargin + column * grid.size, top + row * grid.size,
+                    grid.size - gap, grid.size - gap, StyleOf(facts), tooltip);
     }
     return picture.Finish();
 }
