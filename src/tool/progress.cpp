@@ -7,6 +7,7 @@
 
 #include <algorithm>
 #include <atomic>
+#include <cmath>
 #include <csignal>
 #include <cstdio>
 
@@ -134,7 +135,7 @@ void Progress::Draw(double seconds) {
         line += fmt::format("  {}/s", ShortBytes(static_cast<u64>(rate)));
     }
     if (part > 0) {
-        const u64 left = static_cast<u64>(seconds / part - seconds + 0.5);
+        const u64 left = static_cast<u64>(std::lround(seconds / part - seconds));
         line += fmt::format("  {}:{:02} left", left / 60, left % 60);
     }
     line.resize(std::min(line.size(), LineWidth()));
