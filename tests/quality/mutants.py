@@ -100,7 +100,7 @@ def text_offset(library):
 
 class Tests:
     def __init__(self, library, commands, spare):
-        self.library = pathlib.Path(library).resolve()
+        self.binary = pathlib.Path(library).resolve()
         self.offset = text_offset(library)
         self.spare = spare
         self.commands = [shlex.split(command) for command in commands]
@@ -127,12 +127,12 @@ class Tests:
         return failed[1] if failed else f"status {done.returncode}"
 
     def prepare(self, folder, mutant):
-        code = bytearray(self.library.read_bytes())
+        code = bytearray(self.binary.read_bytes())
         if mutant is not None:
             at = mutant.address + self.offset
             assert code[at:at + len(mutant.old)] == mutant.old
             code[at:at + len(mutant.old)] = mutant.new
-        copy = pathlib.Path(folder, self.library.name)
+        copy = pathlib.Path(folder, self.binary.name)
         copy.write_bytes(code)
         copy.chmod(0o755)
 
@@ -188,7 +188,7 @@ def describe(mutant):
 def arguments():
     parser = argparse.ArgumentParser(description=__doc__,
                                      formatter_class=argparse.RawDescriptionHelpFormatter)
-    parser.add_argument("library")
+    parser.add_argument("binary", metavar="library")
     parser.add_argument("sources", help="folder: jumps of code from elsewhere are left alone")
     parser.add_argument("tests", nargs="+")
     parser.add_argument("--count", type=int, default=300, help="mutants to try; 0: all")
@@ -205,7 +205,7 @@ def arguments():
 
 def main():
     args = arguments()
-    mutants = population(args.library, args.sources)
+    mutants = population(args.binary, args.sources)
     if args.file:
         mutants = [mutant for mutant in mutants if pathlib.Path(mutant.file).name in args.file]
     if not mutants:
@@ -214,7 +214,7 @@ def main():
     count = min(args.count, len(mutants)) if args.count else len(mutants)
     sample = random.Random(args.seed).sample(mutants, count)
     excuses = Excuses(args.equivalent)
-    tests = Tests(args.library, args.tests, args.spare)
+    tests = Tests(args.binary, args.tests, args.spare)
     tests.measure()
     started = time.monotonic()
     killed = survived = equivalent = 0
