@@ -213,6 +213,68 @@ TEST(MakeVolume, RefusesWhatNoVolumeCanBe) {
     EXPECT_EQ("volume name of 256 units: 1 to 255 are possible", problem.Text());
 }
 
+// A name that fits a key, but not a node with another key beside it.
+TEST(MakeVolume, ANameThatNoNodeHolds) {
+    Problem problem;
+    FormatOptions options;
+    options.blockSize = 512;
+    options.catalogNodeSize = 512;
+    options.extentsNodeSize = 512;
+    options.name = std::u16string(255, u'n');
+    EXPECT_EQ(nullptr, MakeMemoryVolume(1 << 20, options, &problem));
+    EXPECT_EQ(
+        "catalog nodes of 512 bytes cannot hold the root folder: choose larger nodes or a shorter "
+        "name",
+        problem.Text());
+    EXPECT_EQ(ExitClass::kUsage, problem.exitClass);
+    options.catalogNodeSize = 4096;
+    EXPECT_NE(nullptr, MakeMemoryVolume(1 << 20, options, &problem)) << problem.Text();
+}
+
+TEST(MakeVolume, FewerBytesThanABlockAreTooSmall) {
+    Problem problem;
+    FormatOptions options;
+    options.blockSize = 65536;
+    EXPECT_EQ(nullptr, MakeMemoryVolume(32768, options, &problem));
+    EXPECT_EQ("a volume of 32,768 bytes is too small", problem.Text());
+}
+
+TEST(MakeVolume, TreesOfTheSizesAskedFor) {
+    Problem problem;
+    FormatOptions options;
+    options.catalogSize = 65536;
+    options.extentsSize = 32768;
+    options.attributesSize = 131072;
+    options.mapBlockSize = 1024;
+    auto volume = MakeMemoryVolume(1 << 20, options, &problem);
+    ASSERT_NE(nullptr, volume) << problem.Text();
+    EXPECT_EQ(65536u, volume->Header().catalogFile.logicalSize);
+    EXPECT_EQ(32768u, volume->Header().extentsFile.logicalSize);
+    EXPECT_EQ(131072u, volume->Header().attributesFile.logicalSize);
+    EXPECT_EQ(1024u, volume->Fs()->mapBlockSize);
+    EXPECT_EQ(16u, volume->Tree(kCatalogFileId, &problem)->header.totalNodes);
+}
+
+// The files that account for a journal stand in the root folder: without it there are none.
+TEST(MakeVolume, AJournalWithoutARootFolder) {
+    Problem problem;
+    for (const bool emptyTrees : {false, true}) {
+        FormatOptions options;
+        options.journalSize = 64 << 10;
+        options.withRoot = emptyTrees;
+        options.emptyTrees = emptyTrees;
+        auto volume = MakeMemoryVolume(2 << 20, options, &problem);
+        ASSERT_NE(nullptr, volume) << problem.Text();
+        EXPECT_TRUE(volume->Journal().readable && volume->Journal().empty);
+        EXPECT_EQ(0u, volume->Header().fileCount);
+        EXPECT_EQ(kFirstUserId, volume->Header().nextCatalogId);
+        EXPECT_EQ(!emptyTrees, volume->HasTree(kCatalogFileId));
+        if (!emptyTrees) {
+            EXPECT_EQ(0u, volume->Tree(kCatalogFileId, &problem)->header.leafRecords);
+        }
+    }
+}
+
 TEST(MakeVolume, EmptyOneHasNoTreesUntilTheyAreCreated) {
     Problem problem;
     FormatOptions options;
