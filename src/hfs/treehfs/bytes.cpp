@@ -11,36 +11,9 @@ inline u32 Least(u32 a, u32 b) {
 
 }  // namespace
 
-// Address to write at. A paranoid build stops when the block was not marked modified: a change
-// nobody hands over would be lost.
-u8* NodeBytes::WriteAt(u32 offset) const {
-#ifdef TREEHFS_PARANOID
-    if (!bufs_[offset >> blockShift_].dirty) {
-        __builtin_trap();
-    }
-#endif
-    return bufs_[offset >> blockShift_].data + (offset & blockMask_);
-}
-
 void NodeBytes::SetU8(u32 offset, u32 value) const {
     const u8 byte = static_cast<u8>(value);
     CopyIn(offset, &byte, 1);
-}
-
-void NodeBytes::SetU16(u32 offset, u32 value) const {
-    if (InOneBlock(offset, 2)) {
-        PutBe16(WriteAt(offset), value);
-        return;
-    }
-    u8 bytes[2];
-    PutBe16(bytes, value);
-    CopyIn(offset, bytes, 2);
-}
-
-void NodeBytes::SetU32(u32 offset, u32 value) const {
-    u8 bytes[4];
-    PutBe32(bytes, value);
-    CopyIn(offset, bytes, 4);
 }
 
 void NodeBytes::CopyOut(void* target, u32 offset, u32 size) const {
@@ -57,7 +30,7 @@ void NodeBytes::CopyOut(void* target, u32 offset, u32 size) const {
     }
 }
 
-void NodeBytes::CopyIn(u32 offset, const void* source, u32 size) const {
+void NodeBytes::CopyInPieces(u32 offset, const void* source, u32 size) const {
     if (!Contains(offset, size)) {
         return;
     }
@@ -83,20 +56,12 @@ void NodeBytes::Fill(u32 offset, u8 value, u32 size) const {
     }
 }
 
-void NodeBytes::Move(u32 target, u32 source, u32 size) const {
-    if (size == 0 || !Contains(target, size) || !Contains(source, size)) {
-        return;
-    }
-    if (size <= Room(source) && size <= Room(target)) {
-        std::memmove(WriteAt(target), At(source), size);
-        return;
-    }
-    MovePieces(target, source, size);
-}
-
 // Upward moves step backward from the end and downward moves forward, so that no byte is
 // overwritten before it was read.
 void NodeBytes::MovePieces(u32 target, u32 source, u32 size) const {
+    if (!Contains(target, size) || !Contains(source, size)) {
+        return;
+    }
     if (target < source) {
         while (size > 0) {
             const u32 piece = Least(size, Least(Room(source), Room(target)));

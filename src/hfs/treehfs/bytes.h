@@ -96,23 +96,51 @@ public:
 
     // REQUIRES of all writers: the blocks written were marked with SetDirty.
     void SetU8(u32 offset, u32 value) const;
-    void SetU16(u32 offset, u32 value) const;
-    void SetU32(u32 offset, u32 value) const;
+    void SetU16(u32 offset, u32 value) const {
+        u8 bytes[2];
+        PutBe16(bytes, value);
+        CopyIn(offset, bytes, 2);
+    }
+    void SetU32(u32 offset, u32 value) const {
+        u8 bytes[4];
+        PutBe32(bytes, value);
+        CopyIn(offset, bytes, 4);
+    }
     void CopyOut(void* target, u32 offset, u32 size) const;
-    void CopyIn(u32 offset, const void* source, u32 size) const;
+    void CopyIn(u32 offset, const void* source, u32 size) const {
+        if (InOneBlock(offset, size)) {
+            std::memmove(WriteAt(offset), source, size);
+        } else {
+            CopyInPieces(offset, source, size);
+        }
+    }
     void Fill(u32 offset, u8 value, u32 size) const;
-    void Move(u32 target, u32 source, u32 size) const;  // overlap allowed
+    void Move(u32 target, u32 source, u32 size) const {  // overlap allowed
+        if (InOneBlock(source, size) && InOneBlock(target, size)) {
+            std::memmove(WriteAt(target), At(source), size);
+        } else {
+            MovePieces(target, source, size);
+        }
+    }
 
 private:
     friend void CopyBetween(NodeBytes target, u32 targetOffset, NodeBytes source, u32 sourceOffset,
                             u32 size);
 
     bool InOneBlock(u32 offset, u32 size) const {
-        return __builtin_expect(
-            (offset >> blockShift_) < blocks_ && (offset & blockMask_) + size <= blockMask_ + 1,
-            true);
+        return __builtin_expect((offset >> blockShift_) < blocks_ && size <= Room(offset), true);
     }
-    u8* WriteAt(u32 offset) const;
+    // Address to write at. A paranoid build stops when the block was not marked modified: a change
+    // nobody hands over would be lost.
+    u8* WriteAt(u32 offset) const {
+#ifdef TREEHFS_PARANOID
+        if (!bufs_[offset >> blockShift_].dirty) {
+            __builtin_trap();
+        }
+#endif
+        return bufs_[offset >> blockShift_].data + (offset & blockMask_);
+    }
+    void CopyInPieces(u32 offset, const void* source, u32 size) const;
     void MovePieces(u32 target, u32 source, u32 size) const;
 
     const HfsBcbBuf* bufs_;

@@ -72,4 +72,19 @@ void DropNode(CBTreeHfs* tree, HfsNode* node);
 
 bool HasDirtyBlock(const BTHeaderMem* hdr, const HfsNode* node);
 
+// Whether marking these bytes would change nothing: the node lies in one block, is marked, and is
+// the last that was. A change marks its node several times in a row.
+inline bool IsMarkedLast(const CBTreeHfs* tree, const HfsNode* node, u32 offset, u32 length) {
+    return tree->header.blocksPerNode == 1 && offset < tree->header.blockSize &&
+           static_cast<u64>(offset) + length <= tree->header.blockSize && node->bufs[0].dirty &&
+           tree->modifiedList.prev == &node->modifiedLink;
+}
+// SetDirty without a call where there is nothing to do.
+inline int MarkDirty(CBTreeHfs* tree, HfsNode* node, u32 offset, u32 length) {
+    return IsMarkedLast(tree, node, offset, length) ? kOk : tree->SetDirty(node, offset, length);
+}
+inline int MarkDirty(CBTreeHfs* tree, HfsNode* node, u32 offset) {
+    return MarkDirty(tree, node, offset, 0);
+}
+
 }  // namespace VELK

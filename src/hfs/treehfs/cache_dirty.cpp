@@ -82,12 +82,10 @@ int HandOver(CBTreeHfs* tree, HfsNode* node) {
 }  // namespace
 
 int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset, unsigned length) {
-    const u64 end = static_cast<u64>(offset) + length;
-    // A change marks its node several times in a row; nothing is left to do after the first.
-    if (header.blocksPerNode == 1 && offset < header.blockSize && end <= header.blockSize &&
-        node->bufs[0].dirty && modifiedList.prev == &node->modifiedLink) {
+    if (IsMarkedLast(this, node, offset, length)) {
         return kOk;
     }
+    const u64 end = static_cast<u64>(offset) + length;
     HFS_ASSERT(offset <= header.nodeSize, 776);
     HFS_ASSERT(end <= header.nodeSize, 777);
     if (offset > header.nodeSize || end > header.nodeSize) {

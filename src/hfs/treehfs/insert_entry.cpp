@@ -51,6 +51,14 @@ int ReserveForSplits(CBTreeHfs* tree) {
     return kOk;
 }
 
+// After records moved and separators were replaced the tree's own path mostly leads where it did:
+// then the next search need not go down again.
+void RenewPath(CBTreeHfs* tree) {
+    if (ParentsLeadHere(tree, &tree->findData, 1)) {
+        tree->findData.leadsAsOf = tree->pathVersion;
+    }
+}
+
 }  // namespace
 
 int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, unsigned dataSize) {
@@ -93,6 +101,7 @@ int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, 
         }
         HFS_TRY(InsertTree(searchKey, data, dataSize, leaf, index, 1, false, &findData, &convert),
                 5092);
+        RenewPath(this);
     }
     header.leafRecords += 1;
     isDirty = true;

@@ -66,6 +66,19 @@ int SplitRecord(const BTHeaderMem* hdr, const HfsNode* node, NodeKey* out) {
     return kOk;
 }
 
+// GetRecordSize of a node in one block that holds such a record.
+bool GetPlainRecordSize(const BTHeaderMem* hdr, const HfsNode* node, u32 index, unsigned* size) {
+    const u64 fromEnd = static_cast<u64>(index) * kSlotSize + 2 * kSlotSize;
+    if (fromEnd >= hdr->nodeSize) {
+        return false;
+    }
+    const u8* slots = node->bufs[0].data + hdr->nodeSize - fromEnd;
+    const u32 end = GetBe16(slots);
+    const u32 start = GetBe16(slots + kSlotSize);
+    *size = end - start;
+    return end < hdr->nodeSize && start < end;
+}
+
 // GetKey of a node in one block, as far as nothing about the record is out of the ordinary. False:
 // the long way round has to tell what it is.
 bool GetPlainKey(const BTHeaderMem* hdr, const HfsNode* node, u32 index, NodeKey* out) {
@@ -235,6 +248,9 @@ int HfsNode::GetNodeFreeSize(const BTHeaderMem* hdr, unsigned* freeBytes) const 
 }
 
 int HfsNode::GetRecordSize(const BTHeaderMem* hdr, int index, unsigned* size) const {
+    if (hdr->blockSize == hdr->nodeSize && GetPlainRecordSize(hdr, this, static_cast<u32>(index), size)) {
+        return kOk;
+    }
     *size = 0;
     const s64 position =
         static_cast<s64>(hdr->nodeSize) - kSlotSize * (static_cast<s64>(index) + 2);

@@ -271,7 +271,15 @@ SearchKey::SearchKey(const CBTreeHfs* tree, const BTreeKey* key, unsigned id)
     const u32 length = GetHost16(bytes + kCatKeyNameLength);
     const auto unit = [bytes](u32 at) { return GetHost16(bytes + kCatKeyName + 2 * at); };
     firstUnit_ = length > 0 ? FoldPlain(unit(0)) : u16{0};
-    hasOrder_ = MakeOrder(id, length, unit, &order_);
+}
+
+void SearchKey::LearnOrder() {
+    if (!isFolded_) {
+        return;
+    }
+    const u8* bytes = reinterpret_cast<const u8*>(key_);
+    const auto unit = [bytes](u32 at) { return GetHost16(bytes + kCatKeyName + 2 * at); };
+    hasOrder_ = MakeOrder(id_, GetHost16(bytes + kCatKeyNameLength), unit, &order_);
 }
 
 // Decides by parent and first unit of the name; 0 when these are equal or not plain.

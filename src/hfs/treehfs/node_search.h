@@ -19,6 +19,8 @@ public:
     // Parent and first two units of a key in folded order as one number: of two keys that have one,
     // the key with the greater number sorts behind the other. False: the key has none.
     bool HasOrder() const { return hasOrder_; }
+    // Works the order out, before a way down through index nodes. Until then there is none.
+    void LearnOrder();
     u64 Order() const { return order_; }
 
     // Fewest bytes of a sound node key, and where its name length stands (0: it has no name).

@@ -2,6 +2,7 @@
 #include "hfs/treehfs/path_check.h"
 
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/node_search.h"
 
 namespace VELK {
 
@@ -17,8 +18,8 @@ bool ParentsLeadHere(const CBTreeHfs* tree, const HfsFindData* path, u32 level) 
             static_cast<u32>(parent.index) >= NumRecords(parent.node)) {
             return false;
         }
-        unsigned child = 0;
-        if (parent.node->GetChildNodeNum(hdr, parent.index, &child) != 0 ||
+        u32 child = 0;
+        if (ChildOf(tree, parent.node, parent.index, &child) != 0 ||
             child != path->path[level].node->nodeNum) {
             return false;
         }

@@ -225,11 +225,12 @@ int CBTreeHfs::FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, 
     if (header.treeDepth == 0) {
         return kOk;
     }
-    const SearchKey searchKey(this, key, keyArg);
+    SearchKey searchKey(this, key, keyArg);
     SearchResult result;
     if (path == &findData && FindOnSameLeaf(this, searchKey, &result)) {
         *found = result.found;
     } else {
+        searchKey.LearnOrder();
         path->leadsAsOf = 0;
         path->ClearPath();
         path->searchCount += 1;

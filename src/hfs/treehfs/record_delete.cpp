@@ -1,4 +1,5 @@
 // Takes one record out of one node and closes the gap. Looks at no other node.
+#include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/report.h"
@@ -19,7 +20,7 @@ int CloseSlots(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 ind
     u32 lower = slots.free;  // value of the slot below `position` before the change
     while (position < end) {
         if (bytes.Room(position - kSlotSize) == kSlotSize) {
-            HFS_TRY(tree->SetDirty(node, position), 1074);
+            HFS_TRY(MarkDirty(tree, node, position), 1074);
         }
         u32 piece = bytes.Room(position);
         if (piece > end - position) {
@@ -39,12 +40,12 @@ int CloseSlots(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 ind
 
 // Closes the gap that record `index` leaves.
 int CloseGap(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 index) {
-    HFS_TRY(tree->SetDirty(node, slots.limit), 962);
-    HFS_TRY(tree->SetDirty(node, slots.start, slots.free - slots.start), 1011);
+    HFS_TRY(MarkDirty(tree, node, slots.limit), 962);
+    HFS_TRY(MarkDirty(tree, node, slots.start, slots.free - slots.start), 1011);
     const NodeBytes bytes(&tree->header, node);
     bytes.Move(slots.start, slots.end, slots.free - slots.end);
 
-    HFS_TRY(tree->SetDirty(node, 0), 1054);
+    HFS_TRY(MarkDirty(tree, node, 0), 1054);
     SetNumRecords(&tree->header, node, slots.count - 1);
     bytes.SetU16(slots.limit, 0);
     return CloseSlots(tree, node, slots, index);

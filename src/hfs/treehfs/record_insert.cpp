@@ -1,6 +1,7 @@
 // Puts one record into one node: _InsertRecord opens a gap and counts the record, _InsertKeyRecord
 // fills it with a key and its data, converted to disk form on the way. Neither looks at another
 // node. That a record does not fit is an answer to callers that ask for it.
+#include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/report.h"
@@ -16,7 +17,7 @@ namespace {
 // walk enters them; a failure leaves the slots before in place.
 int OpenSlots(CBTreeHfs* tree, HfsNode* node, u32 first, u32 slotCount, u32 size) {
     const NodeBytes bytes(&tree->header, node);
-    HFS_TRY(tree->SetDirty(node, first), 1268);
+    HFS_TRY(MarkDirty(tree, node, first), 1268);
     HFS_ASSERT(bytes.IsDirty(first), 1269);
     const u32 end = first + kSlotSize * slotCount;
     u32 position = first;
@@ -33,7 +34,7 @@ int OpenSlots(CBTreeHfs* tree, HfsNode* node, u32 first, u32 slotCount, u32 size
         }
         position += piece;
         if (more) {
-            HFS_TRY(tree->SetDirty(node, position), 1284);
+            HFS_TRY(MarkDirty(tree, node, position), 1284);
             HFS_ASSERT(bytes.IsDirty(position), 1285);
         }
         PutBe16(last, bytes.U16(position) + size);
@@ -51,7 +52,7 @@ int OpenGap(CBTreeHfs* tree, HfsNode* node, int index, u32 size, NodeKey* key) {
     if (!IsInsertPoint(record.offset, free) || !IsInsertPoint(record.offset + record.size, free)) {
         return Fail(kErrCorrupt, kReasonNode, 9200);
     }
-    HFS_TRY(tree->SetDirty(node, record.offset, free + size - record.offset), 1214);
+    HFS_TRY(MarkDirty(tree, node, record.offset, free + size - record.offset), 1214);
     NodeBytes(hdr, node).Move(record.offset + size, record.offset, free - record.offset);
 
     key->offset = record.offset;
@@ -97,12 +98,45 @@ int StoreData(CBTreeHfs* tree, const NodeBytes& bytes, u32 offset, const void* d
     return kOk;
 }
 
+// MakeRecord in a node that lies in one block, was marked before and has nothing out of the
+// ordinary at `index`: no step can be refused. False: nothing has changed.
+bool MakePlainRecord(CBTreeHfs* tree, HfsNode* node, u32 index, u32 count, u32 size, NodeKey* key) {
+    if (tree->header.blockSize != tree->header.nodeSize || !node->bufs[0].dirty) {
+        return false;
+    }
+    u8* const data = node->bufs[0].data;
+    u8* const freeSlot = key->entry;
+    u8* const slot = freeSlot + kSlotSize * (count - index);
+    const u32 free = key->offset;
+    const u32 start = GetBe16(slot);
+    if (index < count) {
+        const u32 end = GetBe16(slot - kSlotSize);
+        if (!IsInsertPoint(start, free) || !IsInsertPoint(end, free) || Kind(node) > kBTIndexNode ||
+            start + PaddedKeySize(GetBe16(data + start)) >= end) {
+            return false;
+        }
+        std::memmove(data + start + size, data + start, free - start);
+    }
+    for (u8* to = freeSlot - kSlotSize; to < slot; to += kSlotSize) {
+        PutBe16(to, GetBe16(to + kSlotSize) + size);
+    }
+    key->offset = start;
+    key->ptr = data + start;
+    key->firstBytes = tree->header.nodeSize - start;
+    SetNumRecords(&tree->header, node, count + 1);
+    node->modifiedLink.MoveTail(&tree->modifiedList);
+    return true;
+}
+
 // Makes a record of `size` bytes at `index`. `key` holds where free space starts and comes back
 // with the place of the record, whose bytes are not written.
 int MakeRecord(CBTreeHfs* tree, HfsNode* node, u32 index, u32 count, u32 size, NodeKey* key) {
+    if (HFS_LIKELY(MakePlainRecord(tree, node, index, count, size, key))) {
+        return kOk;
+    }
     const u32 limit = key->entryPos;
     if (index == count) {
-        HFS_TRY(tree->SetDirty(node, key->offset, size), 1257);
+        HFS_TRY(MarkDirty(tree, node, key->offset, size), 1257);
     } else {
         const int status = OpenGap(tree, node, static_cast<int>(index), size, key);
         if (status != 0) {
@@ -113,7 +147,7 @@ int MakeRecord(CBTreeHfs* tree, HfsNode* node, u32 index, u32 count, u32 size, N
     if (status != 0) {
         return status;
     }
-    HFS_TRY(tree->SetDirty(node, 0), 1295);
+    HFS_TRY(MarkDirty(tree, node, 0), 1295);
     HFS_ASSERT(NodeBytes(&tree->header, node).IsDirty(0), 1296);
     SetNumRecords(&tree->header, node, count + 1);
     return kOk;

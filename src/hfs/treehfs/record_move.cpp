@@ -15,27 +15,40 @@ namespace {
 class Table {
 public:
     Table(const BTHeaderMem* hdr, const HfsNode* node)
-        : hdr_(hdr), bytes_(hdr, node), count_(NumRecords(node)) {}
+        : bytes_(hdr, node),
+          end_(node->bufs[0].data + hdr->nodeSize),
+          size_(hdr->nodeSize),
+          count_(NumRecords(node)) {}
 
+    // REQUIRES of all: the table is sound, and has room for `index`.
     u32 Count() const { return count_; }
-    u32 Start(u32 index) const { return bytes_.U16(SlotOffset(hdr_, index)); }
+    u32 Start(u32 index) const { return GetBe16(Slot(index)); }
     u32 Free() const { return Start(count_); }
-    u32 Room() const { return SlotOffset(hdr_, count_) - Free(); }
-    void SetStart(u32 index, u32 start) const { bytes_.SetU16(SlotOffset(hdr_, index), start); }
+    u32 Room() const { return size_ - kSlotSize * (count_ + 1) - Free(); }
+    void SetStart(u32 index, u32 start) const { PutBe16(Slot(index), start); }
+    u32 KeyLength(u32 index) const { return GetBe16(end_ - size_ + Start(index)); }
     const NodeBytes& Bytes() const { return bytes_; }
 
 private:
-    const BTHeaderMem* hdr_;
+    u8* Slot(u32 index) const { return end_ - kSlotSize * std::size_t{index + 1}; }
+
     NodeBytes bytes_;
+    u8* end_;
+    u32 size_;
     u32 count_;
 };
+
+// A node that was marked before becomes the last that was.
+void MarkAgain(CBTreeHfs* tree, HfsNode* node) {
+    node->modifiedLink.MoveTail(&tree->modifiedList);
+}
 
 // Whether records first .. first + count - 1 of `giver` can go to `receiver` in one go: nothing on
 // the way can be refused. REQUIRES: both tables are sound.
 bool CanMoveAtOnce(const CBTreeHfs* tree, const HfsNode* giver, const HfsNode* receiver, u32 first,
                    u32 count) {
     const BTHeaderMem* hdr = &tree->header;
-    if (hdr->blocksPerNode != 1 || !giver->bufs[0].dirty || !receiver->bufs[0].dirty) {
+    if (hdr->blockSize != hdr->nodeSize || !giver->bufs[0].dirty || !receiver->bufs[0].dirty) {
         return false;
     }
     const Table table(hdr, giver);
@@ -45,7 +58,7 @@ bool CanMoveAtOnce(const CBTreeHfs* tree, const HfsNode* giver, const HfsNode* r
     }
     for (u32 i = first; i < first + count; ++i) {
         const u32 start = table.Start(i);
-        if (start + PaddedKeySize(table.Bytes().U16(start)) >= table.Start(i + 1)) {
+        if (start + PaddedKeySize(table.KeyLength(i)) >= table.Start(i + 1)) {
             return false;
         }
     }
@@ -119,32 +132,35 @@ void MoveBack(const CBTreeHfs* tree, HfsNode* right, HfsNode* left, u32 count) {
 
 }  // namespace
 
-// The first record goes alone: with it both nodes are announced as changed.
+// Records go one by one only as long as that may be refused: with the first one both nodes are
+// announced as changed.
 int MoveRecordsLeft(CBTreeHfs* tree, HfsNode* left, HfsNode* right, u32 count) {
-    for (u32 moved = 0; moved < count; ++moved) {
+    for (; count > 0; --count) {
+        if (CanMoveAtOnce(tree, right, left, 0, count)) {
+            MoveFront(tree, left, right, count);
+            MarkAgain(tree, left);
+            MarkAgain(tree, right);
+            return kOk;
+        }
         const int status = tree->_RotateRecordLeft(left, right);
         if (status != kOk) {
             return status;
-        }
-        const u32 rest = count - moved - 1;
-        if (rest > 0 && CanMoveAtOnce(tree, right, left, 0, rest)) {
-            MoveFront(tree, left, right, rest);
-            return kOk;
         }
     }
     return kOk;
 }
 
 int MoveRecordsRight(CBTreeHfs* tree, HfsNode* right, HfsNode* left, u32 count) {
-    for (u32 moved = 0; moved < count; ++moved) {
+    for (; count > 0; --count) {
+        if (CanMoveAtOnce(tree, left, right, NumRecords(left) - count, count)) {
+            MoveBack(tree, right, left, count);
+            MarkAgain(tree, right);
+            MarkAgain(tree, left);
+            return kOk;
+        }
         const int status = tree->_RotateRecordRight(right, left);
         if (status != kOk) {
             return status;
-        }
-        const u32 rest = count - moved - 1;
-        if (rest > 0 && CanMoveAtOnce(tree, left, right, NumRecords(left) - rest, rest)) {
-            MoveBack(tree, right, left, rest);
-            return kOk;
         }
     }
     return kOk;

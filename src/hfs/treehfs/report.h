@@ -15,6 +15,7 @@
 
 namespace VELK {
 
+#define HFS_LIKELY(condition) __builtin_expect(static_cast<bool>(condition), true)
 #define HFS_UNLIKELY(condition) __builtin_expect(static_cast<bool>(condition), false)
 
 // Reports `code` (a reason or a status) at `site`.

@@ -12,6 +12,20 @@ bool CountFits(const BTHeaderMem* hdr, u32 count) {
     return kDescSize + kSlotSize * (count + 1) <= hdr->nodeSize;
 }
 
+// Whether the starts in `size` bytes of slots are even and fall from `*end` on. The last one comes
+// back in its place.
+bool StartsFall(const u8* slots, u32 size, u32* end) {
+    u32 above = *end;
+    u32 wrong = 0;
+    for (const u8* slot = slots; slot < slots + size; slot += kSlotSize) {
+        const u32 start = GetBe16(slot);
+        wrong |= (start >= above ? 1u : 0u) | (start & 1);
+        above = start;
+    }
+    *end = above;
+    return wrong == 0;
+}
+
 }  // namespace
 
 bool LoadRecordSlots(const BTHeaderMem* hdr, const HfsNode* node, u32 index, RecordSlots* slots) {
@@ -38,14 +52,13 @@ bool TableIsSound(const BTHeaderMem* hdr, const HfsNode* node) {
     if (end > SlotOffset(hdr, count) || (end & 1) != 0) {
         return false;
     }
-    for (u32 index = count; index > 0; --index) {
-        const u32 start = bytes.U16(SlotOffset(hdr, index - 1));
-        if (start >= end || (start & 1) != 0) {
-            return false;
-        }
-        end = start;
+    u32 position = SlotOffset(hdr, count) + kSlotSize;
+    bool isFalling = true;
+    while (position < hdr->nodeSize) {  // a slot lies in one block
+        isFalling = StartsFall(bytes.At(position), bytes.Room(position), &end) && isFalling;
+        position += bytes.Room(position);
     }
-    return end >= kDescSize;
+    return isFalling && end >= kDescSize;
 }
 
 }  // namespace VELK
