@@ -91,7 +91,16 @@ void SwapKey(void* target, const void* source) {
     const u32 parentBe = __builtin_bswap32(parent);
     std::memcpy(out, &lengthBe, 2);
     std::memcpy(out + 2, &parentBe, 4);
-    for (u32 at = 6; at < 2u + length; at += 2) {
+    // Four units at a time, as a driver would.
+    u32 at = 6;
+    for (; at + 8 <= 2u + length; at += 8) {
+        constexpr u64 kLowBytes = 0x00FF00FF00FF00FF;
+        u64 units;
+        std::memcpy(&units, in + at, 8);
+        units = (units & kLowBytes) << 8 | (units >> 8 & kLowBytes);
+        std::memcpy(out + at, &units, 8);
+    }
+    for (; at < 2u + length; at += 2) {
         u16 unit;
         std::memcpy(&unit, in + at, 2);
         unit = __builtin_bswap16(unit);

@@ -17,16 +17,35 @@ namespace {
 
 constexpr u16 kEmptyTail = kDescSize;  // last two bytes of a node: record 0, or free space, at 14
 
-HfsNode* FindCached(const CBTreeHfs* tree, u32 nodeNum) {
-    rb_node* link = tree->nodeRoot;
-    while (link != nullptr) {
-        HfsNode* node = NodeOf(link);
-        if (nodeNum == node->nodeNum) {
-            return node;
+// Where a number belongs in the tree of cached nodes: the link that leads to it, null when it is
+// not there, and the node that link is part of. Void once a node came in or left.
+struct Place {
+    rb_node* parent;
+    rb_node** link;
+    u32 nodeCount;  // of the tree when the place was found
+    u32 readCount;
+};
+
+Place FindPlace(CBTreeHfs* tree, u32 nodeNum) {
+    Place place = {nullptr, &tree->nodeRoot, tree->nodeCount, tree->readCount};
+    while (*place.link != nullptr) {
+        const u32 number = NodeOf(*place.link)->nodeNum;
+        if (number == nodeNum) {
+            break;
         }
-        link = nodeNum < node->nodeNum ? link->left : link->right;
+        place.parent = *place.link;
+        place.link = nodeNum < number ? &place.parent->left : &place.parent->right;
     }
-    return nullptr;
+    return place;
+}
+
+void LinkAt(CBTreeHfs* tree, const Place& place, HfsNode* node) {
+    node->link.Link(place.parent, place.link);
+    node->link.insert_color(&tree->nodeRoot);
+    tree->nodeCount += 1;
+    if (tree->nodeCount > tree->maxNodeCount) {
+        tree->maxNodeCount = tree->nodeCount;
+    }
 }
 
 // A node whose blocks do not make up nodeSize bytes could be read past its end: no node of such a
@@ -164,13 +183,18 @@ void AssertRequest(bool expected) {
     HFS_ASSERT(expected, 2638);
 }
 
-// A number is cached once; a node whose number is there already stays outside.
-void LinkOnce(CBTreeHfs* tree, HfsNode* node) {
-    HFS_ASSERT(LinkNode(tree, node), 2706);
+// Links the node just read, which was not cached when its place was found. A number is cached once:
+// should a service of the volume have brought the node meanwhile, this one stays outside.
+void LinkOnce(CBTreeHfs* tree, const Place& place, HfsNode* node) {
+    if (tree->nodeCount == place.nodeCount && tree->readCount == place.readCount + 1) {
+        LinkAt(tree, place, node);
+    } else {
+        HFS_ASSERT(LinkNode(tree, node), 2706);
+    }
 }
 
-// Maps a node that is not cached and links it, unreferenced.
-int LoadNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
+// Maps a node that is not cached and links it at its place, unreferenced.
+int LoadNode(CBTreeHfs* tree, const Place& place, u32 nodeNum, NodeUse use, HfsNode** out) {
     const bool makeEmpty = WantsEmpty(use);
     HfsNode* node =
         NewNode(tree, nodeNum, use == NodeUse::kReadIndex || use == NodeUse::kEmptyIndex);
@@ -195,13 +219,13 @@ int LoadNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
             Report(status, 2645);
             return status;
         }
-        LinkOnce(tree, node);
+        LinkOnce(tree, place, node);
         node->modifiedLink.LinkTail(&tree->modifiedList);
         *out = node;
         return kOk;
     }
     const bool wasEmpty = tree->nodeRoot == nullptr;
-    LinkOnce(tree, node);
+    LinkOnce(tree, place, node);
     if (makeEmpty) {
         EmptyExisting(tree, node);
     } else {
@@ -215,22 +239,11 @@ int LoadNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
 }  // namespace
 
 bool LinkNode(CBTreeHfs* tree, HfsNode* node) {
-    rb_node* parent = nullptr;
-    rb_node** slot = &tree->nodeRoot;
-    while (*slot != nullptr) {
-        parent = *slot;
-        const u32 number = NodeOf(parent)->nodeNum;
-        if (number == node->nodeNum) {
-            return false;
-        }
-        slot = node->nodeNum < number ? &parent->left : &parent->right;
+    const Place place = FindPlace(tree, node->nodeNum);
+    if (*place.link != nullptr) {
+        return false;
     }
-    node->link.Link(parent, slot);
-    node->link.insert_color(&tree->nodeRoot);
-    tree->nodeCount += 1;
-    if (tree->nodeCount > tree->maxNodeCount) {
-        tree->maxNodeCount = tree->nodeCount;
-    }
+    LinkAt(tree, place, node);
     return true;
 }
 
@@ -263,7 +276,8 @@ bool HasDirtyBlock(const BTHeaderMem* hdr, const HfsNode* node) {
 
 int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
     *out = nullptr;
-    HfsNode* node = FindCached(tree, nodeNum);
+    const Place place = FindPlace(tree, nodeNum);
+    HfsNode* node = NodeOf(*place.link);
     if (node != nullptr) {
         CountHit(tree, node);
         if (WantsEmpty(use)) {
@@ -277,7 +291,7 @@ int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
             AssertRequest(false);
             return kErrCorrupt;
         }
-        const int status = LoadNode(tree, nodeNum, use, &node);
+        const int status = LoadNode(tree, place, nodeNum, use, &node);
         if (status != kOk) {
             return status;
         }

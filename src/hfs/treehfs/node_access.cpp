@@ -248,7 +248,8 @@ int HfsNode::GetNodeFreeSize(const BTHeaderMem* hdr, unsigned* freeBytes) const 
 }
 
 int HfsNode::GetRecordSize(const BTHeaderMem* hdr, int index, unsigned* size) const {
-    if (hdr->blockSize == hdr->nodeSize && GetPlainRecordSize(hdr, this, static_cast<u32>(index), size)) {
+    if (hdr->blockSize == hdr->nodeSize &&
+        GetPlainRecordSize(hdr, this, static_cast<u32>(index), size)) {
         return kOk;
     }
     *size = 0;

@@ -71,6 +71,7 @@ private:
 // Shape of the keys to search: that of a catalog in folded order, by far the most frequent, is
 // known to the compiler.
 struct FoldedKeys {
+    FoldedKeys() = default;
     explicit FoldedKeys(const SearchKey&) {}
     static constexpr u32 kFixed = kCatKeyFixed;
     static constexpr u32 kNameLengthAt = kCatKeyNameLength;
@@ -97,8 +98,8 @@ struct OtherKeys {
 template <typename Blocks, typename Shape>
 class QuickKeys {
 public:
-    QuickKeys(const BTHeaderMem* hdr, const HfsNode* node, const SearchKey& key)
-        : blocks_(hdr, node), shape_(key), nodeSize_(hdr->nodeSize) {}
+    QuickKeys(const BTHeaderMem* hdr, const HfsNode* node, Shape shape)
+        : blocks_(hdr, node), shape_(shape), nodeSize_(hdr->nodeSize) {}
 
     // REQUIRES of all: the slots of record `index` and the next lie inside the node.
     [[gnu::always_inline]] const u8* KeyAt(u32 index) const {
@@ -246,9 +247,13 @@ void PrefetchFor(const Keys& keys, u32 height, s32 high) {
     }
 }
 
+bool TableFits(const BTHeaderMem& header, u32 count) {
+    return kSlotSize * (count + 1) < header.nodeSize;
+}
+
 // Without a known shape, or with more slots than the node has room for, no key is quick.
 bool HasQuickKeys(const BTHeaderMem& header, const SearchKey& key, u32 count) {
-    return key.Fixed() != 0 && kSlotSize * (count + 1) < header.nodeSize;
+    return key.Fixed() != 0 && TableFits(header, count);
 }
 
 }  // namespace
@@ -359,7 +364,7 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key,
 template <typename Blocks, typename Shape>
 int SearchPlain(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
     const u32 count = NumRecords(node);
-    const QuickKeys<Blocks, Shape> keys(&tree->header, node, key);
+    const QuickKeys<Blocks, Shape> keys(&tree->header, node, Shape(key));
     if (HasQuickKeys(tree->header, key, count)) {
         PrefetchFor(keys, Height(node), static_cast<s32>(count) - 1);
     }
@@ -369,7 +374,7 @@ int SearchPlain(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Sear
 template <typename Blocks>
 int SearchKnown(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
     const u32 count = NumRecords(node);
-    const QuickKeys<Blocks, FoldedKeys> keys(&tree->header, node, key);
+    const QuickKeys<Blocks, FoldedKeys> keys(&tree->header, node, FoldedKeys());
     const Separators separators(tree, node);
     if (separators.Child(count / 2) != 0) {
         separators.Prefetch(count);
@@ -390,7 +395,7 @@ int SearchFolded(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Sea
 template <typename Blocks>
 bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, u32 count,
                 bool* isBehindAll) {
-    const QuickKeys<Blocks, OtherKeys> keys(&tree->header, leaf, key);
+    const QuickKeys<Blocks, OtherKeys> keys(&tree->header, leaf, OtherKeys(key));
     const u8* last = keys.KeyAt(count - 1);
     if (last == nullptr) {
         return false;
@@ -413,6 +418,19 @@ int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Searc
     }
     return isWhole ? SearchPlain<OneBlock, OtherKeys>(tree, node, key, result)
                    : SearchPlain<ManyBlocks, OtherKeys>(tree, node, key, result);
+}
+
+bool DescribePlain(const CBTreeHfs* tree, const HfsNode* leaf, u32 index, NodeKey* record,
+                   const BTreeKey** key) {
+    const u32 count = NumRecords(leaf);
+    if (tree->header.blocksPerNode != 1 || tree->compareKeys != CompareCatKeysCaseIns ||
+        index >= count || !TableFits(tree->header, count)) {
+        return false;
+    }
+    const QuickKeys<OneBlock, FoldedKeys> keys(&tree->header, leaf, FoldedKeys());
+    const u8* bytes = keys.KeyAt(index);
+    *key = reinterpret_cast<const BTreeKey*>(bytes);
+    return bytes != nullptr && keys.Describe(index, bytes, record);
 }
 
 bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key,

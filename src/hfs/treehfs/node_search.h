@@ -58,6 +58,11 @@ int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Searc
 // that this can be told at once.
 bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, SearchResult* result);
 
+// What delivery needs of record `index` of a leaf in one block whose keys are in folded order: what
+// FetchKey would give. False, nothing reported: something about it is out of the ordinary.
+bool DescribePlain(const CBTreeHfs* tree, const HfsNode* leaf, u32 index, NodeKey* record,
+                   const BTreeKey** key);
+
 // GetChildNodeNum without the way round for plain records.
 int ChildOf(const CBTreeHfs* tree, const HfsNode* node, s32 index, u32* child);
 

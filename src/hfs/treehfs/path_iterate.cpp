@@ -2,6 +2,7 @@
 // over the end of a leaf the upper levels no longer lead to the position.
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/node_search.h"
 #include "hfs/treehfs/path_deliver.h"
 #include "hfs/treehfs/path_level.h"
 #include "hfs/treehfs/report.h"
@@ -112,10 +113,10 @@ int Deliver(CBTreeHfs* tree, const HfsFindLevel& leaf, const Delivery& to) {
     NodeKey record;
     const BTreeKey* key = nullptr;
     int status = kOk;
-    if (to.keyOut != nullptr) {
-        status = FetchKey(tree, leaf.node, leaf.index, &record, &key);
-    } else {
+    if (to.keyOut == nullptr) {
         status = leaf.node->GetKey(&tree->header, leaf.index, &record);
+    } else if (!DescribePlain(tree, leaf.node, static_cast<u32>(leaf.index), &record, &key)) {
+        status = FetchKey(tree, leaf.node, leaf.index, &record, &key);
     }
     if (HFS_UNLIKELY(status != kOk)) {
         if (status != kErrNoMemory) {
