@@ -115,7 +115,7 @@ bool MakePlainRecord(CBTreeHfs* tree, HfsNode* node, u32 index, u32 count, u32 s
             start + PaddedKeySize(GetBe16(data + start)) >= end) {
             return false;
         }
-        std::memmove(data + start + size, data + start, free - start);
+        NodeBytes(&tree->header, node).Move(start + size, start, free - start);
     }
     for (u8* to = freeSlot - kSlotSize; to < slot; to += kSlotSize) {
         PutBe16(to, GetBe16(to + kSlotSize) + size);
