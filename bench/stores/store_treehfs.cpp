@@ -7,6 +7,7 @@
 #include <cstring>
 
 #include "hfs/treehfs.h"
+#include "hfs/volume/convert.h"
 #include "store.h"
 
 namespace bench {
@@ -80,34 +81,6 @@ private:
     u8* bytes_;
 };
 
-void SwapKey(void* target, const void* source) {
-    const u8* in = static_cast<const u8*>(source);
-    u8* out = static_cast<u8*>(target);
-    u16 length;
-    u32 parent;
-    std::memcpy(&length, in, 2);
-    std::memcpy(&parent, in + 2, 4);
-    const u16 lengthBe = __builtin_bswap16(length);
-    const u32 parentBe = __builtin_bswap32(parent);
-    std::memcpy(out, &lengthBe, 2);
-    std::memcpy(out + 2, &parentBe, 4);
-    // Four units at a time, as a driver would.
-    u32 at = 6;
-    for (; at + 8 <= 2u + length; at += 8) {
-        constexpr u64 kLowBytes = 0x00FF00FF00FF00FF;
-        u64 units;
-        std::memcpy(&units, in + at, 8);
-        units = (units & kLowBytes) << 8 | (units >> 8 & kLowBytes);
-        std::memcpy(out + at, &units, 8);
-    }
-    for (; at < 2u + length; at += 2) {
-        u16 unit;
-        std::memcpy(&unit, in + at, 2);
-        unit = __builtin_bswap16(unit);
-        std::memcpy(out + at, &unit, 2);
-    }
-}
-
 class TreehfsStore : public Store {
 public:
     TreehfsStore(const Workload& load, u32 mapBlock)
@@ -118,7 +91,7 @@ public:
         tree_.header.maxKeyLength = kCatMaxKeyLength;
         tree_.header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
         tree_.keyCompareType = kKeyCompareFolding;
-        tree_.convert.KeyToDisk = SwapKey;
+        tree_.convert.KeyToDisk = ConvertFor(kCatalogFileId).KeyToDisk;
         const unsigned long long size = 4u << 20;
         if (tree_.Create(kNodeShift, 0, &size) != kOk) {
             std::abort();
@@ -162,7 +135,7 @@ public:
             return load_.parent[a] < load_.parent[b];
         }
         alignas(8) u8 other[kLargestKey];
-        SwapKey(other, load_.Host(b));
+        tree_.convert.KeyToDisk(other, load_.Host(b));
         return CompareCatKeysCaseIns(Key(a), load_.parent[a],
                                      reinterpret_cast<const BTreeKey*>(other)) < 0;
     }

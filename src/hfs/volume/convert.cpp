@@ -9,7 +9,7 @@ namespace VELK {
 namespace {
 
 struct FieldRun {
-    u8 width;   // bytes of one field; 0 ends a layout
+    u8 width;   // bytes of one field, a power of two; 0 ends a layout
     u16 count;  // fields; kRest: as many as the size holds
 };
 constexpr u16 kRest = 0xFFFF;
@@ -43,50 +43,74 @@ void CopyBytes(void* target, const void* source, unsigned size) {
     }
 }
 
+// Reverses the bytes of each field in a word of eight bytes.
 template <typename Field>
-void CopySwapped(u8* target, const u8* source) {
-    Field field;
-    std::memcpy(&field, source, sizeof field);
-    if constexpr (std::endian::native == std::endian::little) {
-        Field swapped = 0;
-        for (unsigned i = 0; i < sizeof field; ++i) {
-            swapped = static_cast<Field>(swapped << 8) | static_cast<u8>(field >> (8 * i));
-        }
-        field = swapped;
+constexpr u64 Swapped(u64 fields) {
+    if constexpr (sizeof(Field) == sizeof(u16)) {
+        constexpr u64 kLowBytes = 0x00FF00FF00FF00FF;
+        return (fields & kLowBytes) << 8 | (fields >> 8 & kLowBytes);
+    } else if constexpr (sizeof(Field) == sizeof(u32)) {
+        return std::rotl(__builtin_bswap64(fields), 32);
+    } else {
+        return __builtin_bswap64(fields);
     }
-    std::memcpy(target, &field, sizeof field);
 }
 
-void CopyField(u8* target, const u8* source, unsigned width) {
+// Converts up to eight bytes of whole fields.
+template <typename Field>
+void CopySwapped(u8* target, const u8* source, unsigned size = sizeof(Field)) {
+    u64 fields = 0;
+    std::memcpy(&fields, source, size);
+    if constexpr (std::endian::native == std::endian::little) {
+        fields = Swapped<Field>(fields);
+    }
+    std::memcpy(target, &fields, size);
+}
+
+template <typename Field>
+void CopyRun(u8* target, const u8* source, unsigned size) {
+    unsigned at = 0;
+    for (; size - at >= sizeof(u64); at += sizeof(u64)) {
+        CopySwapped<Field>(target + at, source + at, sizeof(u64));
+    }
+    for (; at < size; at += sizeof(Field)) {
+        CopySwapped<Field>(target + at, source + at);
+    }
+}
+
+// Converts `size` bytes of whole fields.
+void CopyRun(u8* target, const u8* source, unsigned size, unsigned width) {
     switch (width) {
         case 2:
-            CopySwapped<u16>(target, source);
+            CopyRun<u16>(target, source, size);
             break;
         case 4:
-            CopySwapped<u32>(target, source);
+            CopyRun<u32>(target, source, size);
             break;
         case 8:
-            CopySwapped<u64>(target, source);
+            CopyRun<u64>(target, source, size);
             break;
         default:
-            *target = *source;
+            CopyBytes(target, source, size);
     }
 }
 
-// Both directions at once: reversing the bytes of every field is its own inverse.
+// Both directions at once: reversing the bytes of every field is its own inverse. A field that the
+// size cuts is copied as it is.
 void CopyFields(const FieldRun* layout, void* target, const void* source, unsigned size) {
     u8* to = static_cast<u8*>(target);
     const u8* from = static_cast<const u8*>(source);
     unsigned offset = 0;
     for (; layout->width != 0; ++layout) {
-        for (unsigned left = layout->count; left != 0; --left) {
-            if (size - offset < layout->width) {
-                CopyBytes(to + offset, from + offset, size - offset);
-                return;
-            }
-            CopyField(to + offset, from + offset, layout->width);
-            offset += layout->width;
+        const unsigned whole = (size - offset) & ~(layout->width - 1u);
+        const unsigned run = unsigned{layout->count} * layout->width;
+        if (run > whole) {
+            CopyRun(to + offset, from + offset, whole, layout->width);
+            offset += whole;
+            break;
         }
+        CopyRun(to + offset, from + offset, run, layout->width);
+        offset += run;
     }
     CopyBytes(to + offset, from + offset, size - offset);
 }
