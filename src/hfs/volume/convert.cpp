@@ -4,6 +4,7 @@
 
 #include <bit>
 #include <cstring>
+#include <type_traits>
 
 namespace VELK {
 namespace {
@@ -46,7 +47,9 @@ void CopyBytes(void* target, const void* source, unsigned size) {
 // Reverses the bytes of each field in a word of eight bytes.
 template <typename Field>
 constexpr u64 Swapped(u64 fields) {
-    if constexpr (sizeof(Field) == sizeof(u16)) {
+    if constexpr (sizeof(Field) == sizeof(u8)) {
+        return fields;
+    } else if constexpr (sizeof(Field) == sizeof(u16)) {
         constexpr u64 kLowBytes = 0x00FF00FF00FF00FF;
         return (fields & kLowBytes) << 8 | (fields >> 8 & kLowBytes);
     } else if constexpr (sizeof(Field) == sizeof(u32)) {
@@ -78,41 +81,37 @@ void CopyRun(u8* target, const u8* source, unsigned size) {
     }
 }
 
-// Converts `size` bytes of whole fields.
-void CopyRun(u8* target, const u8* source, unsigned size, unsigned width) {
-    switch (width) {
-        case 2:
-            CopyRun<u16>(target, source, size);
-            break;
-        case 4:
-            CopyRun<u32>(target, source, size);
-            break;
-        case 8:
-            CopyRun<u64>(target, source, size);
-            break;
-        default:
-            CopyBytes(target, source, size);
+template <unsigned kWidth>
+using FieldOf =
+    std::conditional_t<kWidth == sizeof(u64), u64,
+                       std::conditional_t<kWidth == sizeof(u32), u32,
+                                          std::conditional_t<kWidth == sizeof(u16), u16, u8>>>;
+
+// Both directions at once: reversing the bytes of every field is its own inverse. A field that the
+// size cuts, and what follows the layout, is copied as it is. `kAt` is the first run to take.
+template <const auto& kLayout, std::size_t kAt = 0>
+void CopyFields(u8* target, const u8* source, unsigned size) {
+    constexpr FieldRun kRun = kLayout[kAt];
+    if constexpr (kRun.width == 0) {
+        CopyBytes(target, source, size);
+    } else {
+        using Field = FieldOf<kRun.width>;
+        constexpr unsigned kSize = unsigned{kRun.count} * kRun.width;
+        if (size < kSize) {
+            const unsigned whole = size & ~(kRun.width - 1u);
+            CopyRun<Field>(target, source, whole);
+            CopyBytes(target + whole, source + whole, size - whole);
+            return;
+        }
+        CopyRun<Field>(target, source, kSize);
+        CopyFields<kLayout, kAt + 1>(target + kSize, source + kSize, size - kSize);
     }
 }
 
-// Both directions at once: reversing the bytes of every field is its own inverse. A field that the
-// size cuts is copied as it is.
-void CopyFields(const FieldRun* layout, void* target, const void* source, unsigned size) {
-    u8* to = static_cast<u8*>(target);
-    const u8* from = static_cast<const u8*>(source);
-    unsigned offset = 0;
-    for (; layout->width != 0; ++layout) {
-        const unsigned whole = (size - offset) & ~(layout->width - 1u);
-        const unsigned run = unsigned{layout->count} * layout->width;
-        if (run > whole) {
-            CopyRun(to + offset, from + offset, whole, layout->width);
-            offset += whole;
-            break;
-        }
-        CopyRun(to + offset, from + offset, run, layout->width);
-        offset += run;
-    }
-    CopyBytes(to + offset, from + offset, size - offset);
+using CopyFn = void (*)(u8* target, const u8* source, unsigned size);
+
+void Copy(CopyFn copy, void* target, const void* source, unsigned size) {
+    copy(static_cast<u8*>(target), static_cast<const u8*>(source), size);
 }
 
 u16 HostU16(const void* bytes) {
@@ -141,44 +140,44 @@ u32 DiskU32(const void* bytes) {
 
 // The type of an unknown record is converted all the same: left as it is, it could read as a
 // known type on the way back.
-const FieldRun* CatalogLayout(u16 type) {
+CopyFn CatalogCopy(u16 type) {
     switch (type) {
         case 1:
-            return kFolderLayout;
+            return CopyFields<kFolderLayout>;
         case 2:
-            return kFileLayout;
+            return CopyFields<kFileLayout>;
         case 3:
         case 4:
-            return kThreadLayout;
+            return CopyFields<kThreadLayout>;
         default:
-            return kTypeLayout;
+            return CopyFields<kTypeLayout>;
     }
 }
 
-const FieldRun* AttributeLayout(u32 type) {
+CopyFn AttributeCopy(u32 type) {
     switch (type) {
         case 0x10:
-            return kInlineLayout;
+            return CopyFields<kInlineLayout>;
         case 0x20:
-            return kForkAttributeLayout;
+            return CopyFields<kForkAttributeLayout>;
         case 0x30:
-            return kExtentsAttributeLayout;
+            return CopyFields<kExtentsAttributeLayout>;
         default:
-            return kAttributeTypeLayout;
+            return CopyFields<kAttributeTypeLayout>;
     }
 }
 
 void CatalogDataToDisk(void* target, const void* source, unsigned size) {
-    CopyFields(CatalogLayout(size < sizeof(u16) ? u16{0} : HostU16(source)), target, source, size);
+    Copy(CatalogCopy(size < sizeof(u16) ? u16{0} : HostU16(source)), target, source, size);
 }
 void CatalogDataToMemory(void* target, const void* source, unsigned size) {
-    CopyFields(CatalogLayout(size < sizeof(u16) ? u16{0} : DiskU16(source)), target, source, size);
+    Copy(CatalogCopy(size < sizeof(u16) ? u16{0} : DiskU16(source)), target, source, size);
 }
 void AttributesDataToDisk(void* target, const void* source, unsigned size) {
-    CopyFields(AttributeLayout(size < sizeof(u32) ? 0 : HostU32(source)), target, source, size);
+    Copy(AttributeCopy(size < sizeof(u32) ? 0 : HostU32(source)), target, source, size);
 }
 void AttributesDataToMemory(void* target, const void* source, unsigned size) {
-    CopyFields(AttributeLayout(size < sizeof(u32) ? 0 : DiskU32(source)), target, source, size);
+    Copy(AttributeCopy(size < sizeof(u32) ? 0 : DiskU32(source)), target, source, size);
 }
 
 // A host key says its own size in its length field.
@@ -187,19 +186,19 @@ unsigned HostKeySize(const void* key) {
 }
 
 void CatalogKeyToDisk(void* target, const void* source) {
-    CopyFields(kCatalogKeyLayout, target, source, HostKeySize(source));
+    Copy(CopyFields<kCatalogKeyLayout>, target, source, HostKeySize(source));
 }
 void CatalogKeyToMemory(void* target, const void* source, unsigned size) {
-    CopyFields(kCatalogKeyLayout, target, source, size);
+    Copy(CopyFields<kCatalogKeyLayout>, target, source, size);
 }
 void ExtentsKeyToDisk(void* target, const void* source) {
-    CopyFields(kExtentsKeyLayout, target, source, HostKeySize(source));
+    Copy(CopyFields<kExtentsKeyLayout>, target, source, HostKeySize(source));
 }
 void AttributesKeyToDisk(void* target, const void* source) {
-    CopyFields(kAttributesKeyLayout, target, source, HostKeySize(source));
+    Copy(CopyFields<kAttributesKeyLayout>, target, source, HostKeySize(source));
 }
 void AttributesKeyToMemory(void* target, const void* source, unsigned size) {
-    CopyFields(kAttributesKeyLayout, target, source, size);
+    Copy(CopyFields<kAttributesKeyLayout>, target, source, size);
 }
 
 void CopyKey(void* target, const void* source) {
