@@ -52,9 +52,10 @@ int ReserveForSplits(CBTreeHfs* tree) {
 }
 
 // After records moved and separators were replaced the tree's own path mostly leads where it did:
-// then the next search need not go down again.
+// then the next search need not go down again. It does so anyway among nodes of another writer,
+// whose damage is not to be reported for this.
 void RenewPath(CBTreeHfs* tree) {
-    if (ParentsLeadHere(tree, &tree->findData, 1)) {
+    if (tree->isAllOwn && ParentsLeadHere(tree, &tree->findData, 1)) {
         tree->findData.leadsAsOf = tree->pathVersion;
     }
 }
