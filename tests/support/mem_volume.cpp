@@ -108,7 +108,10 @@ MemVolume::Snapshot MemVolume::Save() {
 }
 
 void MemVolume::Restore(const Snapshot& snapshot) {
-    files_ = snapshot.files;
+    std::erase_if(files_, [&](const auto& file) { return !snapshot.files.contains(file.first); });
+    for (const auto& [fileId, bytes] : snapshot.files) {
+        files_[fileId] = bytes;  // into the memory that is there
+    }
     for (const auto& [fileId, fork] : snapshot.forks) {
         *fs.ForkOf(fileId) = fork;
     }

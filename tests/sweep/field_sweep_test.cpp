@@ -5,7 +5,10 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <iterator>
 #include <string>
+#include <tuple>
+#include <vector>
 
 #include "fields.h"
 #include "keys.h"
@@ -26,7 +29,19 @@ struct SweepSetup {
     u32 nodeSize;
 };
 
-class FieldSweep : public ::testing::TestWithParam<SweepSetup> {
+const auto kSetups =
+    ::testing::Values(SweepSetup{kCatalogFileId, 512}, SweepSetup{kExtentsFileId, 512},
+                      SweepSetup{kAttributesFileId, 512}, SweepSetup{kCatalogFileId, 1024});
+
+std::string NameOf(const SweepSetup& setup) {
+    return "File" + std::to_string(setup.fileId) + "By" + std::to_string(setup.nodeSize);
+}
+
+// The nodes whose fields are set.
+const char* const kNodeNames[] = {"Header", "FirstLeaf", "MiddleLeaf", "Index", "Root", "Map"};
+constexpr std::size_t kNodes = std::size(kNodeNames);
+
+class FieldSweep {
 protected:
     // Three levels, two of them index nodes, and a map node more than needed.
     static TreeImage Sound(const SweepSetup& setup) {
@@ -46,7 +61,8 @@ protected:
         return BuildTree(shape, records);
     }
 
-    FieldSweep() : sound_(Sound(GetParam())), trial_(GetParam().fileId, 512) {
+    explicit FieldSweep(const SweepSetup& setup)
+        : setup_(setup), sound_(Sound(setup)), trial_(setup.fileId, 512) {
         const u32 middleLeaf = sound_.levels[1][1];
         nodes_ = {0,
                   sound_.levels[1][0],
@@ -65,15 +81,6 @@ protected:
         field.offset += nodeNum * sound_.shape.nodeSize;
         return field;
     }
-    // Whole sweeps take hours: how far this one is.
-    void Tell(const char* what, u64 number, u64 of) const {
-        if (SweepsAll()) {
-            std::printf(
-                "%s %llu of %llu, %llu trials\n", what, static_cast<unsigned long long>(number),
-                static_cast<unsigned long long>(of), static_cast<unsigned long long>(trials_));
-            std::fflush(stdout);
-        }
-    }
     void Try(const TreeImage& image, u32 nodeNum) {
         trial_.RunTree(image.bytes, nodeNum);
         trial_.RunNode(image.Node(nodeNum), nodeNum == 0 ? 0 : 1);
@@ -83,14 +90,31 @@ protected:
         TreeImage image = sound_;
         SetField(image.bytes.data(), InFile(nodeNum, field), value);
         Try(image, nodeNum);
-        ASSERT_FALSE(HasFailure())
+        ASSERT_FALSE(::testing::Test::HasFailure())
             << "node " << nodeNum << ", " << field.name << " at " << field.offset << " = " << value;
     }
 
+    void TellTrials() const {
+        std::printf("%llu trials\n", static_cast<unsigned long long>(trials_));
+    }
+
+    SweepSetup setup_;
     TreeImage sound_;
     Trial trial_;
-    std::vector<u32> nodes_;  // header, leaves, index, root, map
+    std::vector<u32> nodes_;  // as in kNodeNames
     u64 trials_ = 0;
+};
+
+// One node of one tree: a part of the sweep that can be run by itself.
+class OneField : public FieldSweep,
+                 public ::testing::TestWithParam<std::tuple<SweepSetup, std::size_t>> {
+protected:
+    OneField() : FieldSweep(std::get<0>(GetParam())) {}
+};
+
+class TwoFields : public FieldSweep, public ::testing::TestWithParam<SweepSetup> {
+protected:
+    TwoFields() : FieldSweep(GetParam()) {}
 };
 
 // A few values for pairs: the ends, the neighbours of what is there, the tree's and node's ends.
@@ -102,34 +126,32 @@ std::vector<u64> FewValues(const Field& field, u64 old, const TreeImage& image) 
 
 }  // namespace
 
-TEST_P(FieldSweep, AnyFieldMayHoldAnyValue) {
+TEST_P(OneField, MayHoldAnyValue) {
     trial_.RunTree(sound_.bytes, 1);
     ASSERT_FALSE(HasFailure()) << "the sound tree";
+    const u32 nodeNum = nodes_[std::get<1>(GetParam())];
     // 65,536 values where nodes have 512 bytes; 251 is prime, so samples meet every residue.
-    const u32 step = !SweepsAll() ? 6007 : GetParam().nodeSize == 512 ? 1 : 251;
-    for (const u32 nodeNum : nodes_) {
-        for (const Field& field : FieldsOf(nodeNum)) {
-            const u64 old = GetField(sound_.bytes.data(), InFile(nodeNum, field));
-            if (SweepsAll() || field.width != 2) {
-                for (const u64 value :
-                     BoundaryValues(field, old, sound_.shape.nodeSize, sound_.totalNodes)) {
-                    TryValue(nodeNum, field, value);
-                }
-            }
-            const u32 count = field.width == 1 ? 256 : field.width == 2 ? 65536 : 0;
-            for (u32 value = field.offset % step; value < count; value += step) {
+    const u32 step = !SweepsAll() ? 6007 : setup_.nodeSize == 512 ? 1 : 251;
+    for (const Field& field : FieldsOf(nodeNum)) {
+        const u64 old = GetField(sound_.bytes.data(), InFile(nodeNum, field));
+        if (SweepsAll() || field.width != 2) {
+            for (const u64 value :
+                 BoundaryValues(field, old, sound_.shape.nodeSize, sound_.totalNodes)) {
                 TryValue(nodeNum, field, value);
-                if (HasFatalFailure()) {
-                    return;
-                }
             }
-            Tell("node", nodeNum, sound_.totalNodes);
+        }
+        const u32 count = field.width == 1 ? 256 : field.width == 2 ? 65536 : 0;
+        for (u32 value = field.offset % step; value < count; value += step) {
+            TryValue(nodeNum, field, value);
+            if (HasFatalFailure()) {
+                return;
+            }
         }
     }
-    std::printf("%llu trials, fields by themselves\n", static_cast<unsigned long long>(trials_));
+    TellTrials();
 }
 
-TEST_P(FieldSweep, AnyTwoFieldsMayBeWrongTogether) {
+TEST_P(TwoFields, MayBeWrongTogether) {
     struct Change {
         u32 node;
         Field field;
@@ -149,9 +171,6 @@ TEST_P(FieldSweep, AnyTwoFieldsMayBeWrongTogether) {
     for (u64 pair = 0; pair < all; pair += step) {
         const Change& one = changes[static_cast<std::size_t>(pair / changes.size())];
         const Change& two = changes[static_cast<std::size_t>(pair % changes.size())];
-        if (pair % (1u << 18) < step) {
-            Tell("pair", pair, all);
-        }
         if (one.field.offset >= two.field.offset) {
             continue;  // tried the other way round, or the same field
         }
@@ -163,17 +182,16 @@ TEST_P(FieldSweep, AnyTwoFieldsMayBeWrongTogether) {
             << one.field.name << " at " << one.field.offset << " = " << one.value << " and "
             << two.field.name << " at " << two.field.offset << " = " << two.value;
     }
-    std::printf("%llu trials, pairs of fields\n", static_cast<unsigned long long>(trials_));
+    TellTrials();
 }
 
-INSTANTIATE_TEST_SUITE_P(Trees, FieldSweep,
-                         ::testing::Values(SweepSetup{kCatalogFileId, 512},
-                                           SweepSetup{kExtentsFileId, 512},
-                                           SweepSetup{kAttributesFileId, 512},
-                                           SweepSetup{kCatalogFileId, 1024}),
+INSTANTIATE_TEST_SUITE_P(Trees, OneField,
+                         ::testing::Combine(kSetups, ::testing::Range(std::size_t{0}, kNodes)),
                          [](const auto& setup) {
-                             return "File" + std::to_string(setup.param.fileId) + "By" +
-                                    std::to_string(setup.param.nodeSize);
+                             return NameOf(std::get<0>(setup.param)) + "In" +
+                                    kNodeNames[std::get<1>(setup.param)];
                          });
+INSTANTIATE_TEST_SUITE_P(Trees, TwoFields, kSetups,
+                         [](const auto& setup) { return NameOf(setup.param); });
 
 }  // namespace VELK::test
