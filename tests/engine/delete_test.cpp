@@ -234,6 +234,7 @@ protected:
     }
     int DeleteHere() { return Tree().DeleteRecord(nullptr, 0, false); }
 
+    const Events refused_ = {Reported(kReasonInvalid, 9267)};
     std::unique_ptr<TreeOnVolume> tree_;
 };
 
@@ -294,31 +295,30 @@ TEST_F(DeleteAtPath, LevelsOutsideThePathAreRefused) {
     Open(Image(512, 9, 3));
     Find(4);
     for (const int level : {-1, 0, 3, 15, 16}) {
-        ExpectRefused(Tree().DeleteTree(level, &Tree().findData), kErrInvalid,
-                      {Reported(kReasonInvalid, 9267)});
+        ExpectRefused(Tree().DeleteTree(level, &Tree().findData), kErrInvalid, refused_);
     }
-    Tree().findData.path[1].index = -1;
-    ExpectRefused(Tree().DeleteTree(1, &Tree().findData), kErrInvalid,
-                  {Reported(kReasonInvalid, 9267)});
+    for (const s32 index : {-1, 3, 100}) {  // of a leaf of three
+        Tree().findData.path[1].index = index;
+        ExpectRefused(Tree().DeleteTree(1, &Tree().findData), kErrInvalid, refused_);
+    }
 }
 
 TEST_F(DeleteAtPath, ParentsThatDoNotLeadThereAreRefused) {
-    const Events refused = {Reported(kReasonInvalid, 9267)};
     Open(Image(512, 9, 3));
     Find(3);  // the first record of its leaf, so the parent would have to change
     HfsFindData& path = Tree().findData;
     u8* parent = path.path[2].node->bufs[0].data;
     const Bytes before(parent, parent + 512);
     parent[kDescKind] = static_cast<u8>(kBTMapNode);
-    ExpectRefused(Tree().DeleteTree(1, &path), kErrInvalid, refused);
+    ExpectRefused(Tree().DeleteTree(1, &path), kErrInvalid, refused_);
     parent[kDescKind] = before[kDescKind];
     const u32 slot = 512 - 2 * (static_cast<u32>(path.path[2].index) + 1);
     parent[slot] = 0xFF;
     EXPECT_EQ(Tree().DeleteTree(1, &path), kErrInvalid);
-    EXPECT_EQ(tree_->capture.Take().back(), refused[0]);
+    EXPECT_EQ(tree_->capture.Take().back(), refused_[0]);
     std::copy(before.begin(), before.end(), parent);
     const u16 depth = std::exchange(Tree().header.treeDepth, u16{0});
-    ExpectRefused(Tree().DeleteTree(1, &path), kErrInvalid, refused);
+    ExpectRefused(Tree().DeleteTree(1, &path), kErrInvalid, refused_);
     Tree().header.treeDepth = depth;
     EXPECT_EQ(Tree().DeleteTree(1, &path), kOk);
 }

@@ -4,9 +4,11 @@
 
 #include <algorithm>
 #include <cstring>
+#include <utility>
 
 #include "bench.h"
 #include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/node_desc.h"
 #include "platform/heap.h"
 
 namespace VELK::test {
@@ -102,6 +104,58 @@ TEST_F(FindAgain, ChildrenExchangedInTheRootAreFollowed) {
     bench_->findData.ClearPath();
     EXPECT_EQ(Find(0), kOk);
     EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// A first key out of the ordinary is no bound: the way down is walked, and meets it only where the
+// search probes it.
+TEST_F(FindAgain, AFirstKeyThatCannotBeReadIsNoShortcut) {
+    EXPECT_EQ(Find(1), kOk);
+    HfsNode* leaf = bench_->findData.path[1].node;
+    const int count = static_cast<int>(NumRecords(leaf));
+    ASSERT_GE(count, 4);
+    NodeKey first;
+    ASSERT_EQ(leaf->GetKey(&bench_->header, 0, &first), kOk);
+    const u8 before = std::exchange(first.ptr[0], u8{0xFF});
+    const u32 middle = static_cast<u32>(count - 1) / 2;
+    EXPECT_EQ(Find(middle), kOk);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+    EXPECT_EQ(Find(0), kErrCorrupt);
+    EXPECT_FALSE(bench_.capture.Take().empty());
+    first.ptr[0] = before;
+    EXPECT_EQ(Find(0), kOk);
+}
+
+// The same exchange in a root that was read, and has room to remember its records. Keys that differ
+// from all separators in what is remembered are led down without a look at the root's keys.
+TEST(FindRemembered, ChildrenExchangedInTheRootAreFollowed) {
+    Bench bench(Blocks(512));
+    TreeShape shape;
+    shape.recordsPerLeaf = 2;
+    std::vector<TreeRecord> records;
+    for (u32 n = 0; n < 8; ++n) {
+        records.push_back({DiskCatKey(10 + n, u"a"), Pattern(8, n)});
+    }
+    bench.Open(BuildTree(shape, records));
+    const auto find = [&](u32 n) {
+        return bench->FindRecord(HostCatKey(10 + n, u"a"), 10 + n, nullptr, 0, nullptr, nullptr);
+    };
+    const auto exchangeEnds = [&] {
+        const HfsNode* root = bench->findData.path[2].node;
+        NodeKey first;
+        NodeKey last;
+        ASSERT_EQ(root->GetKey(&bench->header, 0, &first), kOk);
+        ASSERT_EQ(root->GetKey(&bench->header, 3, &last), kOk);
+        std::swap_ranges(first.data, first.data + kChildSize, last.data);
+    };
+    for (const int expected : {kOk, kErrNotFound, kOk}) {
+        for (u32 round = 0; round < 2; ++round) {
+            EXPECT_EQ(find(1), expected);
+            EXPECT_EQ(find(7), expected);
+            EXPECT_EQ(find(3), kOk);
+        }
+        exchangeEnds();
+    }
+    EXPECT_EQ(bench.capture.Take(), Events{});
 }
 
 TEST_F(FindAgain, APathClearedMeanwhileIsWalkedAgain) {

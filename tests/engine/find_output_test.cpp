@@ -48,6 +48,33 @@ TEST_F(FindOutput, BuffersOfTheRightSizeAssertNothing) {
     EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
+// Without a hook the caller gets the key as it lies in the node, however short it is.
+TEST(FindOutputAsStored, KeysOfEveryLength) {
+    Bench bench(Blocks(512));
+    TreeShape shape;
+    std::vector<TreeRecord> records;
+    for (u32 units = 0; units < 40; ++units) {
+        records.push_back({DiskCatKey(16, std::u16string(units, u'a')), Pattern(4, units)});
+    }
+    bench.Open(BuildTree(shape, records));
+    bench->convert.KeyToMemory = nullptr;
+    HfsFindData path;
+    for (u32 units = 0; units < 40; ++units) {
+        const HostKey key = HostCatKey(16, std::u16string(units, u'a'));
+        const Bytes stored = records[units].key;
+        alignas(8) u8 room[128] = {};
+        u32 size = static_cast<u32>(stored.size());
+        bool found = false;
+        ASSERT_EQ(bench->FindEntry(key, key.id, &path, &found, nullptr, nullptr, room, &size), kOk);
+        ASSERT_TRUE(found);
+        EXPECT_EQ(size, stored.size());
+        EXPECT_EQ(Bytes(room, room + stored.size()), stored);
+        EXPECT_EQ(room[stored.size()], 0);
+    }
+    path.ClearPath();
+    EXPECT_EQ(bench.capture.Take(), Events{});
+}
+
 TEST_F(FindOutput, ASmallKeyBufferGetsTheWholeKeyAllTheSame) {
     EXPECT_EQ(Find(8, 5), kOk);
     EXPECT_EQ(keySize_, 5u);

@@ -260,6 +260,29 @@ TEST_F(InsertRefusal, SecondSeparatorWithoutRoom) {
     EXPECT_TRUE(LedgerHolds(Tree(), References(Tree().findData)));
 }
 
+// Data can be followed over three blocks at the most. What lay in three where other writers put it
+// lies in four as the first record of the new leaf, which then has no key for its parent.
+TEST_F(InsertRefusal, FirstRecordOfTheNewLeafThatCannotBeReadAnyMore) {
+    constexpr u32 kLong = 3;  // the record whose data then begins two bytes before a block ends
+    std::vector<TreeRecord> records;
+    for (u32 n = 0; n < 9; ++n) {
+        const std::u16string name(n == kLong ? 244 : 6, u'r');
+        records.push_back({DiskCatKey(10 + n, name), Pattern(1030, n)});
+    }
+    TreeShape shape;
+    shape.nodeSize = 8192;
+    shape.recordsPerLeaf = 7;
+    Open(BuildTree(shape, records));
+    EXPECT_EQ(tree_->Insert(HostCatKey(5, u"first"), Pattern(400, 9)), kErrCorrupt);
+    EXPECT_EQ(tree_->capture.Of(Event::Kind::kReport),
+              (Events{Reported(kReasonNode, 9007), Reported(kErrCorrupt, 4757),
+                      Reported(kErrCorrupt, 4593), Reported(kErrCorrupt, 5092)}));
+    EXPECT_TRUE(LedgerHolds(Tree(), References(Tree().findData)));
+    Tree().findData.ClearPath();
+    Tree().RestoreModifiedNodes();
+    EXPECT_EQ(tree_->Flushed().records, records);
+}
+
 // Direct calls below InsertRecord.
 class InsertStep : public InsertRefusal {
 protected:

@@ -6,6 +6,7 @@
 #include <cstdio>
 #include <cstdlib>
 
+#include "capture.h"
 #include "hfs/volume/wire.h"
 
 namespace VELK {
@@ -215,6 +216,7 @@ TEST(MakeVolume, RefusesWhatNoVolumeCanBe) {
 
 // A name that fits a key, but not a node with another key beside it.
 TEST(MakeVolume, ANameThatNoNodeHolds) {
+    const test::Capture capture;
     Problem problem;
     FormatOptions options;
     options.blockSize = 512;
