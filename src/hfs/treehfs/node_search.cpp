@@ -420,17 +420,28 @@ int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Searc
                    : SearchPlain<ManyBlocks, OtherKeys>(tree, node, key, result);
 }
 
-bool DescribePlain(const CBTreeHfs* tree, const HfsNode* leaf, u32 index, NodeKey* record,
-                   const BTreeKey** key) {
-    const u32 count = NumRecords(leaf);
-    if (tree->header.blocksPerNode != 1 || tree->compareKeys != CompareCatKeysCaseIns ||
-        index >= count || !TableFits(tree->header, count)) {
-        return false;
-    }
-    const QuickKeys<OneBlock, FoldedKeys> keys(&tree->header, leaf, FoldedKeys());
+namespace {
+
+template <typename Blocks>
+bool DescribeIn(const BTHeaderMem* hdr, const HfsNode* leaf, u32 index, NodeKey* record,
+                const BTreeKey** key) {
+    const QuickKeys<Blocks, FoldedKeys> keys(hdr, leaf, FoldedKeys());
     const u8* bytes = keys.KeyAt(index);
     *key = reinterpret_cast<const BTreeKey*>(bytes);
     return bytes != nullptr && keys.Describe(index, bytes, record);
+}
+
+}  // namespace
+
+bool DescribePlain(const CBTreeHfs* tree, const HfsNode* leaf, u32 index, NodeKey* record,
+                   const BTreeKey** key) {
+    const BTHeaderMem* hdr = &tree->header;
+    const u32 count = NumRecords(leaf);
+    if (tree->compareKeys != CompareCatKeysCaseIns || index >= count || !TableFits(*hdr, count)) {
+        return false;
+    }
+    return hdr->blocksPerNode == 1 ? DescribeIn<OneBlock>(hdr, leaf, index, record, key)
+                                   : DescribeIn<ManyBlocks>(hdr, leaf, index, record, key);
 }
 
 bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key,
@@ -453,22 +464,31 @@ bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key,
 
 namespace {
 
-// The child of a plain record in a node of one block; 0: the record is not so plain.
-u32 PlainChild(const BTHeaderMem* hdr, const HfsNode* node, s32 index) {
-    const u32 count = NumRecords(node);
-    if (hdr->blocksPerNode != 1 || index < 0 || static_cast<u32>(index) >= count ||
-        kSlotSize * (count + 1) >= hdr->nodeSize) {
-        return 0;
-    }
-    const u8* data = node->bufs[0].data;
-    const u32 start = GetBe16(data + SlotOffset(hdr, static_cast<u32>(index)));
-    const u32 end = GetBe16(data + SlotOffset(hdr, static_cast<u32>(index) + 1));
+// The child of a record of which length field and child lie in one block each; 0: the record is not
+// so plain.
+template <typename Blocks>
+u32 PlainChildIn(const BTHeaderMem* hdr, const HfsNode* node, u32 index) {
+    const Blocks blocks(hdr, node);
+    const u32 slots = blocks.SlotPair(index);
+    const u32 start = slots & 0xFFFF;
+    const u32 end = slots >> 16;
     if (HFS_UNLIKELY(end >= hdr->nodeSize || start + kKeyLengthSize > end) ||
         HFS_UNLIKELY(Kind(node) != kBTIndexNode) ||
-        HFS_UNLIKELY(PaddedKeySize(GetBe16(data + start)) + kChildSize != end - start)) {
+        HFS_UNLIKELY(!blocks.IsWhole(start, kKeyLengthSize)) ||
+        HFS_UNLIKELY(PaddedKeySize(GetBe16(blocks.At(start))) + kChildSize != end - start) ||
+        HFS_UNLIKELY(!blocks.IsWhole(end - kChildSize, kChildSize))) {
         return 0;
     }
-    return GetBe32(data + end - kChildSize);
+    return GetBe32(blocks.At(end - kChildSize));
+}
+
+u32 PlainChild(const BTHeaderMem* hdr, const HfsNode* node, s32 index) {
+    const u32 count = NumRecords(node);
+    if (index < 0 || static_cast<u32>(index) >= count || !TableFits(*hdr, count)) {
+        return 0;
+    }
+    return hdr->blocksPerNode == 1 ? PlainChildIn<OneBlock>(hdr, node, static_cast<u32>(index))
+                                   : PlainChildIn<ManyBlocks>(hdr, node, static_cast<u32>(index));
 }
 
 }  // namespace
@@ -479,7 +499,7 @@ int ChildOf(const CBTreeHfs* tree, const HfsNode* node, s32 index, u32* child) {
 }
 
 u32 RememberedChild(const CBTreeHfs* tree, const HfsNode* node, s32 index, bool* isStale) {
-    if (node->hints == nullptr || tree->header.blocksPerNode != 1) {
+    if (node->hints == nullptr) {
         return 0;
     }
     u32 child = Separators(tree, node).Child(static_cast<u32>(index));

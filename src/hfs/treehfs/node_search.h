@@ -58,8 +58,9 @@ int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Searc
 // that this can be told at once.
 bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, SearchResult* result);
 
-// What delivery needs of record `index` of a leaf in one block whose keys are in folded order: what
-// FetchKey would give. False, nothing reported: something about it is out of the ordinary.
+// What delivery needs of record `index` of a leaf whose keys are in folded order: what FetchKey
+// would give. False, nothing reported: something about it is out of the ordinary, or its key or
+// data lies in two blocks.
 bool DescribePlain(const CBTreeHfs* tree, const HfsNode* leaf, u32 index, NodeKey* record,
                    const BTreeKey** key);
 
