@@ -36,14 +36,12 @@ public:
         if (offset > size_ || bytes > size_ - offset) {
             return {kIoPastEnd, offset};
         }
-        u8* out = static_cast<u8*>(target);
-        if (offset < start_.size() && bytes <= start_.size() - offset) {
-            std::memcpy(out, start_.data() + offset, bytes);
-            return {};
+        std::memset(target, 0, bytes);
+        u64 sectorAt = offset / kPeriod * kPeriod + kHeaderOffset;
+        for (; sectorAt < offset + bytes; sectorAt += kPeriod) {
+            CopyShared(sector_, sectorAt, target, offset, bytes);
         }
-        for (std::size_t i = 0; i < bytes; ++i) {
-            out[i] = At(offset + i);
-        }
+        CopyShared(start_, 0, target, offset, bytes);
         return {};
     }
     IoResult Write(u64 offset, const void*, std::size_t) override { return {kIoReadOnly, offset}; }
@@ -52,14 +50,16 @@ public:
     u32 reads = 0;
 
 private:
-    u8 At(u64 offset) const {
-        if (offset < start_.size()) {
-            return start_[static_cast<std::size_t>(offset)];
+    // What `source`, which lies at `at`, shares with the `bytes` bytes at `offset`. In one piece:
+    // the fuzzer watches every comparison made here.
+    static void CopyShared(const test::Bytes& source, u64 at, void* target, u64 offset,
+                           std::size_t bytes) {
+        const u64 first = std::max(at, offset);
+        const u64 end = std::min(at + source.size(), offset + bytes);
+        if (first < end) {
+            std::memcpy(static_cast<u8*>(target) + (first - offset), source.data() + (first - at),
+                        static_cast<std::size_t>(end - first));
         }
-        const u64 within = offset % kPeriod;
-        return within >= kHeaderOffset && within < kHeaderOffset + kHeaderSize
-                   ? sector_[static_cast<std::size_t>(within - kHeaderOffset)]
-                   : u8{0};
     }
 
     u64 size_;

@@ -14,12 +14,16 @@ targets=("$@")
 [ ${#targets[@]} -gt 0 ] || targets=(node finder script journal open ops image)
 "$build/fuzz_seeds" "$work/seeds"
 
+# Whole volumes are made and dropped with every input: their memory is kept for the next one.
+export GLIBC_TUNABLES=glibc.malloc.mmap_threshold=67108864:glibc.malloc.trim_threshold=268435456
+
 # Longest input worth trying, by target: the longest seeds and a little more.
 most_bytes() {
     case $1 in
         node) echo 4200 ;;
         finder | script) echo 9000 ;;
         journal) echo 33000 ;;
+        ops) echo 6002 ;;
         *) echo 140000 ;;
     esac
 }

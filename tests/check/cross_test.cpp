@@ -303,6 +303,21 @@ TEST(CheckCross, D01KeysThatALookupMisses) {
               "more record of this node");
 }
 
+TEST(CheckCross, NothingIsReadForRulesThatNobodyWants) {
+    VolumeImage volume;
+    volume.Build();
+    const auto bytesRead = [&](u64 only) {
+        CheckOptions options = Full();
+        options.only = only;
+        return CheckBytes(volume.bytes, options).summary.bytes;
+    };
+    const u64 treesAlone = bytesRead(CheckIdBit(CheckId::N01));
+    const u64 blocks = bytesRead(CheckIdBit(CheckId::V05));
+    EXPECT_LE(treesAlone, CheckBytes(volume.bytes).summary.bytes);
+    EXPECT_GT(blocks, treesAlone);
+    EXPECT_GT(bytesRead(CheckIdBit(CheckId::V05) | CheckIdBit(CheckId::R10)), blocks);
+}
+
 TEST(CheckCross, NothingIsComparedWithADamagedTree) {
     VolumeImage volume;
     volume.Build();

@@ -9,6 +9,9 @@ program=$1 pattern=${2:-*}
 jobs=${SWEEP_JOBS:-$(nproc 2>/dev/null || echo 2)}
 logs=build/sweep/$(sha256sum "$program" | cut -c 1-12)
 mkdir -p "$logs"
+# A build in the meantime would have later parts run another program.
+[ -x "$logs/program" ] || cp "$program" "$logs/program"
+program=$logs/program
 # Trials allocate much and hold little: short stacks and a small quarantine save a fifth.
 export ASAN_OPTIONS=malloc_context_size=4:quarantine_size_mb=8:${ASAN_OPTIONS:-}
 

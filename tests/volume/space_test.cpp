@@ -1,6 +1,7 @@
 // Space of special files: pieces of fragmented volumes, forks that shrink, overflow records that
 // are damaged or cannot be written, bitmaps that are too short. No block has two owners.
 #include <gtest/gtest.h>
+#include <sys/resource.h>
 
 #include "capture.h"
 #include "disk_builder.h"
@@ -290,6 +291,26 @@ TEST_F(Space, AnAllocationFileThatIsTooShort) {
     OpenOptions options;
     EXPECT_NE(nullptr, ImageVolume::Open(test::DeviceOf(disk), options, nullptr, &problem_))
         << problem_.Text();
+}
+
+// Marks for four billion blocks would take half a gigabyte; the file that should hold them has 512
+// bytes, or claims to be as large and is not there.
+TEST_F(Space, BlocksThatAreOnlyClaimedTakeNoMemory) {
+    const auto most = [] {
+        rusage usage = {};
+        getrusage(RUSAGE_SELF, &usage);
+        return usage.ru_maxrss;  // KiB
+    };
+    for (const u32 fileBlocks : {1u, 0xFFFFFFu}) {
+        Bytes disk = DiskVolume{}.Build();
+        const long before = most();
+        test::Put32(&disk, 1024 + 44, 0xFFFFFFF0);
+        test::Put32(&disk, 1024 + 112 + 20, fileBlocks);
+        test::Put32(&disk, 1024 + 112 + 12, fileBlocks);
+        Mount(disk);
+        EXPECT_LT(most() - before, 64 << 10);
+        EXPECT_TRUE(volume_ == nullptr || volume_->WriteObstacle()) << fileBlocks;
+    }
 }
 
 TEST_F(Space, ExtentsBehindTheVolumeTakeNoBlocks) {

@@ -303,6 +303,10 @@ void Items::CheckOverflowOwners() {
 }  // namespace
 
 void CheckItems(CheckVolumeState* state) {
+    if (!state->run->WantsAny(
+            {CheckId::R05, CheckId::R08, CheckId::R09, CheckId::R10, CheckId::V06, CheckId::V07})) {
+        return;
+    }
     Items items(state);
     items.Gather();
     items.CheckIds();

@@ -1,6 +1,7 @@
 // Counting, filtering and wording of findings; bounded reads of the source.
 #include "hfs/check/check_run.h"
 
+#include <algorithm>
 #include <cstdarg>
 #include <cstdio>
 #include <utility>
@@ -98,6 +99,10 @@ bool CheckRun::Wants(CheckId id) const {
     const u64 bit = CheckIdBit(id);
     return CheckIdOf(id).scope <= scope_ && (options_.skip & bit) == 0 &&
            (options_.only == 0 || (options_.only & bit) != 0);
+}
+
+bool CheckRun::WantsAny(std::initializer_list<CheckId> ids) const {
+    return std::any_of(ids.begin(), ids.end(), [this](CheckId id) { return Wants(id); });
 }
 
 bool CheckRun::ReportsOn(u32 fileId) const {

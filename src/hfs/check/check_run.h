@@ -2,6 +2,7 @@
 // read of the source. All parts of the checker report through it.
 #pragma once
 
+#include <initializer_list>
 #include <string>
 
 #include "hfs/check/check.h"
@@ -45,6 +46,7 @@ public:
 
     // Whether findings of `id` would be told; a costly look may be left out otherwise.
     bool Wants(CheckId id) const;
+    bool WantsAny(std::initializer_list<CheckId> ids) const;
     // True once the run must end: too many errors, or the caller wants no more.
     bool IsStopped() const { return summary_.isStopped; }
 

@@ -282,6 +282,9 @@ void Space::CheckUnclaimed() {
 }  // namespace
 
 void CheckSpace(CheckVolumeState* state) {
+    if (!state->run->WantsAny({CheckId::R06, CheckId::R08, CheckId::V05, CheckId::V06})) {
+        return;
+    }
     Space space(state);
     space.GatherSpecial();
     space.GatherExtents();
@@ -289,8 +292,7 @@ void CheckSpace(CheckVolumeState* state) {
     space.GatherAttributes();
     space.CheckOverlaps();
     space.CheckUnclaimed();
-    if (!state->run->IsStopped() &&
-        (state->run->Wants(CheckId::V05) || state->run->Wants(CheckId::V06))) {
+    if (!state->run->IsStopped() && state->run->WantsAny({CheckId::V05, CheckId::V06})) {
         CheckBitmap(state, space.Claims());
     }
 }

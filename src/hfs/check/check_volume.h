@@ -113,8 +113,9 @@ void CheckJournal(CheckVolumeState* state);
 // Bad-block records (R07).
 void CheckBadBlocks(CheckVolumeState* state);
 
-// Full runs: the catalog's items against threads, parents, counts and attributes (R05, R09, R10,
-// V06, V07); forks against each other and the allocation file (R06, R08, V05, V06).
+// Full runs: the catalog's items against threads, parents, counts and attributes, overflow extents
+// against files (R05, R08, R09, R10, V06, V07); forks against each other and the allocation file
+// (R06, R08, V05, V06). Nothing is read when none of these is wanted.
 void CheckItems(CheckVolumeState* state);
 void CheckSpace(CheckVolumeState* state);
 

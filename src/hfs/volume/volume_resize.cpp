@@ -105,8 +105,8 @@ void FreeBlocks(ImageVolume::State* state, HfsRuns* runs, u32 keep) {
 
 // The allocation file as it is needed: one bit for each block. It may be longer.
 Problem ImageVolume::State::LoadBitmap() {
+    constexpr u64 kPiece = 1u << 20;
     const u64 bytes = CeilDiv(fs.totalBlocks, 8);
-    bitmapBytes.assign(static_cast<std::size_t>(bytes), 0);
     if (MapFork(kAllocationFileId) == kErrNoMemory) {
         Problem problem = Failure("allocation file: " + StatusWithCode(kErrNoMemory), "");
         problem.status = kErrNoMemory;
@@ -121,8 +121,14 @@ Problem ImageVolume::State::LoadBitmap() {
         problem.fileId = kAllocationFileId;
         return problem;
     }
-    if (ReadBytes(*file->runs, kAllocationFileId, 0, bitmapBytes.data(), bytes) != 0) {
-        return lastIo;
+    // In pieces: how many blocks there are is what the header claims, and costs no memory before
+    // as many marks have been read.
+    for (u64 at = 0; at < bytes; at += kPiece) {
+        const u64 count = std::min(kPiece, bytes - at);
+        bitmapBytes.resize(static_cast<std::size_t>(at + count));
+        if (ReadBytes(*file->runs, kAllocationFileId, at, bitmapBytes.data() + at, count) != 0) {
+            return lastIo;
+        }
     }
     bitmap.Attach(bitmapBytes.data(), fs.totalBlocks);
     const u64 end = volumeBytes - std::min<u64>(volumeBytes, kAltHeaderFromEnd);
