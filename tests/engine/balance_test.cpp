@@ -400,6 +400,20 @@ TEST_F(FailingBalance, NewRecordIntoTheFullNodeAfterARightMove) {
     ExpectNoMemory(bench_.Right(1, HostOrder(Sized(1, 50)), &hook_), 2135);
 }
 
+// The record that is to follow the new one claims a key longer than itself.
+TEST_F(FailingBalance, MovesBehindTheNewRecord) {
+    Bytes bad = LeafOf(1024, Even(19, 50));
+    Put16(&bad, 14 + 50, 60);  // of record 1
+    bench_.LoadRaw(LeafOf(1024, {}), bad, kLeft);
+    EXPECT_EQ(bench_.Left(1, Sized(1, 50)).status, kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take().back(), Reported(kErrCorrupt, 1996));
+    bad = LeafOf(1024, Even(19, 50));
+    Put16(&bad, 14 + 50 * 17, 60);  // of the last but one
+    bench_.LoadRaw(LeafOf(1024, {}), bad, kRight);
+    EXPECT_EQ(bench_.Right(18, Sized(35, 50)).status, kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take().back(), Reported(kErrCorrupt, 2122));
+}
+
 TEST_F(FailingBalance, MovesOfSingleRecords) {
     bench_.Load({}, Even(19, 50), kLeft);
     bench_.RefuseAccess(1);

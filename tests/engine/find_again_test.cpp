@@ -158,6 +158,106 @@ TEST(FindRemembered, ChildrenExchangedInTheRootAreFollowed) {
     EXPECT_EQ(bench.capture.Take(), Events{});
 }
 
+// Trees of one leaf, made here or read; in one block and in two; in both orders of names.
+struct LeafShape {
+    u32 nodeSize;
+    bool isOwn;
+    bool isFolded;
+};
+
+class FindInLeaf : public ::testing::TestWithParam<LeafShape> {
+protected:
+    FindInLeaf() : bench_(Blocks(512)) {}
+    ~FindInLeaf() override {
+        bench_->findData.ClearPath();
+        bench_.capture.Take();
+    }
+    void Make(const std::vector<std::u16string>& names) {
+        const LeafShape& shape = GetParam();
+        bench_->compareKeys = shape.isFolded ? CompareCatKeysCaseIns : CompareCatKeysCaseBin;
+        bench_->header.maxKeyLength = kCatMaxKeyLength;
+        bench_->header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
+        const unsigned long long size = 64 * shape.nodeSize;
+        ASSERT_EQ(bench_->Create(shape.nodeSize == 512 ? 9 : 10, 0, &size), kOk);
+        for (const std::u16string& name : names) {
+            ASSERT_EQ(bench_->InsertRecord(HostCatKey(7, name), 7, "data", 4), kOk);
+        }
+        bench_->isAllOwn = shape.isOwn;
+        bench_.Forget();
+    }
+    int Find(const std::u16string& name) {
+        return bench_->FindRecord(HostCatKey(7, name), 7, nullptr, 0, nullptr, nullptr);
+    }
+
+    Bench bench_;
+};
+
+// One name after each other one: by first units that are letters, or need more than that, or none.
+TEST_P(FindInLeaf, NamesThatDifferInTheirFirstUnits) {
+    const std::vector<std::u16string> names = {u"",  u"1",      u"B",      u"Bx",    u"D",
+                                               u"Z", u"\u00E9", u"\u03B1", u"\u4E00"};
+    const std::vector<std::u16string> absent = {u"0",  u"A",      u"C",      u"E",
+                                                u"b0", u"\u00E8", u"\u03B2", u"\u5E00"};
+    Make(names);
+    for (const std::u16string& before : names) {
+        for (std::size_t i = 0; i < names.size(); ++i) {
+            ASSERT_EQ(Find(before), kOk);
+            ASSERT_EQ(Find(names[i]), kOk);
+            ASSERT_EQ(bench_->findData.path[1].index, static_cast<s32>(i));
+        }
+        for (const std::u16string& name : absent) {
+            ASSERT_EQ(Find(before), kOk);
+            ASSERT_EQ(Find(name), kErrNotFound);
+        }
+    }
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// A last record that says it belongs in front of all, and is out of the ordinary in one way: it is
+// no bound of its leaf. The record in the middle is found without a look at it.
+TEST_P(FindInLeaf, ALastKeyThatCannotBeReadIsNoBound) {
+    Make({u"a", u"b", u"c", u"d", u"e"});
+    ASSERT_EQ(Find(u"c"), kOk);
+    HfsNode* leaf = bench_->findData.path[1].node;
+    NodeKey last;
+    ASSERT_EQ(leaf->GetKey(&bench_->header, 4, &last), kOk);
+    u8* key = last.ptr;
+    u8* slots = leaf->bufs[bench_->header.blocksPerNode - 1].data + 512 - 2 * 6;
+    const u32 start = GetBe16(slots + 2);
+    struct {
+        const char* what;
+        u8* at;
+        u32 value;
+    } const damages[] = {
+        {"a key shorter than its fixed part", key, 4},
+        {"a key longer than any", key, 600},
+        {"a key as long as the record", key, last.size - 2},
+        {"a name longer than its key", key + kCatKeyNameLength, 2},
+        {"an odd start", slots + 2, start + 1},
+        {"an end outside the node", slots, 0xFFF0},
+        {"an end before the start", slots, start},
+    };
+    for (const auto& damage : damages) {
+        const u16 value = GetBe16(damage.at);
+        PutBe32(key + kCatKeyParentId, 1);
+        PutBe16(damage.at, damage.value);
+        for (u32 time = 0; time < 2; ++time) {
+            EXPECT_EQ(Find(u"c"), kOk) << damage.what;
+            EXPECT_EQ(bench_.capture.Take(), Events{}) << damage.what;
+        }
+        PutBe16(damage.at, value);
+        PutBe32(key + kCatKeyParentId, 7);
+        EXPECT_EQ(Find(u"e"), kOk) << damage.what;
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Shapes, FindInLeaf,
+                         ::testing::Values(LeafShape{512, true, true}, LeafShape{1024, true, true},
+                                           LeafShape{512, true, false},
+                                           LeafShape{1024, true, false},
+                                           LeafShape{512, false, true},
+                                           LeafShape{1024, false, true}));
+
 TEST_F(FindAgain, APathClearedMeanwhileIsWalkedAgain) {
     EXPECT_EQ(Find(1), kOk);
     bench_->findData.ClearPath();

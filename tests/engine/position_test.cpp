@@ -63,6 +63,10 @@ TEST_P(PositionTest, WithoutACopyOrAHookNoKeyIsConverted) {
     CatalogKey key{};
     CatalogKey copy{};
     EXPECT_EQ(bench_->GetPos(&path_, &key, nullptr), Position(4, 1));
+    copy.bytes[1] = 7;
+    EXPECT_EQ(bench_->GetPos(&path_, nullptr, &copy), Position(4, 1));
+    EXPECT_EQ(copy.bytes[1], 7);
+    copy.bytes[1] = 0;
     const auto hook = std::exchange(bench_->convert.KeyToDisk, nullptr);
     key.bytes[1] = 20;
     EXPECT_EQ(bench_->GetPos(&path_, &key, &copy), Position(4, 1));

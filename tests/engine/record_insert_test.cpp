@@ -194,14 +194,17 @@ TEST_P(RecordInsert, RecordOutsideTheRecordAreaIsRefused) {
         Put16(&content, NodeSize() - 2, bad.start);
         Put16(&content, NodeSize() - 4, bad.end);
         Put16(&content, bad.start, 6);  // a short key, so that its accessor is content
-        const auto node = bench_.Node(content);
-        NodeKey key{};
-        EXPECT_EQ(tree_._InsertRecord(node->Get(), 0, 8, &key, nullptr), kErrCorrupt);
-        EXPECT_EQ(bench_.capture.Of(Event::Kind::kReport).back(), Reported(kReasonNode, 9200))
-            << bad.start << ' ' << bad.end;
-        EXPECT_EQ(node->Content(), content);
-        EXPECT_TRUE(DirtyBlocks(*node).empty());
-        bench_.capture.Take();
+        for (const bool wasMarked : {false, true}) {  // takes a shorter way where it was
+            const auto node = bench_.Node(content);
+            ASSERT_EQ(wasMarked ? tree_.SetDirty(node->Get(), 0, NodeSize()) : kOk, kOk);
+            NodeKey key{};
+            EXPECT_EQ(tree_._InsertRecord(node->Get(), 0, 8, &key, nullptr), kErrCorrupt);
+            EXPECT_EQ(bench_.capture.Of(Event::Kind::kReport).back(), Reported(kReasonNode, 9200))
+                << bad.start << ' ' << bad.end;
+            EXPECT_EQ(node->Content(), content);
+            EXPECT_EQ(DirtyBlocks(*node).empty(), !wasMarked);
+            bench_.capture.Take();
+        }
     }
 }
 
@@ -232,6 +235,7 @@ TEST_P(RecordInsert, OddKeyGetsAZeroPadByte) {
     EXPECT_EQ(Bytes(stored.begin() + 14, stored.begin() + 24),
               (Bytes{0, 3, 0x11, 0x22, 0x33, 0, 0x44, 0x55, 0xEE, 0xEE}));
     EXPECT_EQ(Get16(stored, NodeSize() - 4), 22u);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
 TEST_P(RecordInsert, EvenKeyGetsNoPadByte) {
