@@ -125,6 +125,37 @@ TEST_F(FindAgain, AFirstKeyThatCannotBeReadIsNoShortcut) {
     EXPECT_EQ(Find(0), kOk);
 }
 
+// The same names as separators: of roots in one block and in two.
+TEST(FindRemembered, SeparatorsThatDifferInTheirFirstUnits) {
+    const std::vector<std::u16string> names = {u"",  u"1",      u"B",      u"Bx",    u"D",
+                                               u"Z", u"\u00E9", u"\u03B1", u"\u4E00"};
+    for (const u32 nodeSize : {512u, 1024u}) {
+        Bench bench(Blocks(512));
+        TreeShape shape;
+        shape.nodeSize = nodeSize;
+        shape.recordsPerLeaf = 1;
+        std::vector<TreeRecord> records;
+        for (const std::u16string& name : names) {
+            records.push_back({DiskCatKey(7, name), Pattern(8, 1)});
+        }
+        bench.Open(BuildTree(shape, records));
+        const auto find = [&](const std::u16string& name) {
+            return bench->FindRecord(HostCatKey(7, name), 7, nullptr, 0, nullptr, nullptr);
+        };
+        for (u32 round = 0; round < 2; ++round) {
+            for (std::size_t i = 0; i < names.size(); ++i) {
+                EXPECT_EQ(find(names[i]), kOk) << i;
+                EXPECT_EQ(bench->findData.path[2].index, static_cast<s32>(i));
+            }
+            for (const char16_t* name : {u"0", u"C", u"b0", u"\u00E8", u"\u5E00"}) {
+                EXPECT_EQ(find(name), kErrNotFound);
+            }
+        }
+        EXPECT_EQ(bench.capture.Take(), Events{});
+        bench->findData.ClearPath();
+    }
+}
+
 // The same exchange in a root that was read, and has room to remember its records. Keys that differ
 // from all separators in what is remembered are led down without a look at the root's keys.
 TEST(FindRemembered, ChildrenExchangedInTheRootAreFollowed) {
@@ -192,12 +223,34 @@ protected:
     Bench bench_;
 };
 
-// One name after each other one: by first units that are letters, or need more than that, or none.
+// One name after each other one: by first units that are letters, or need more than that, or none;
+// each of these as the bounds of the leaf.
 TEST_P(FindInLeaf, NamesThatDifferInTheirFirstUnits) {
     const std::vector<std::u16string> names = {u"",  u"1",      u"B",      u"Bx",    u"D",
                                                u"Z", u"\u00E9", u"\u03B1", u"\u4E00"};
     const std::vector<std::u16string> absent = {u"0",  u"A",      u"C",      u"E",
                                                 u"b0", u"\u00E8", u"\u03B2", u"\u5E00"};
+    Make(names);
+    for (std::size_t first = 0; first < 4; ++first) {
+        for (const std::u16string& before : {names[first], names[5], names.back()}) {
+            for (std::size_t i = first; i < names.size(); ++i) {
+                ASSERT_EQ(Find(before), kOk);
+                ASSERT_EQ(Find(names[i]), kOk);
+                ASSERT_EQ(bench_->findData.path[1].index, static_cast<s32>(i - first));
+            }
+            for (const std::u16string& name : absent) {
+                ASSERT_EQ(Find(before), kOk);
+                ASSERT_EQ(Find(name), kErrNotFound);
+            }
+        }
+        ASSERT_EQ(bench_->DeleteRecord(HostCatKey(7, names[first]), 7, false), kOk);
+    }
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// Letters alone at both ends.
+TEST_P(FindInLeaf, BoundsThatAreLetters) {
+    const std::vector<std::u16string> names = {u"B", u"C", u"Cx", u"F", u"X"};
     Make(names);
     for (const std::u16string& before : names) {
         for (std::size_t i = 0; i < names.size(); ++i) {
@@ -205,7 +258,7 @@ TEST_P(FindInLeaf, NamesThatDifferInTheirFirstUnits) {
             ASSERT_EQ(Find(names[i]), kOk);
             ASSERT_EQ(bench_->findData.path[1].index, static_cast<s32>(i));
         }
-        for (const std::u16string& name : absent) {
+        for (const char16_t* name : {u"", u"A", u"D", u"Z", u"\u00E9"}) {
             ASSERT_EQ(Find(before), kOk);
             ASSERT_EQ(Find(name), kErrNotFound);
         }

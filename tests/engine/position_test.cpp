@@ -67,6 +67,10 @@ TEST_P(PositionTest, WithoutACopyOrAHookNoKeyIsConverted) {
     EXPECT_EQ(bench_->GetPos(&path_, nullptr, &copy), Position(4, 1));
     EXPECT_EQ(copy.bytes[1], 7);
     copy.bytes[1] = 0;
+    path_.level = 2;
+    EXPECT_EQ(bench_->GetPos(&path_, &key, nullptr) / NodeSize(), path_.path[2].node->nodeNum);
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(3151)});
+    path_.level = 1;
     const auto hook = std::exchange(bench_->convert.KeyToDisk, nullptr);
     key.bytes[1] = 20;
     EXPECT_EQ(bench_->GetPos(&path_, &key, &copy), Position(4, 1));

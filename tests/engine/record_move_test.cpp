@@ -80,6 +80,7 @@ TEST_P(MoveRecords, LeaveTheBytesThatMovesOneByOneLeave) {
 TEST_P(MoveRecords, StopAtTheRecordThatCannotBeRead) {
     for (const u32 round : {0u, 1u, 2u, 3u}) {
         const u32 moved = 1 + round / 2;
+        const u32 count = moved == 1 ? 2 : 5;  // with it as the last one, and with others behind
         const bool toTheLeft = round % 2 == 0;
         Pair pair(GetParam(), kGiven, 1);
         const u32 bad = toTheLeft ? moved : kGiven - 1 - moved;
@@ -87,10 +88,10 @@ TEST_P(MoveRecords, StopAtTheRecordThatCannotBeRead) {
         ASSERT_EQ((*pair.giver)->GetKey(&pair.bench.tree.header, static_cast<int>(bad), &record),
                   kOk);
         record.ptr[1] = 250;
-        const int status =
-            toTheLeft
-                ? MoveRecordsLeft(&pair.bench.tree, pair.receiver->Get(), pair.giver->Get(), 5)
-                : MoveRecordsRight(&pair.bench.tree, pair.receiver->Get(), pair.giver->Get(), 5);
+        const int status = toTheLeft ? MoveRecordsLeft(&pair.bench.tree, pair.receiver->Get(),
+                                                       pair.giver->Get(), count)
+                                     : MoveRecordsRight(&pair.bench.tree, pair.receiver->Get(),
+                                                        pair.giver->Get(), count);
         EXPECT_EQ(status, kErrCorrupt);
         EXPECT_EQ(GetBe16(pair.receiver->Content().data() + kDescNumRecords), 1 + moved);
         EXPECT_EQ(GetBe16(pair.giver->Content().data() + kDescNumRecords), kGiven - moved);
