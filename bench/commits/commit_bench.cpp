@@ -2,8 +2,8 @@
 // stores, on the same disk and in one run; and changes in bulk against the rate at which the disk
 // takes bytes in a row.
 //
-// usage: commit_bench FOLDER [--transactions N] [--bulk MIB] [--rounds N]
-//   N transactions, or 0 for changes in bulk alone
+// usage: commit_bench FOLDER [--transactions N] [--bulk MIB] [--rounds N] [--order ORDER]
+//   N transactions, or 0 for changes in bulk alone; ORDER of the latter: rising, none or both
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
@@ -32,6 +32,7 @@ struct Arguments {
     std::uint32_t transactions = 300;
     std::uint64_t bulkMib = 64;
     std::uint32_t rounds = 3;
+    std::string order = "both";
 };
 
 struct Figures {
@@ -40,6 +41,10 @@ struct Figures {
     double syncedWrites = 0;
     double bytes = 0;
 };
+
+bool IsOrder(const std::string& word) {
+    return word == "rising" || word == "none" || word == "both";
+}
 
 using Clock = std::chrono::steady_clock;
 
@@ -223,6 +228,9 @@ void MeasureBulks(const Arguments& arguments) {
     std::printf("%-18s %10s %8s %9s %9s %9s %14s %14s\n", "", "MB written", "commits", "disk s",
                 "commits s", "all s", "commits' rate", "rate of all");
     for (const bool inOrder : {true, false}) {
+        if (arguments.order == (inOrder ? "none" : "rising")) {
+            continue;
+        }
         std::vector<BulkFigures> rounds;
         for (std::uint32_t round = 0; round < arguments.rounds; ++round) {
             rounds.push_back(MeasureBulk(arguments, inOrder ? rising : Shuffled(count)));
@@ -250,6 +258,8 @@ int main(int count, char** words) {
         } else if (word == "--rounds" && value != 0) {
             arguments.rounds = static_cast<std::uint32_t>(value);
             ++i;
+        } else if (word == "--order" && hasValue && bench::IsOrder(words[i + 1])) {
+            arguments.order = words[++i];
         } else if (arguments.folder.empty() && word[0] != '-') {
             arguments.folder = word;
         } else {
@@ -260,7 +270,7 @@ int main(int count, char** words) {
     if (arguments.folder.empty()) {
         std::fprintf(stderr,
                      "usage: commit_bench FOLDER [--transactions N] [--bulk MIB] "
-                     "[--rounds N]\n");
+                     "[--rounds N] [--order rising|none|both]\n");
         return 16;
     }
     std::filesystem::create_directories(arguments.folder);

@@ -198,11 +198,39 @@ IoResult OverlayDevice::Write(u64 offset, const void* source, std::size_t bytes)
     return {};
 }
 
+// One after the other: a page that took its successors along would do so at any depth.
+OverlayDevice::~OverlayDevice() {
+    while (spare_) {
+        spare_ = std::move(spare_->next);
+    }
+}
+
+// Changes that come in batches find the memory of the batch before: given back, the host would take
+// it away and clear it again for each batch.
+void OverlayDevice::Drop() {
+    for (auto& entry : pages_) {
+        entry.second->next = std::move(spare_);
+        spare_ = std::move(entry.second);
+    }
+    pages_.clear();
+}
+
+// A page without changes; null: out of memory.
+std::unique_ptr<OverlayDevice::Page> OverlayDevice::NewPage() {
+    if (!spare_) {
+        return std::unique_ptr<Page>(new (std::nothrow) Page);
+    }
+    std::unique_ptr<Page> page = std::move(spare_);
+    spare_ = std::move(page->next);
+    page->changed = 0;
+    return page;
+}
+
 // A range inside one page. A sector that is changed in part is completed from the base first.
 IoResult OverlayDevice::WritePage(u64 offset, const u8* source, u32 bytes) {
     std::unique_ptr<Page>& page = pages_[offset / kPageSize];
     if (!page) {
-        page.reset(new (std::nothrow) Page);
+        page = NewPage();
         if (!page) {
             pages_.erase(offset / kPageSize);
             return {kIoNoMemory, offset};

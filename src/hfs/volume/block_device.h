@@ -150,12 +150,14 @@ public:
 
     // One page of changes: sectors of `changed` hold `bytes`, the others are the base's.
     struct Page {
-        u8 changed = 0;       // bit i: sector i
-        u8 bytes[kPageSize];  // those of unchanged sectors say nothing
+        u8 bytes[kPageSize];         // those of unchanged sectors say nothing
+        u8 changed = 0;              // bit i: sector i
+        std::unique_ptr<Page> next;  // of the spare ones
     };
 
     // Without changes. `base` stays the caller's.
     explicit OverlayDevice(BlockDevice* base) : base_(base) {}
+    ~OverlayDevice() override;
 
     u64 Size() const override { return base_->Size(); }
     bool IsWritable() const override { return true; }
@@ -174,15 +176,17 @@ public:
     const Page* PageAt(u64 number) const;
     // Reads as Read does; for those who hold the device constant.
     IoResult Peek(u64 offset, void* target, std::size_t bytes) const;
-    // Forgets every change.
-    void Drop() { pages_.clear(); }
+    // Forgets every change. Keeps the memory for the changes to come.
+    void Drop();
 
 private:
+    std::unique_ptr<Page> NewPage();
     IoResult ReadPage(u64 offset, u8* target, u32 bytes) const;
     IoResult WritePage(u64 offset, const u8* source, u32 bytes);
 
     BlockDevice* base_;
     std::unordered_map<u64, std::unique_ptr<Page>> pages_;
+    std::unique_ptr<Page> spare_;  // first of those whose changes were forgotten
 };
 
 }  // namespace VELK
