@@ -9,6 +9,11 @@ std::unique_ptr<Store> MakeStore(const std::string& name, const Workload& load,
                                  const std::string& folder) {
     std::filesystem::remove_all(folder);
     std::filesystem::create_directories(folder);
+    return OpenStore(name, load, folder);
+}
+
+std::unique_ptr<Store> OpenStore(const std::string& name, const Workload& load,
+                                 const std::string& folder) {
     if (name == "treehfs") {
         return MakeTreehfs(load, 1);
     }
@@ -17,6 +22,9 @@ std::unique_ptr<Store> MakeStore(const std::string& name, const Workload& load,
     }
     if (name == "treehfs-8blocks") {
         return MakeTreehfs(load, 8);
+    }
+    if (name == "treehfs-image") {
+        return MakeImage(load, folder);
     }
     if (name == "lmdb") {
         return MakeLmdb(load, folder);

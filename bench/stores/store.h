@@ -16,6 +16,8 @@ public:
     // A phase is one transaction where the store knows transactions.
     virtual void BeginPhase(bool /*writing*/) {}
     virtual void EndPhase() {}
+    // Leaves everything in the store's files, for another process to open.
+    virtual void Keep() {}
 
     // `ascending`: records come in the store's own order.
     virtual bool Insert(std::uint32_t i, const std::uint8_t* data, std::uint32_t size,
@@ -34,12 +36,17 @@ public:
     virtual bool Less(std::uint32_t a, std::uint32_t b) const = 0;
 };
 
-// Known names: treehfs, treehfs-2blocks, treehfs-8blocks (map blocks per node), lmdb, bdb, sqlite,
-// leveldb, absl. Null: none of them. `folder` is emptied for the store to keep files in.
+// Known names: treehfs, treehfs-2blocks, treehfs-8blocks (map blocks per node), treehfs-image,
+// lmdb, bdb, sqlite, leveldb, absl. Null: none of them. `folder` is emptied for the store to keep
+// files in.
 std::unique_ptr<Store> MakeStore(const std::string& name, const Workload& load,
+                                 const std::string& folder);
+// The same on what the folder holds, of those that keep files.
+std::unique_ptr<Store> OpenStore(const std::string& name, const Workload& load,
                                  const std::string& folder);
 
 std::unique_ptr<Store> MakeTreehfs(const Workload& load, std::uint32_t blocksPerNode);
+std::unique_ptr<Store> MakeImage(const Workload& load, const std::string& folder);
 std::unique_ptr<Store> MakeLmdb(const Workload& load, const std::string& folder);
 std::unique_ptr<Store> MakeBdb(const Workload& load, const std::string& folder);
 std::unique_ptr<Store> MakeSqlite(const Workload& load, const std::string& folder);

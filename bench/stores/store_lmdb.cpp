@@ -28,7 +28,11 @@ public:
         Must(mdb_env_create(&env_));
         Must(mdb_env_set_mapsize(env_, kMapSize));
         Must(mdb_env_open(env_, folder.c_str(), MDB_WRITEMAP | MDB_NOSYNC, 0644));
-        SupplyFile(load.count * kBytesPerRecord);
+        MDB_envinfo info;
+        Must(mdb_env_info(env_, &info));
+        if (info.me_last_txnid == 0) {
+            SupplyFile(load.count * kBytesPerRecord);
+        }
     }
     ~LmdbStore() override { mdb_env_close(env_); }
 

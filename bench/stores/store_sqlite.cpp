@@ -19,7 +19,7 @@ public:
         Run("PRAGMA synchronous=OFF");
         Run("PRAGMA locking_mode=EXCLUSIVE");
         Run("PRAGMA cache_size=-4000000");
-        Run("CREATE TABLE records(key BLOB PRIMARY KEY, data BLOB) WITHOUT ROWID");
+        Run("CREATE TABLE IF NOT EXISTS records(key BLOB PRIMARY KEY, data BLOB) WITHOUT ROWID");
         insert_ = Prepare("INSERT INTO records VALUES(?1,?2)");
         lookup_ = Prepare("SELECT data FROM records WHERE key=?1");
         update_ = Prepare("UPDATE records SET data=?2 WHERE key=?1");
