@@ -117,6 +117,42 @@ TEST_F(Export, RecordsThatExistAreRefusedReplacedOrStopIt) {
     EXPECT_EQ(stopped.exitCode, 1);
 }
 
+// One is larger than a node, which shows before anything is touched. The other is not, but leaves
+// no room for the node's own bytes: that shows when the record in its place was taken out already.
+TEST_F(Export, ARecordWhoseSuccessorFitsNowhereStays) {
+    const std::string copy = TempPath("copy.img");
+    Apply("1M,node=1024",
+          "use attributes\ninsert 17:bytes inline{\"ab\"}\ninsert 17:text inline{\"text\"}\n",
+          {"--save", copy, "--force"});
+    const std::string header =
+        "{\"schema\":\"treehfs.records/1\",\"tree\":\"attributes\",\"node_size\":1024}\n";
+    const auto line = [](const std::string& name, const std::string& size, std::size_t count) {
+        std::string value;
+        for (std::size_t i = 0; i < count; ++i) {
+            value += "78";
+        }
+        return "{\"key\":{\"file\":17,\"name\":\"" + name +
+               "\"},\"type\":\"inline\",\"raw\":\"000000100000000000000000" + size + value +
+               "\"}\n";
+    };
+    const std::vector<std::string> arguments = {copy, "--on-exists", "replace", "--write", "-q"};
+    const Transcript larger =
+        Imported(header + line("text", "0000044c", 1100) + line("bytes", "00000003", 3), arguments);
+    EXPECT_EQ(larger.out, "0 inserted, 1 replaced, 1 refused\n") << larger.err;
+    EXPECT_EQ(larger.exitCode, 1);
+    const Transcript tight =
+        Imported(header + line("bytes", "00000002", 2) + line("text", "000003d8", 984), arguments);
+    EXPECT_EQ(tight.err, "treehfs: FILE: line 3: invalid (A0000101): nothing was kept\n");
+    EXPECT_EQ(tight.exitCode, 8);
+    const std::string out = RunTool("export", {"-t", "attributes", "--no-raw", copy}).out;
+    EXPECT_EQ(out.substr(out.find('\n') + 1, out.find("{\"summary\"") - out.find('\n') - 1),
+              "{\"key\":{\"file\":17,\"name\":\"bytes\"},\"type\":\"inline\",\"size\":3,"
+              "\"text\":\"xxx\"}\n"
+              "{\"key\":{\"file\":17,\"name\":\"text\"},\"type\":\"inline\",\"size\":4,"
+              "\"text\":\"text\"}\n");
+    std::remove(copy.c_str());
+}
+
 TEST_F(Export, ImportedRecordsAreKeptByWrite) {
     const std::string copy = TempPath("copy.img");
     Apply("1M,empty", "", {"--save", copy, "--force"});
