@@ -2,11 +2,12 @@
 """The engine beside other ordered stores: the same records, the same operations, in turn.
 
 usage: stores.py --build BUILD_FOLDER [--records N] [--rounds N] [--stores A,B,...] [--seed N]
-                 [--open]
+                 [--open | --reads]
 
 Prints operations a second and, beside each, the ratio to LMDB; all figures go to
-build/bench/stores.json. With --open: what a fresh process pays that opens a store's file and looks
-1,000 records up; these go to build/bench/open.json. A store that answers wrongly ends the run."""
+build/bench/stores.json. With --reads: only a load and what reads, for many records. With --open:
+what a fresh process pays that opens a store's file and looks 1,000 records up; these go to
+build/bench/open.json. A store that answers wrongly ends the run."""
 
 import argparse
 import json
@@ -24,7 +25,9 @@ BASE = "lmdb"
 
 def measure(program, store, options, round_number):
     folder = WORK / "stores"
-    done = subprocess.run([program, store, str(options.records), str(options.seed), str(folder)],
+    part = ["read"] if options.reads else []
+    done = subprocess.run([program, store, str(options.records), str(options.seed), str(folder)]
+                          + part,
                           capture_output=True, text=True, check=False)
     shutil.rmtree(folder, ignore_errors=True)
     if done.returncode != 0:
@@ -104,6 +107,7 @@ def main():
     parser.add_argument("--rounds", type=int, default=3)
     parser.add_argument("--stores")
     parser.add_argument("--open", action="store_true")
+    parser.add_argument("--reads", action="store_true")
     parser.add_argument("--seed", type=int, default=1)
     parser.add_argument("--json", help="where the figures go, build/bench/stores.json by default")
     options = parser.parse_args()

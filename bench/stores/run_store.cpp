@@ -1,7 +1,10 @@
 // Runs all operations of the yardstick once on one store and prints one JSON line: seconds and
 // count of each operation, peak memory, bytes of the store. A wrong answer ends the run with 1.
 //
-//   run_store STORE RECORDS SEED FOLDER
+//   run_store STORE RECORDS SEED FOLDER [read]
+//
+// read: nothing but the load in random order and what reads, for numbers of records with which the
+// rest would take an hour.
 #include <sys/resource.h>
 
 #include <algorithm>
@@ -44,12 +47,16 @@ public:
         order_ = bench::Shuffled(load.count, 7);
     }
 
-    void Run() {
-        LoadInOrder();
-        store_.reset();
+    void Run(bool onlyReads) {
+        if (!onlyReads) {
+            LoadInOrder();
+            store_.reset();
+        }
         LoadAtRandom();
         Read();
-        Change();
+        if (!onlyReads) {
+            Change();
+        }
     }
 
     void Print() const {
@@ -231,15 +238,16 @@ private:
 }  // namespace
 
 int main(int count, char** words) {
-    if (count != 5) {
-        std::fprintf(stderr, "usage: run_store STORE RECORDS SEED FOLDER\n");
+    const bool onlyReads = count == 6 && std::string(words[5]) == "read";
+    if (count != 5 && !onlyReads) {
+        std::fprintf(stderr, "usage: run_store STORE RECORDS SEED FOLDER [read]\n");
         return 16;
     }
     const Workload load =
         bench::MakeWorkload(static_cast<std::uint32_t>(std::strtoul(words[2], nullptr, 0)),
                             std::strtoull(words[3], nullptr, 0));
     Yardstick yardstick(load, words[1], words[4]);
-    yardstick.Run();
+    yardstick.Run(onlyReads);
     yardstick.Print();
     return 0;
 }
