@@ -1,6 +1,7 @@
 // Names between UTF-8 and UTF-16, composed and decomposed, stored and shown.
 #include "hfs/names_text.h"
 
+#include <algorithm>
 #include <vector>
 
 #include "hfs/names_decompose.h"
@@ -76,6 +77,11 @@ NameUnits Replaced(NameView units, char16_t (*replace)(char16_t)) {
     return result;
 }
 
+// Such names are the same in either form.
+bool IsAscii(NameView units) {
+    return std::all_of(units.begin(), units.end(), [](char16_t unit) { return unit < 0x80; });
+}
+
 }  // namespace
 
 NameUnits UnitsFromStored(const void* bytes, unsigned count) {
@@ -120,6 +126,9 @@ bool UnitsFromUtf8(std::string_view text, NameUnits* units) {
 }
 
 NameUnits DecomposedUnits(NameView units) {
+    if (IsAscii(units)) {
+        return NameUnits(units);
+    }
     const std::vector<u16> source(units.begin(), units.end());
     std::vector<u16> target(source.size() * kMaxUnitDecomposition);
     unsigned count = 0;
@@ -129,6 +138,9 @@ NameUnits DecomposedUnits(NameView units) {
 }
 
 NameUnits ComposedUnits(NameView units) {
+    if (IsAscii(units)) {
+        return NameUnits(units);
+    }
     std::vector<u16> result(units.begin(), units.end());
     const unsigned count = ComposeName(result.data(), static_cast<unsigned>(result.size()));
     return NameUnits(result.begin(), result.begin() + count);

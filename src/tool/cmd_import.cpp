@@ -1,6 +1,10 @@
 // treehfs import: puts exported records into a tree.
+#include <unistd.h>
+
 #include <algorithm>
+#include <cerrno>
 #include <cstdio>
+#include <cstring>
 
 #include "hfs/records/json_writer.h"
 #include "hfs/records/record_json.h"
@@ -41,9 +45,16 @@ public:
     }
     bool Next(std::string* line) {
         line->clear();
-        // Unit by unit, as a line may hold zeros, where calls for whole lines would end it.
-        for (int unit = 0; unit != '\n' && (unit = getc_unlocked(file_)) != EOF;) {
-            line->push_back(static_cast<char>(unit));
+        // A line may hold zeros, at which calls for whole lines would end it.
+        for (bool isWhole = false; !isWhole && (at_ < end_ || Fill());) {
+            const char* from = piece_.data() + at_;
+            const void* end = std::memchr(from, '\n', end_ - at_);
+            isWhole = end != nullptr;
+            const std::size_t count =
+                isWhole ? static_cast<std::size_t>(static_cast<const char*>(end) - from) + 1
+                        : end_ - at_;
+            line->append(from, count);
+            at_ += count;
             if (line->size() > kMostLine) {
                 ThrowFailed(path_, "line " + std::to_string(number_ + 1) + " is too long", "");
             }
@@ -54,8 +65,23 @@ public:
     u64 Number() const { return number_; }
 
 private:
+    // The next bytes as soon as there are any: whoever types lines sees each of them taken. False:
+    // there are none.
+    bool Fill() {
+        ssize_t count = 0;
+        do {
+            count = read(fileno(file_), piece_.data(), piece_.size());
+        } while (count < 0 && errno == EINTR);
+        at_ = 0;
+        end_ = count > 0 ? static_cast<std::size_t>(count) : 0;
+        return end_ != 0;
+    }
+
     std::string path_;
     std::FILE* file_;
+    std::vector<char> piece_ = std::vector<char>(std::size_t{1} << 16);
+    std::size_t at_ = 0;   // of piece_: what was not taken yet
+    std::size_t end_ = 0;  // of piece_: what was read
     u64 number_ = 0;
 };
 

@@ -95,11 +95,11 @@ int FlatTree(ImageVolume* volume, CBTreeHfs* tree, std::vector<u8>* bytes) {
     return kOk;
 }
 
-int DigestTree(CBTreeHfs* tree, RecordDigest* digest) {
+int DigestTree(CBTreeHfs* tree, RecordDigest* digest, HeldNode::AfterUse afterUse) {
     int status = kOk;
     u32 number = tree->header.firstLeafNode;
     for (u32 hops = 0; number != 0 && hops < tree->header.totalNodes && status == kOk; ++hops) {
-        HeldNode node(tree, HeldNode::AfterUse::kKeepCached);
+        HeldNode node(tree, afterUse);
         status = node.Open(number);
         if (status != kOk) {
             break;
@@ -221,7 +221,7 @@ ScriptRunner::Outcome ScriptRunner::Stats() {
 
 ScriptRunner::Outcome ScriptRunner::Digest() {
     RecordDigest digest;
-    const int status = DigestTree(Tree(), &digest);
+    const int status = DigestTree(Tree(), &digest, HeldNode::AfterUse::kKeepCached);
     return {status, fmt::format(" digest={} records={}", digest.Text(), digest.Records())};
 }
 

@@ -17,6 +17,7 @@
 #include "tool/engine_log.h"
 #include "tool/errors.h"
 #include "tool/fault_shim.h"
+#include "tool/node_reader.h"
 #include "tool/output.h"
 #include "tool/record_digest.h"
 #include "tool/script.h"
@@ -164,7 +165,9 @@ private:
 // reads. 0, or the status of a failed read.
 int FlatTree(ImageVolume* volume, CBTreeHfs* tree, std::vector<u8>* bytes);
 
-// Digests the records along the chain of leaves; no path is moved. 0 or the status that ended it.
-int DigestTree(CBTreeHfs* tree, RecordDigest* digest);
+// Digests the records along the chain of leaves; no path is moved. A script that counts what its
+// operations find in the cache has the nodes kept. 0 or the status that ended it.
+int DigestTree(CBTreeHfs* tree, RecordDigest* digest,
+               HeldNode::AfterUse afterUse = HeldNode::AfterUse::kDrop);
 
 }  // namespace VELK::tool

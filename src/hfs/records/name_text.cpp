@@ -82,6 +82,11 @@ char* PutJsonPoint(char* out, u32 point) {
     return escape ? PutUnitEscape(out, point) : PutUtf8(out, point);
 }
 
+// What PutJsonPoint writes as it is, one byte for one.
+bool IsPlainJson(char byte) {
+    return byte >= 0x20 && byte < 0x7F && byte != '"' && byte != '\\';
+}
+
 u32 Exchange(u32 unit) {
     switch (unit) {
         case '/':
@@ -239,8 +244,15 @@ void AppendJsonUnits(std::string* out, const u8* unitsBe, u32 count) {
 void AppendJsonText(std::string* out, std::string_view text) {
     char piece[2 * kNameBytesPerUnit];
     for (std::size_t index = 0; index < text.size();) {
-        const u32 point = TakeUtf8(text, &index);
-        out->append(piece, static_cast<std::size_t>(PutJsonPoint(piece, point) - piece));
+        const std::size_t start = index;
+        while (index < text.size() && IsPlainJson(text[index])) {
+            index += 1;
+        }
+        out->append(text, start, index - start);
+        if (index < text.size()) {
+            const u32 point = TakeUtf8(text, &index);
+            out->append(piece, static_cast<std::size_t>(PutJsonPoint(piece, point) - piece));
+        }
     }
 }
 

@@ -215,10 +215,11 @@ void RecordMembers(u32 fileId, const u8* stored, u32 size, JsonWriter* json) {
         }
         return;
     }
+    const Field* const sizeField = FieldByName(*kind, "size");
+    const Field* const valenceField = FieldByName(*kind, "valence");
     for (u32 i = 0; i < kind->fieldCount; ++i) {
-        const bool always = i == 0 || FieldByName(*kind, "size") == kind->fields + i ||
-                            FieldByName(*kind, "valence") == kind->fields + i;
-        FieldMember(stored, kind->fields[i], always, json);
+        const Field* field = kind->fields + i;
+        FieldMember(stored, *field, i == 0 || field == sizeField || field == valenceField, json);
     }
     if (kind->size == kThreadFixed) {
         const u32 units = GetBe16(stored + 8);
