@@ -34,7 +34,10 @@ def stores_table(name):
     stores = read(name)["stores"]
     lines = ["| Operations a second | " + " | ".join(stores) + " | ratio to lmdb | goal |",
              "|---|" + "---:|" * (len(stores) + 2)]
+    measured = next(iter(stores.values()))[0]["operations"]
     for operation, goal in GOALS.items():
+        if operation not in measured:
+            continue
         cells = []
         for results in stores.values():
             middle, spread = rate(results, operation)
@@ -47,6 +50,24 @@ def stores_table(name):
         cells = (f"{statistics.median(result[key] for result in results) / unit:,.0f}"
                  for results in stores.values())
         lines.append(f"| {title} | " + " | ".join(cells) + " | | |")
+    return "\n".join(lines)
+
+
+def opening_table(names):
+    lines = ["| Records | Store | open, ms | 1,000 lookups, ms | both, ms | ratio to lmdb "
+             "| peak memory, MiB |", "|---:|---|" + "---:|" * 5]
+    for name in names:
+        figures = read(name)
+
+        def middle(store, key, stores=figures["stores"]):
+            return statistics.median(result[key] for result in stores[store])
+
+        for store in figures["stores"]:
+            ratio = middle("lmdb", "seconds") / middle(store, "seconds")
+            lines.append(f"| {figures['records']:,} | {store} | {middle(store, 'open') * 1e3:.2f} "
+                         f"| {middle(store, 'lookups') * 1e3:.2f} "
+                         f"| {middle(store, 'seconds') * 1e3:.2f} | {ratio:.2f} "
+                         f"| {middle(store, 'peakKiB') / 1024:.0f} |")
     return "\n".join(lines)
 
 
@@ -102,6 +123,8 @@ def main():
     plot("engine-nodes.json", "node", "nanoseconds an operation, by node size (100,000 records)")
     parts = {"stores-1000000": stores_table("stores-1000000.json"),
              "stores-100000": stores_table("stores-100000.json"),
+             "stores-10000000": stores_table("stores-10000000.json"),
+             "open": opening_table(("open-100000.json", "open-1000000.json")),
              "engine-records": engine_table("engine-records.json", "records"),
              "engine-nodes": engine_table("engine-nodes.json", "node size")}
     page = DOCS / "benchmarks.md"
