@@ -156,6 +156,99 @@ TEST(FindRemembered, SeparatorsThatDifferInTheirFirstUnits) {
     }
 }
 
+// Between good bounds: the key the search meets is told of once.
+TEST_F(FindAgain, AKeyBetweenThatCannotBeReadIsToldOnce) {
+    EXPECT_EQ(Find(1), kOk);
+    HfsNode* leaf = bench_->findData.path[1].node;
+    const int count = static_cast<int>(NumRecords(leaf));
+    ASSERT_GE(count, 4);
+    NodeKey middle;
+    ASSERT_EQ(leaf->GetKey(&bench_->header, (count - 1) / 2, &middle), kOk);
+    const u8 before = std::exchange(middle.ptr[0], u8{0xFF});
+    EXPECT_EQ(Find(0), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Reported(kReasonNode, 9006), Reported(kErrCorrupt, 3005),
+                      Reported(kErrCorrupt, 3126)}));
+    middle.ptr[0] = before;
+    EXPECT_EQ(Find(0), kOk);
+}
+
+TEST_F(FindAgain, AReferenceTooFewIsAsserted) {
+    EXPECT_EQ(Find(1), kOk);
+    bench_->findData.path[1].node->refCount = 0;
+    EXPECT_EQ(Find(1), kOk);
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(755)});
+    EXPECT_EQ(bench_->findData.path[1].node->refCount, 1);
+}
+
+TEST_F(FindAgain, AGapInThePathIsAsserted) {
+    EXPECT_EQ(Find(1), kOk);
+    HfsNode* leaf = bench_->findData.path[1].node;
+    leaf->refCount += 1;
+    bench_->findData.path[4].node = leaf;
+    EXPECT_EQ(Find(1), kOk);
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(752)});
+    EXPECT_EQ(bench_->findData.path[4].node, nullptr);
+    EXPECT_EQ(leaf->refCount, 1);
+}
+
+TEST_F(FindAgain, ANodeHandedOutMayHaveBeenWrittenTo) {
+    EXPECT_EQ(Find(1), kOk);
+    HfsNode* leaf = nullptr;
+    ASSERT_EQ(bench_->GetINode(bench_->findData.path[1].node->nodeNum, &leaf, false), kOk);
+    leaf->bufs[0].data[kDescKind] = kBTIndexNode;
+    EXPECT_EQ(Find(1), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Reported(kReasonTree, 2925), Reported(kErrCorrupt, 2982),
+                      Reported(kErrCorrupt, 3126)}));
+    leaf->bufs[0].data[kDescKind] = static_cast<u8>(kBTLeafNode);
+    leaf->refCount -= 1;
+    EXPECT_EQ(Find(1), kOk);
+}
+
+// A step of a deletion by hand: the last leaf loses the separator that leads to it.
+TEST_F(FindAgain, ALeafThatNothingLeadsToAnyMoreIsNotFound) {
+    EXPECT_EQ(Find(39), kOk);
+    ASSERT_GE(bench_->findData.path[2].index, 2);
+    EXPECT_EQ(bench_->DeleteTree(2, &bench_->findData), kOk);
+    EXPECT_EQ(Find(39), kErrNotFound);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// Moved by hand, a record lies behind the separator of the leaf it came from.
+TEST_F(FindAgain, ARecordMovedByHandIsWhereItsSeparatorSaysOrNowhere) {
+    EXPECT_EQ(Find(0), kOk);
+    HfsNode* left = bench_->findData.path[1].node;
+    const u32 count = NumRecords(left);
+    EXPECT_EQ(Find(count), kOk);
+    HfsNode* right = bench_->findData.path[1].node;
+    ASSERT_NE(left, right);
+    EXPECT_EQ(bench_->DeleteRecord(NthHostKey(4, 1).Get(), NthHostKey(4, 1).id, false), kOk);
+    ASSERT_EQ(bench_->_RotateRecordLeft(left, right), kOk);
+    EXPECT_EQ(Find(0), kOk);
+    EXPECT_EQ(Find(count), kErrNotFound);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// A record goes where the ID given with its key leads, here behind the last one of the first leaf.
+// A lookup by the ID it carries ends in the last leaf.
+TEST_F(FindAgain, AKeyGivenWithAnotherIdIsNotFoundByItsOwn) {
+    EXPECT_EQ(Find(0), kOk);
+    const u32 count = NumRecords(bench_->findData.path[1].node);
+    for (const u32 n : {1u, 2u}) {
+        const HostKey key = NthHostKey(4, n);
+        EXPECT_EQ(bench_->DeleteRecord(key.Get(), key.id, false), kOk);
+    }
+    HostKey key = NthHostKey(4, count - 1, true);
+    const u32 ownId = 0x7FFFFFFF;
+    std::memcpy(key.bytes + kCatKeyParentId, &ownId, sizeof ownId);
+    const Bytes data = Pattern(24, 1);
+    EXPECT_EQ(bench_->InsertRecord(key.Get(), key.id, data.data(), 24), kOk);
+    EXPECT_EQ(bench_->findData.path[1].index, static_cast<s32>(count - 2));
+    EXPECT_EQ(FindAt(key.Get(), ownId), kErrNotFound);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
 // The same exchange in a root that was read, and has room to remember its records. Keys that differ
 // from all separators in what is remembered are led down without a look at the root's keys.
 TEST(FindRemembered, ChildrenExchangedInTheRootAreFollowed) {
@@ -311,6 +404,57 @@ INSTANTIATE_TEST_SUITE_P(Shapes, FindInLeaf,
                                            LeafShape{512, false, true},
                                            LeafShape{1024, false, true}));
 
+// Who announces a change to a node may change its keys: what the root remembers of them is void,
+// also when its children stay.
+TEST(FindRemembered, AnAnnouncedChangeOfASeparatorIsMet) {
+    Bench bench(Blocks(512));
+    TreeShape shape;
+    shape.recordsPerLeaf = 2;
+    std::vector<TreeRecord> records;
+    for (u32 n = 0; n < 8; ++n) {
+        records.push_back({DiskCatKey(10 + n, u"a"), Pattern(8, n)});
+    }
+    bench.Open(BuildTree(shape, records));
+    const auto find = [&](u32 id) {
+        return bench->FindRecord(HostCatKey(id, u"a"), id, nullptr, 0, nullptr, nullptr);
+    };
+    EXPECT_EQ(find(10), kOk);  // the root comes in on the way down, with room to remember
+    HfsNode* root = nullptr;
+    ASSERT_EQ(bench->GetINode(bench->header.rootNode, &root, false), kOk);
+    NodeKey second;
+    ASSERT_EQ(root->GetKey(&bench->header, 1, &second), kOk);
+    for (const u32 separator : {12u, 11u, 12u}) {
+        ASSERT_EQ(bench->SetDirty(root, second.offset, second.size), kOk);
+        PutBe32(second.ptr + kCatKeyParentId, separator);
+        for (u32 round = 0; round < 2; ++round) {
+            EXPECT_EQ(find(11), separator == 12 ? kOk : kErrNotFound);
+            EXPECT_EQ(find(12), kOk);
+            EXPECT_EQ(find(15), kOk);
+        }
+    }
+    root->refCount -= 1;
+    EXPECT_EQ(bench.capture.Take(), Events{});
+}
+
+// The comparator asserts at each probe of a key at an odd address: three in the root, two in the
+// leaf.
+TEST(FindRemembered, KeysAtOddAddressesAreAssertedAtEachProbe) {
+    MemVolumeOptions options = Blocks(512);
+    options.misalign = 1;
+    Bench bench(options);
+    TreeShape shape;
+    shape.recordsPerLeaf = 2;
+    std::vector<TreeRecord> records;
+    for (u32 n = 0; n < 8; ++n) {
+        records.push_back({DiskCatKey(10 + n, u"a"), Pattern(8, n)});
+    }
+    bench.Open(BuildTree(shape, records));
+    for (u32 round = 0; round < 2; ++round) {
+        EXPECT_EQ(bench->FindRecord(HostCatKey(17, u"a"), 17, nullptr, 0, nullptr, nullptr), kOk);
+        EXPECT_EQ(bench.capture.Take(), Events(5, Asserted(71)));
+    }
+}
+
 TEST_F(FindAgain, APathClearedMeanwhileIsWalkedAgain) {
     EXPECT_EQ(Find(1), kOk);
     bench_->findData.ClearPath();
@@ -355,16 +499,18 @@ TEST_F(FindAgainOverBlocks, ALastKeyInTwoBlocksIsNoShortcut) {
     EXPECT_EQ(wide_.capture.Take(), Events{});
 }
 
-TEST_F(FindAgainOverBlocks, NoMemoryOnTheShortcutIsTriedAgainOnTheWayDown) {
+// The shortcut asks for no memory, and so no failure of it passes unseen.
+TEST_F(FindAgainOverBlocks, NoMemoryIsToldAsOnTheWayDown) {
     Insert(0, 16);
     EXPECT_EQ(FindWide(3), kOk);
     velk_heap_free(wide_->scratch);
     wide_->scratch = wide_->scratchHalf = nullptr;
     wide_.Forget();
     wide_.heap.FailNth(1);
-    EXPECT_EQ(FindWide(11), kOk);
+    EXPECT_EQ(FindWide(11), kErrNoMemory);
     EXPECT_TRUE(wide_.heap.HasFailed());
-    EXPECT_EQ(wide_.capture.Take(), Events{});
+    EXPECT_EQ(wide_.capture.Take(), Events{Reported(kErrNoMemory, 3126)});
+    EXPECT_EQ(FindWide(11), kOk);
 }
 
 }  // namespace

@@ -57,6 +57,31 @@ TEST_F(InsertRefusal, RecordLongerThanANode) {
     EXPECT_TRUE(ModifiedNodes(Tree()).empty());
 }
 
+// The map record of the header node leads to no child, whatever its bytes look like.
+TEST_F(InsertRefusal, HeaderNodeThatCallsItselfAnIndexNode) {
+    TreeImage image = Image(5);
+    image.Patch8(0, kDescKind, static_cast<u8>(kBTIndexNode));
+    image.Patch8(0, kDescHeight, 2);
+    image.Patch16(0, 248, 250);
+    image.Patch32(0, 500, image.rootNode);
+    Open(image);
+    HfsFindData path;
+    Tree().header.treeDepth = 2;
+    Tree().header.rootNode = 0;
+    ASSERT_EQ(Tree().ReadLevel(2, 0, &path), kOk);
+    ASSERT_EQ(Tree().ReadLevel(1, image.rootNode, &path), kOk);
+    path.path[2].index = 2;
+    const HostKey key = NthHostKey(kCatalogFileId, 1, true);
+    const Bytes data = Pattern(kData, 1);
+    EXPECT_EQ(Tree().InsertTree(key.Get(), data.data(), kData, path.path[1].node, 2, 1, false,
+                                &path, &Tree().convert),
+              kErrInvalid);
+    EXPECT_EQ(tree_->capture.Take(),
+              (Events{Reported(kReasonNode, 9015), Reported(kReasonInvalid, 9255)}));
+    EXPECT_TRUE(ModifiedNodes(Tree()).empty());
+    path.ClearPath();
+}
+
 TEST_F(InsertRefusal, RecordThatPassesTheSizeCheckAndFitsNoNode) {
     Open(Image(0));
     const HostKey key = NthHostKey(kCatalogFileId, 1);

@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "bench.h"
+#include "hfs/treehfs/bytes.h"
 
 namespace VELK::test {
 namespace {
@@ -184,6 +185,48 @@ TEST_P(IterateDamage, ARecordThatCannotBeLocatedIsReported) {
     EXPECT_EQ(Step(1), kErrCorrupt);
     EXPECT_EQ(Reports(), (Events{Reported(kReasonNode, kAnySite), Reported(kErrCorrupt, 3305)}));
     EXPECT_TRUE(path_.valid);
+}
+
+// The map record of the header node has no key, whatever its bytes look like.
+TEST_P(IterateDamage, TheMapRecordOfAHeaderNodeThatCallsItselfALeafHasNoKey) {
+    image_.Patch8(0, kDescKind, 0xFF);
+    image_.Patch8(0, 9, 1);
+    image_.Patch16(0, 248, 6);
+    image_.Patch32(0, 250, 2);
+    image_.Patch16(0, 254, 0);
+    bench_.Open(image_);
+    ASSERT_EQ(bench_->ReadLevel(1, 0, &path_), kOk);
+    path_.level = 1;
+    path_.valid = true;
+    path_.path[1].index = 2;
+    EXPECT_EQ(Step(0), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(),
+              (Events{Reported(kReasonNode, 9020), Reported(kErrCorrupt, 3305)}));
+}
+
+// An index node that led to itself, made a leaf: it is gone when the way on is asked for.
+TEST_P(IterateDamage, AFormerParentOfItselfIsLeftLikeAnyLeaf) {
+    image_.Patch32(10, 14 + 20, 10);
+    bench_.Open(image_);
+    const HostKey key = NthHostKey(4, 0);
+    EXPECT_EQ(bench_->FindRecord(key.Get(), key.id, nullptr, 0, nullptr, &path_), kErrCorrupt);
+    path_.ClearPath();
+    HfsNode* node = nullptr;
+    ASSERT_EQ(bench_->GetINode(10, &node, false), kOk);
+    ASSERT_EQ(bench_->SetDirty(node, 0, kDescSize), kOk);
+    PutBe32(node->bufs[0].data + kDescFLink, 2);
+    node->bufs[0].data[kDescKind] = static_cast<u8>(kBTLeafNode);
+    node->bufs[0].data[kDescHeight] = 1;
+    ASSERT_EQ(bench_->FlushINode(node), kOk);
+    ASSERT_EQ(bench_->ReadLevel(1, 10, &path_), kOk);
+    node->refCount -= 1;
+    path_.level = 1;
+    path_.valid = true;
+    bench_.Forget();
+    EXPECT_EQ(Step(4), kOk);
+    EXPECT_EQ(path_.path[1].node->nodeNum, 2u);
+    EXPECT_EQ(CachedNode(*bench_.tree, 10), nullptr);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
 TEST_P(IterateDamage, AKeyTooShortForItsKindIsReported) {

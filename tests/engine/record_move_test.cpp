@@ -109,6 +109,26 @@ TEST_P(MoveRecords, StopWhereTheReceiverIsFull) {
     EXPECT_EQ(pair.bench.capture.Take().back(), Reported(kErrInvalid, 1623));
 }
 
+// A record in front of others asks where the first of these lies: its key is read, also when all
+// that could be refused otherwise has been granted.
+TEST_P(MoveRecords, AreRefusedInFrontOfAKeyThatCannotBeRead) {
+    Pair pair(GetParam(), kGiven, 2);
+    CBTreeHfs& tree = pair.bench.tree;
+    NodeKey first;
+    ASSERT_EQ((*pair.receiver)->GetKey(&tree.header, 0, &first), kOk);
+    first.ptr[1] = 250;
+    ASSERT_EQ(tree.SetDirty(pair.giver->Get(), 0, GetParam().nodeSize), kOk);
+    ASSERT_EQ(tree.SetDirty(pair.receiver->Get(), 0, GetParam().nodeSize), kOk);
+    const Bytes given = pair.giver->Content();
+    const Bytes received = pair.receiver->Content();
+    EXPECT_EQ(MoveRecordsRight(&tree, pair.receiver->Get(), pair.giver->Get(), 3), kErrCorrupt);
+    EXPECT_EQ(pair.bench.capture.Take(),
+              (Events{Reported(kReasonNode, 9006), Reported(kErrCorrupt, 1203),
+                      Reported(kErrCorrupt, 1705)}));
+    EXPECT_EQ(pair.giver->Content(), given);
+    EXPECT_EQ(pair.receiver->Content(), received);
+}
+
 INSTANTIATE_GEOMETRIES(MoveRecords, ChangeGeometries);
 
 }  // namespace

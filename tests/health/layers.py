@@ -30,7 +30,7 @@ ENGINE_PUBLIC = {"bytes.h": "big-endian loads and stores of the whole project"}
 
 # Inside the engine, lowest first.
 LINES = [
-    "bytes node_desc report noderef",
+    "bytes node_desc report noderef own_change",
     "node_access keys_compare header_record slots hints",
     "cache cache_dirty scratch separator",
     "map_walk path_level path_find path_deliver path_check node_search",

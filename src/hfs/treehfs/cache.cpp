@@ -387,7 +387,12 @@ void PrefetchSibling(const CBTreeHfs* tree, const HfsNode* node, Side side) {
 }
 
 int CBTreeHfs::GetINode(unsigned nodeNum, HfsNode** out, bool makeEmpty) {
-    return FetchNode(this, nodeNum, makeEmpty ? NodeUse::kEmpty : NodeUse::kRead, out);
+    const int status = FetchNode(this, nodeNum, makeEmpty ? NodeUse::kEmpty : NodeUse::kRead, out);
+    if (status == kOk) {
+        isAllOwn = false;  // who asks for a node by its number may write into it
+        ForgetSeparators(this, *out);
+    }
+    return status;
 }
 
 void CBTreeHfs::PutINode(HfsNode* node, bool) {

@@ -79,9 +79,12 @@ inline bool IsMarkedLast(const CBTreeHfs* tree, const HfsNode* node, u32 offset,
            static_cast<u64>(offset) + length <= tree->header.blockSize && node->bufs[0].dirty &&
            tree->modifiedList.prev == &node->modifiedLink;
 }
-// SetDirty without a call where there is nothing to do.
+// What SetDirty does for the engine's own changes: it keeps the books of what nodes remember
+// itself.
+int MarkBytes(CBTreeHfs* tree, HfsNode* node, u32 offset, u32 length);
+// The same without a call where there is nothing to do.
 inline int MarkDirty(CBTreeHfs* tree, HfsNode* node, u32 offset, u32 length) {
-    return IsMarkedLast(tree, node, offset, length) ? kOk : tree->SetDirty(node, offset, length);
+    return IsMarkedLast(tree, node, offset, length) ? kOk : MarkBytes(tree, node, offset, length);
 }
 inline int MarkDirty(CBTreeHfs* tree, HfsNode* node, u32 offset) {
     return MarkDirty(tree, node, offset, 0);

@@ -4,6 +4,7 @@
 
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/hints.h"
+#include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/report.h"
 
 namespace VELK {
@@ -81,10 +82,8 @@ int HandOver(CBTreeHfs* tree, HfsNode* node) {
 
 }  // namespace
 
-int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset, unsigned length) {
-    if (IsMarkedLast(this, node, offset, length)) {
-        return kOk;
-    }
+int MarkBytes(CBTreeHfs* tree, HfsNode* node, u32 offset, u32 length) {
+    const BTHeaderMem& header = tree->header;
     const u64 end = static_cast<u64>(offset) + length;
     HFS_ASSERT(offset <= header.nodeSize, 776);
     HFS_ASSERT(end <= header.nodeSize, 777);
@@ -93,7 +92,14 @@ int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset, unsigned length) {
     }
     const u32 first = offset >> header.blockShift;
     const u32 last = length == 0 ? first : static_cast<u32>((end - 1) >> header.blockShift);
-    return MarkBlocks(this, node, first, last);
+    return MarkBlocks(tree, node, first, last);
+}
+
+// Somebody else is about to write into the node.
+int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset, unsigned length) {
+    isAllOwn = false;
+    ForgetSeparators(this, node);
+    return MarkDirty(this, node, offset, length);
 }
 
 int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset) {
@@ -102,6 +108,7 @@ int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset) {
 
 int CBTreeHfs::Zero(HfsNode* node) {
     pathVersion += 1;
+    NoteChange(this);
     ForgetSeparators(this, node);
     for (u32 i = 0; i < header.blocksPerNode; ++i) {
         const int status = MarkBlock(this, &node->bufs[i]);

@@ -5,6 +5,7 @@
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
+#include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/path_check.h"
 #include "hfs/treehfs/path_level.h"
 #include "hfs/treehfs/report.h"
@@ -39,7 +40,7 @@ int Unlink(CBTreeHfs* tree, HfsNode* node) {
         if (FLink(left.Get()) != node->nodeNum || !IsSiblingOf(left.Get(), node)) {
             return Fail(kErrInvalid, kReasonInvalid, 9260);
         }
-        HFS_TRY(tree->SetDirty(left.Get(), 0), 4847);
+        HFS_TRY(MarkDirty(tree, left.Get(), 0), 4847);
         SetFLink(hdr, left.Get(), next);
     } else if (IsLeaf(node)) {
         hdr->firstLeafNode = next;
@@ -51,7 +52,7 @@ int Unlink(CBTreeHfs* tree, HfsNode* node) {
         if (BLink(right.Get()) != node->nodeNum || !IsSiblingOf(right.Get(), node)) {
             return Fail(kErrInvalid, kReasonInvalid, 9261);
         }
-        HFS_TRY(tree->SetDirty(right.Get(), 0), 4860);
+        HFS_TRY(MarkDirty(tree, right.Get(), 0), 4860);
         SetBLink(hdr, right.Get(), previous);
     } else if (IsLeaf(node)) {
         hdr->lastLeafNode = previous;
@@ -89,7 +90,7 @@ int CollapseOnce(CBTreeHfs* tree, HfsNode* root, HfsFindLevel* entry) {
     unsigned childNum = 0;
     HFS_TRY(root->GetChildNodeNum(hdr, 0, &childNum), 4922);
     NodeRef child;
-    HFS_TRY(tree->GetINode(childNum, child.Out(), false), 4937);
+    HFS_TRY(FetchNode(tree, childNum, NodeUse::kRead, child.Out()), 4937);
     const u32 height = hdr->treeDepth - 1u;
     const s8 kind = height == 1 ? kBTLeafNode : kBTIndexNode;
     if (Height(child.Get()) != height || Kind(child.Get()) != kind) {
@@ -230,7 +231,9 @@ int CBTreeHfs::DeleteRecord(const void* key, unsigned keyLength, bool usePath) {
     if (status != 0) {
         return status;
     }
+    OwnChange change(this);
     HFS_TRY(DeleteTree(1, &findData), 5148);
+    change.Done();
     header.leafRecords -= 1;
     isDirty = true;
     return kOk;

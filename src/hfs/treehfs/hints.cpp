@@ -64,6 +64,9 @@ HintPlace FindHint(const CBTreeHfs* tree, const HfsNode* parent, u32 nodeNum) {
 }
 
 void SetHint(CBTreeHfs* tree, HfsNode* parent, HfsNode* child) {
+    if (parent == child) {
+        return;  // whoever leaves a node asks its parent for the way on, and the node may be gone
+    }
     ForgetHint(tree, child);
     HfsHintSet* own = SetOf(tree, parent, child->nodeNum);
     HintPlace to = {own, own->next};

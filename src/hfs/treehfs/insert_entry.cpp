@@ -1,8 +1,10 @@
 // InsertRecord: look the key up, put the record into its leaf, make sure there are nodes for splits
 // before the first one. Also the first leaf of an empty tree, and InsertTree for records that
 // start at any level.
+#include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
+#include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/path_check.h"
 #include "hfs/treehfs/report.h"
 
@@ -13,6 +15,7 @@ namespace {
 // Makes the first leaf, which is also the root, of a record. A failure leaves the leaf allocated.
 int InsertFirst(CBTreeHfs* tree, const BTreeKey* key, const void* data, u32 dataSize) {
     BTHeaderMem* hdr = &tree->header;
+    OwnChange change(tree);
     if (hdr->freeNodes == 0) {
         if (hdr->totalNodes == UINT32_MAX) {
             return Fail(kErrCorrupt, kReasonTree, 9250);
@@ -21,7 +24,7 @@ int InsertFirst(CBTreeHfs* tree, const BTreeKey* key, const void* data, u32 data
     }
     NodeRef leaf;
     HFS_TRY(tree->AllocateNode(leaf.Out()), 5034);
-    HFS_TRY(tree->SetDirty(leaf.Get(), 0), 9251);
+    HFS_TRY(MarkDirty(tree, leaf.Get(), 0), 9251);
     SetKind(hdr, leaf.Get(), kBTLeafNode);
     SetHeight(hdr, leaf.Get(), 1);
     HFS_TRY(tree->_InsertKeyRecord(leaf.Get(), 0, key, 0, data, dataSize, &tree->convert), 5046);
@@ -31,6 +34,7 @@ int InsertFirst(CBTreeHfs* tree, const BTreeKey* key, const void* data, u32 data
     hdr->firstLeafNode = leaf->nodeNum;
     hdr->lastLeafNode = leaf->nodeNum;
     tree->isDirty = true;
+    change.Done();
     return kOk;
 }
 
@@ -49,6 +53,17 @@ int ReserveForSplits(CBTreeHfs* tree) {
     }
     HFS_TRY(tree->ExtendBTree(static_cast<u32>(wanted), nullptr, nullptr), 5087);
     return kOk;
+}
+
+// Whether the key was looked up by the ID it carries. Another one leads it to a place where no
+// lookup expects what is stored. False also for a comparator whose keys are not known.
+bool CarriesId(const CBTreeHfs* tree, const void* key, u32 id) {
+    const u8* bytes = static_cast<const u8*>(key);
+    if (tree->compareKeys == CompareCatKeysCaseIns || tree->compareKeys == CompareCatKeysCaseBin) {
+        return GetHost32(bytes + kCatKeyParentId) == id;
+    }
+    return (tree->compareKeys == CompareExtentKeysPlus && GetHost32(bytes + kExtKeyFileId) == id) ||
+           (tree->compareKeys == CompareAttrKeys && GetHost32(bytes + kAttrKeyFileId) == id);
 }
 
 // After records moved and separators were replaced the tree's own path mostly leads where it did:
@@ -89,6 +104,7 @@ int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, 
         return Fail(kErrCorrupt, kReasonTree, 9254);
     }
 
+    OwnChange change(this);
     // At index 0 the leaf's first key changes, and with it the separator in the parent.
     bool inserted = false;
     if (index > 0) {
@@ -102,6 +118,10 @@ int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, 
         }
         HFS_TRY(InsertTree(searchKey, data, dataSize, leaf, index, 1, false, &findData, &convert),
                 5092);
+    }
+    change.Done();
+    isAllOwn = isAllOwn && CarriesId(this, key, keyLen);
+    if (!inserted) {
         RenewPath(this);
     }
     header.leafRecords += 1;

@@ -89,15 +89,15 @@ int LinkRight(CBTreeHfs* tree, HfsNode* node, HfsNode* fresh) {
         NodeRef right;
         HFS_TRY(FetchSibling(tree, node, Side::kRight, right.Out()), 4413);
         HFS_TRY(CheckRightSibling(right.Get(), node), 4424);
-        HFS_TRY(tree->SetDirty(right.Get(), 0), 4428);
+        HFS_TRY(MarkDirty(tree, right.Get(), 0), 4428);
         SetBLink(hdr, right.Get(), fresh->nodeNum);
     }
-    HFS_TRY(tree->SetDirty(fresh, 0), 9230);
+    HFS_TRY(MarkDirty(tree, fresh, 0), 9230);
     SetFLink(hdr, fresh, next);
     SetBLink(hdr, fresh, node->nodeNum);
     SetKind(hdr, fresh, Kind(node));
     SetHeight(hdr, fresh, Height(node));
-    HFS_TRY(tree->SetDirty(node, 0), 4449);
+    HFS_TRY(MarkDirty(tree, node, 0), 4449);
     SetFLink(hdr, node, fresh->nodeNum);
     Introduce(tree, node, fresh);
     if (IsLeaf(fresh) && next == 0) {
@@ -140,7 +140,7 @@ int GrowRoot(CBTreeHfs* tree, HfsNode* node, HfsNode* right, HfsNode** newRoot) 
     BTHeaderMem* hdr = &tree->header;
     NodeRef root;
     HFS_TRY(TakeFreeNode(tree, true, root.Out()), 4474);
-    HFS_TRY(tree->SetDirty(root.Get(), 0), 9233);
+    HFS_TRY(MarkDirty(tree, root.Get(), 0), 9233);
     SetKind(hdr, root.Get(), kBTIndexNode);
     hdr->treeDepth = static_cast<u16>(hdr->treeDepth + 1);
     SetHeight(hdr, root.Get(), hdr->treeDepth);

@@ -3,6 +3,7 @@
 // taken and left as it is when freed.
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/map_walk.h"
+#include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/report.h"
 
 namespace VELK {
@@ -65,7 +66,7 @@ int TakeFreeNode(CBTreeHfs* tree, bool forIndex, HfsNode** node) {
     if (header->freeNodes == 0) {
         return Fail(kErrCorrupt, kReasonTree, 9404);
     }
-    HFS_TRY(tree->SetDirty(walk.Node(), walk.PieceOffset()), 3721);
+    HFS_TRY(MarkDirty(tree, walk.Node(), walk.PieceOffset()), 3721);
     walk.SetBit(nodeNum);
     header->freeNodes -= 1;
     tree->isDirty = true;
@@ -82,6 +83,7 @@ int CBTreeHfs::AllocateNode(HfsNode** node) {
 }
 
 int CBTreeHfs::FreeNode(unsigned nodeNumber) {
+    NoteChange(this);
     HFS_ASSERT(nodeNumber < header.totalNodes, 3778);
     if (nodeNumber >= header.totalNodes) {
         return Fail(kErrCorrupt, kReasonTree, 9405);
@@ -102,7 +104,7 @@ int CBTreeHfs::FreeNode(unsigned nodeNumber) {
     if (header.freeNodes == kMostNodes) {
         return Fail(kErrCorrupt, kReasonTree, 9408);
     }
-    HFS_TRY(SetDirty(walk.Node(), walk.PieceOffset()), 3808);
+    HFS_TRY(MarkDirty(this, walk.Node(), walk.PieceOffset()), 3808);
     walk.ClearBit(nodeNumber);
     header.freeNodes += 1;
     isDirty = true;

@@ -3,6 +3,7 @@
 // and space_extend.cpp.
 #include "hfs/treehfs/map_walk.h"
 
+#include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/header_record.h"
 #include "hfs/treehfs/report.h"
 #include "platform/bitmap.h"
@@ -24,7 +25,7 @@ u64 MostMapRecords(const BTHeaderMem* hdr) {
 // Gets node `nodeNum` and keeps it only if it is of the kind that belongs there.
 int GetNodeOfKind(CBTreeHfs* tree, u32 nodeNum, s8 kind, HfsNode** out) {
     NodeRef node;
-    HFS_TRY(tree->GetINode(nodeNum, node.Out(), false), 9400);
+    HFS_TRY(FetchNode(tree, nodeNum, NodeUse::kRead, node.Out()), 9400);
     if (Kind(node.Get()) != kind) {
         return Fail(kErrCorrupt, kReasonTree, 3651);
     }
@@ -164,7 +165,7 @@ void MapWalk::ClearBit(u64 bit) {
 }
 
 int StoreHeader(CBTreeHfs* tree, HfsNode* node0) {
-    const int status = tree->SetDirty(node0, 0);
+    const int status = MarkDirty(tree, node0, 0);
     if (status != kOk) {
         return status;
     }

@@ -106,14 +106,16 @@ public:
         const u32 slots = blocks_.SlotPair(index);
         const u32 start = slots & 0xFFFF;
         const u32 end = slots >> 16;
-        if (HFS_UNLIKELY(end >= nodeSize_ || start >= end || (start & 1) != 0) ||
+        if (HFS_UNLIKELY(end >= nodeSize_ || start >= end) ||
             HFS_UNLIKELY(!blocks_.IsWhole(start, kKeyLengthSize))) {
             return nullptr;
         }
         const u8* key = blocks_.At(start);
         const u32 keyLength = GetBe16(key);
         const u32 padded = PaddedKeySize(keyLength);
-        if (HFS_UNLIKELY(keyLength - shape_.Fixed() > kMaxKeyLength - shape_.Fixed() ||
+        // A key at an odd address is asserted by the comparator each time it is asked.
+        if (HFS_UNLIKELY((reinterpret_cast<std::uintptr_t>(key) & 1) != 0) ||
+            HFS_UNLIKELY(keyLength - shape_.Fixed() > kMaxKeyLength - shape_.Fixed() ||
                          padded >= end - start) ||
             HFS_UNLIKELY(!blocks_.IsWhole(start, padded))) {
             return nullptr;
@@ -314,9 +316,15 @@ inline int SearchKey::Compare(const BTreeKey* nodeKey) const {
 
 namespace {
 
+// What becomes of a search that meets a key which is not quick.
+enum class Doubt {
+    kSettle,  // FetchKey has to tell
+    kGiveUp,  // it ends with kErrNotFound, before anything is said or allocated
+};
+
 // The same search with and without what the node remembers: it probes the same records.
 template <typename Blocks, typename Shape, typename Known>
-int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key,
+int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt doubt,
            const QuickKeys<Blocks, Shape>& keys, const Known& known, SearchResult* result) {
     const u32 count = NumRecords(node);
     s32 low = 0;
@@ -330,6 +338,9 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key,
             const u8* bytes = quick ? keys.KeyAt(index) : nullptr;
             const BTreeKey* nodeKey = reinterpret_cast<const BTreeKey*>(bytes);
             if (HFS_UNLIKELY(nodeKey == nullptr)) {
+                if (doubt == Doubt::kGiveUp) {
+                    return kErrNotFound;
+                }
                 const int status = FetchKey(tree, node, middle, &result->record, &nodeKey);
                 if (HFS_UNLIKELY(status != kOk)) {
                     if (status != kErrNoMemory) {
@@ -337,10 +348,11 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key,
                     }
                     return status;
                 }
+                order = key.CompareAsAsked(nodeKey);
             } else {
                 known.Learn(keys, index, bytes);
+                order = Shape::Compare(key, nodeKey);
             }
-            order = Shape::Compare(key, nodeKey);
             if (order == 0) {
                 result->found = true;
                 result->isLocated =
@@ -362,17 +374,19 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key,
 }
 
 template <typename Blocks, typename Shape>
-int SearchPlain(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
+int SearchPlain(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt doubt,
+                SearchResult* result) {
     const u32 count = NumRecords(node);
     const QuickKeys<Blocks, Shape> keys(&tree->header, node, Shape(key));
     if (HasQuickKeys(tree->header, key, count)) {
         PrefetchFor(keys, Height(node), static_cast<s32>(count) - 1);
     }
-    return Search(tree, node, key, keys, NothingKnown(), result);
+    return Search(tree, node, key, doubt, keys, NothingKnown(), result);
 }
 
 template <typename Blocks>
-int SearchKnown(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
+int SearchKnown(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt doubt,
+                SearchResult* result) {
     const u32 count = NumRecords(node);
     const QuickKeys<Blocks, FoldedKeys> keys(&tree->header, node, FoldedKeys());
     const Separators separators(tree, node);
@@ -381,14 +395,15 @@ int SearchKnown(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Sear
     } else if (HasQuickKeys(tree->header, key, count)) {
         PrefetchFor(keys, Height(node), static_cast<s32>(count) - 1);
     }
-    return Search(tree, node, key, keys, KnownSeparators(separators), result);
+    return Search(tree, node, key, doubt, keys, KnownSeparators(separators), result);
 }
 
 template <typename Blocks>
-int SearchFolded(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
+int SearchFolded(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt doubt,
+                 SearchResult* result) {
     return node->hints != nullptr && key.HasOrder()
-               ? SearchKnown<Blocks>(tree, node, key, result)
-               : SearchPlain<Blocks, FoldedKeys>(tree, node, key, result);
+               ? SearchKnown<Blocks>(tree, node, key, doubt, result)
+               : SearchPlain<Blocks, FoldedKeys>(tree, node, key, doubt, result);
 }
 
 // SearchInside without the search proper. True: the key lies between the first and the last.
@@ -408,16 +423,21 @@ bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, u32 
     return first != nullptr && key.Compare(reinterpret_cast<const BTreeKey*>(first)) >= 0;
 }
 
+int SearchByShape(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt doubt,
+                  SearchResult* result) {
+    const bool isWhole = tree->header.blocksPerNode == 1;
+    if (key.IsFolded()) {
+        return isWhole ? SearchFolded<OneBlock>(tree, node, key, doubt, result)
+                       : SearchFolded<ManyBlocks>(tree, node, key, doubt, result);
+    }
+    return isWhole ? SearchPlain<OneBlock, OtherKeys>(tree, node, key, doubt, result)
+                   : SearchPlain<ManyBlocks, OtherKeys>(tree, node, key, doubt, result);
+}
+
 }  // namespace
 
 int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
-    const bool isWhole = tree->header.blocksPerNode == 1;
-    if (key.IsFolded()) {
-        return isWhole ? SearchFolded<OneBlock>(tree, node, key, result)
-                       : SearchFolded<ManyBlocks>(tree, node, key, result);
-    }
-    return isWhole ? SearchPlain<OneBlock, OtherKeys>(tree, node, key, result)
-                   : SearchPlain<ManyBlocks, OtherKeys>(tree, node, key, result);
+    return SearchByShape(tree, node, key, Doubt::kSettle, result);
 }
 
 namespace {
@@ -437,7 +457,8 @@ bool DescribePlain(const CBTreeHfs* tree, const HfsNode* leaf, u32 index, NodeKe
                    const BTreeKey** key) {
     const BTHeaderMem* hdr = &tree->header;
     const u32 count = NumRecords(leaf);
-    if (tree->compareKeys != CompareCatKeysCaseIns || index >= count || !TableFits(*hdr, count)) {
+    if (tree->compareKeys != CompareCatKeysCaseIns || index >= count || !TableFits(*hdr, count) ||
+        leaf->nodeNum == 0) {
         return false;
     }
     return hdr->blocksPerNode == 1 ? DescribeIn<OneBlock>(hdr, leaf, index, record, key)
@@ -459,7 +480,7 @@ bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key,
         result->index = static_cast<s32>(count);
         return true;
     }
-    return isInside && SearchNode(tree, leaf, key, result) == kOk;
+    return isInside && SearchByShape(tree, leaf, key, Doubt::kGiveUp, result) == kOk;
 }
 
 namespace {
@@ -484,7 +505,8 @@ u32 PlainChildIn(const BTHeaderMem* hdr, const HfsNode* node, u32 index) {
 
 u32 PlainChild(const BTHeaderMem* hdr, const HfsNode* node, s32 index) {
     const u32 count = NumRecords(node);
-    if (index < 0 || static_cast<u32>(index) >= count || !TableFits(*hdr, count)) {
+    if (index < 0 || static_cast<u32>(index) >= count || !TableFits(*hdr, count) ||
+        node->nodeNum == 0) {
         return 0;
     }
     return hdr->blocksPerNode == 1 ? PlainChildIn<OneBlock>(hdr, node, static_cast<u32>(index))

@@ -13,6 +13,8 @@ public:
     // Order of the search key against a key of a node, as the tree's comparator has it.
     // REQUIRES: the node key is sound (see scratch.h).
     int Compare(const BTreeKey* nodeKey) const;
+    // The same by the comparator itself, which may have something to assert.
+    int CompareAsAsked(const BTreeKey* nodeKey) const { return compare_(key_, id_, nodeKey); }
     // The same of a key in folded order, as IsFolded tells.
     int CompareFolded(const BTreeKey* nodeKey) const;
     bool IsFolded() const { return isFolded_; }

@@ -131,7 +131,8 @@ int Descend(CBTreeHfs* tree, const SearchKey& key, HfsFindData* path, bool* foun
 
 // Whether going down once more would end where the tree's own path stands, without a word. Only
 // nodes this engine built are known to be in order: in a damaged tree the way down can lead to
-// another leaf, or to an error. A node with more references than expected is asserted.
+// another leaf, or to an error. A node with fewer or more references than expected is asserted, and
+// so is a path with a gap.
 bool PathStillLeads(const CBTreeHfs* tree) {
     const HfsFindData& path = tree->findData;
     const u32 depth = tree->header.treeDepth;
@@ -139,9 +140,17 @@ bool PathStillLeads(const CBTreeHfs* tree) {
         return false;
     }
     for (u32 level = 1; level <= depth; ++level) {
-        if (path.path[level].node == nullptr || path.path[level].node->refCount > 3) {
+        const HfsNode* node = path.path[level].node;
+        if (node == nullptr || node->refCount < 1 || node->refCount > 3) {
             return false;
         }
+    }
+    std::uintptr_t beyond = reinterpret_cast<std::uintptr_t>(path.path[0].node);
+    for (u32 level = depth + 1; level <= kMaxPathDepth; ++level) {
+        beyond |= reinterpret_cast<std::uintptr_t>(path.path[level].node);
+    }
+    if (beyond != 0) {
+        return false;
     }
     return path.path[depth].node->nodeNum == tree->header.rootNode;
 }

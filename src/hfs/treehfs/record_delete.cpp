@@ -2,6 +2,7 @@
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/slots.h"
 
@@ -54,6 +55,7 @@ int CloseGap(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 index
 }  // namespace
 
 int CBTreeHfs::_DeleteRecord(HfsNode* node, int index) {
+    NoteChange(this);
     const u32 count = NumRecords(node);
     const u32 record = index == -1 ? count - 1 : static_cast<u32>(index);
     HFS_ASSERT(record < count, 943);

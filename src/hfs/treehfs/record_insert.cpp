@@ -4,6 +4,7 @@
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/scratch.h"
 #include "hfs/treehfs/slots.h"
@@ -157,6 +158,7 @@ int MakeRecord(CBTreeHfs* tree, HfsNode* node, u32 index, u32 count, u32 size, N
 
 int CBTreeHfs::_InsertRecord(HfsNode* node, int index, unsigned size, NodeKey* key,
                              bool* inserted) {
+    NoteChange(this);
     const u32 count = NumRecords(node);
     if (index == -1) {
         index = static_cast<int>(count);

@@ -43,6 +43,11 @@ void MarkAgain(CBTreeHfs* tree, HfsNode* node) {
     node->modifiedLink.MoveTail(&tree->modifiedList);
 }
 
+// Whether the record is longer than its key, as GetKey wants it.
+bool HasWholeKey(const Table& table, u32 index) {
+    return table.Start(index) + PaddedKeySize(table.KeyLength(index)) < table.Start(index + 1);
+}
+
 // Whether records first .. first + count - 1 of `giver` can go to `receiver` in one go: nothing on
 // the way can be refused. REQUIRES: both tables are sound.
 bool CanMoveAtOnce(const CBTreeHfs* tree, const HfsNode* giver, const HfsNode* receiver, u32 first,
@@ -57,12 +62,18 @@ bool CanMoveAtOnce(const CBTreeHfs* tree, const HfsNode* giver, const HfsNode* r
         return false;
     }
     for (u32 i = first; i < first + count; ++i) {
-        const u32 start = table.Start(i);
-        if (start + PaddedKeySize(table.KeyLength(i)) >= table.Start(i + 1)) {
+        if (!HasWholeKey(table, i)) {
             return false;
         }
     }
     return true;
+}
+
+// Whether records can go in front of those of `receiver`: the first of these is looked at then.
+// REQUIRES: CanMoveAtOnce.
+bool CanMoveInFront(const CBTreeHfs* tree, const HfsNode* receiver) {
+    const Table table(&tree->header, receiver);
+    return table.Count() == 0 || HasWholeKey(table, 0);
 }
 
 // Closes the gap that the first `count` records of `table` leave, as if they had left one by one:
@@ -152,7 +163,8 @@ int MoveRecordsLeft(CBTreeHfs* tree, HfsNode* left, HfsNode* right, u32 count) {
 
 int MoveRecordsRight(CBTreeHfs* tree, HfsNode* right, HfsNode* left, u32 count) {
     for (; count > 0; --count) {
-        if (CanMoveAtOnce(tree, left, right, NumRecords(left) - count, count)) {
+        if (CanMoveAtOnce(tree, left, right, NumRecords(left) - count, count) &&
+            CanMoveInFront(tree, right)) {
             MoveBack(tree, right, left, count);
             MarkAgain(tree, right);
             MarkAgain(tree, left);

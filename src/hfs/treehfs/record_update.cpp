@@ -1,5 +1,6 @@
 // Overwrites the data of the record at the tree's own position. The record keeps its size, its
 // place and its key; no header field changes.
+#include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/path_level.h"
 #include "hfs/treehfs/report.h"
@@ -56,7 +57,7 @@ int CBTreeHfs::UpdateKeyAndRecord(const void* key, const void* data) {
         HFS_TRY(EnsureScratch(this), 9216);
     }
     const u32 offset = record.offset + record.size - record.dataSize;
-    HFS_TRY(SetDirty(node, offset, record.dataSize), 3586);
+    HFS_TRY(MarkDirty(this, node, offset, record.dataSize), 3586);
     return WriteData(this, node, record, offset, data);
 }
 

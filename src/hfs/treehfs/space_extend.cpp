@@ -1,6 +1,7 @@
 // Growing a tree file by whole clumps. The plan is made first and refused whole when its numbers do
 // not fit; then the fork is resized; then the map is lengthened, by new map nodes at the first of
 // the nodes gained, when it has too few bits for all of them.
+#include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/header_record.h"
 #include "hfs/treehfs/map_walk.h"
 #include "hfs/treehfs/report.h"
@@ -89,9 +90,9 @@ int PlanMap(const BTHeaderMem& header, u64 mapBits, Growth* growth) {
 int BuildMapNode(CBTreeHfs* tree, u32 nodeNum, u32 next) {
     const BTHeaderMem* hdr = &tree->header;
     NodeRef node;
-    HFS_TRY(tree->GetINode(nodeNum, node.Out(), true), 4104);
+    HFS_TRY(FetchNode(tree, nodeNum, NodeUse::kEmpty, node.Out()), 4104);
     // An emptied node has its last block marked, but its first may have been zero and stay clean.
-    HFS_TRY(tree->SetDirty(node.Get(), 0), 9425);
+    HFS_TRY(MarkDirty(tree, node.Get(), 0), 9425);
     SetKind(hdr, node.Get(), kBTMapNode);
     SetNumRecords(hdr, node.Get(), 1);
     NodePtr slot;
@@ -137,7 +138,7 @@ int MarkMapNodes(CBTreeHfs* tree, const Growth& growth, MapWalk* walk) {
         if (status != kOk) {
             return status;
         }
-        HFS_TRY(tree->SetDirty(walk->Node(), walk->PieceOffset()), 4188);
+        HFS_TRY(MarkDirty(tree, walk->Node(), walk->PieceOffset()), 4188);
         walk->SetBit(nodeNum);
     }
     return kOk;
@@ -146,7 +147,7 @@ int MarkMapNodes(CBTreeHfs* tree, const Growth& growth, MapWalk* walk) {
 // Hangs the new map nodes behind the last record of the map, at which `walk` stands.
 int AddMapNodes(CBTreeHfs* tree, const Growth& growth, MapWalk* walk) {
     HFS_ASSERT(growth.mapNodes >= 1, 4076);
-    HFS_TRY(tree->SetDirty(walk->Node(), 0), 4088);
+    HFS_TRY(MarkDirty(tree, walk->Node(), 0), 4088);
     SetFLink(&tree->header, walk->Node(), growth.oldTotal);
     if (walk->AtHeaderNode()) {
         WriteHeaderRecord(tree, walk->Node());

@@ -1,6 +1,7 @@
 // Turning an empty fork into an empty tree: node 0 is written from nothing, then the file grows to
 // its first clump. When it cannot be finished the fork is empty again; the nodes cached meanwhile
 // are the volume's to drop, by tearing the tree down.
+#include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/header_record.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
@@ -58,8 +59,8 @@ int WriteHeaderNode(CBTreeHfs* tree, HfsNode* node) {
 // Writes node 0 and grows the file. Holds node 0 no longer than that, whatever the outcome.
 int BuildTree(CBTreeHfs* tree, const unsigned long long* initialSize) {
     NodeRef node;
-    HFS_TRY(tree->GetINode(0, node.Out(), true), 5338);
-    HFS_TRY(tree->SetDirty(node.Get(), 0, tree->header.nodeSize), 5340);
+    HFS_TRY(FetchNode(tree, 0, NodeUse::kEmpty, node.Out()), 5338);
+    HFS_TRY(MarkDirty(tree, node.Get(), 0, tree->header.nodeSize), 5340);
     const int status = WriteHeaderNode(tree, node.Get());
     if (status != kOk) {
         return status;

@@ -16,8 +16,8 @@ constexpr unsigned long kFlushZeroTail = 4;  // mode bit of Flush
 
 int SaveHeader(CBTreeHfs* tree) {
     NodeRef node0;
-    HFS_TRY(tree->GetINode(0, node0.Out(), false), 3442);
-    HFS_TRY(tree->SetDirty(node0.Get(), 0), 3444);
+    HFS_TRY(FetchNode(tree, 0, NodeUse::kRead, node0.Out()), 3442);
+    HFS_TRY(MarkDirty(tree, node0.Get(), 0), 3444);
     WriteHeaderRecord(tree, node0.Get());
     tree->isDirty = false;
     return kOk;
@@ -86,7 +86,7 @@ void CBTreeHfs::RestoreModifiedNodes() {
     scratchHalf = half;
 
     NodeRef node0;
-    if (GetINode(0, node0.Out(), false) != kOk) {
+    if (FetchNode(this, 0, NodeUse::kRead, node0.Out()) != kOk) {
         return;
     }
     const BTHeaderMem before = header;

@@ -37,7 +37,7 @@ void SetProvisionalGeometry(CBTreeHfs* tree) {
 // with the provisional geometry, never stays cached.
 int LoadHeader(CBTreeHfs* tree) {
     HfsNode* node0 = nullptr;
-    HFS_TRY(tree->GetINode(0, &node0, false), 2231);
+    HFS_TRY(FetchNode(tree, 0, NodeUse::kRead, &node0), 2231);
     ReadHeaderRecord(tree, node0);
     node0->refCount -= 1;
     DropNode(tree, node0);
