@@ -397,6 +397,50 @@ TEST_P(FindInLeaf, ALastKeyThatCannotBeReadIsNoBound) {
     }
 }
 
+// Several leaves, of which each begins with a letter or with something else: from each name to
+// each.
+TEST_P(FindInLeaf, NamesOfOtherLeaves) {
+    std::vector<std::u16string> names;
+    for (const char16_t unit : std::u16string(u"1BDFHJLNPRTXZ\u00E9\u03B1\u4E00\u4E01\u4E03")) {
+        names.push_back(unit + std::u16string(60, u'x'));
+    }
+    Make(names);
+    ASSERT_GE(bench_->header.treeDepth, 2);
+    for (const std::u16string& before : names) {
+        for (const std::u16string& name : names) {
+            ASSERT_EQ(Find(before), kOk);
+            ASSERT_EQ(Find(name), kOk);
+        }
+    }
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// A first record that says it belongs in front of all, and cannot be read, is no bound either.
+TEST_P(FindInLeaf, AFirstKeyThatCannotBeReadIsNoBound) {
+    std::vector<std::u16string> names;
+    for (const char16_t unit : std::u16string(u"BDFHJLNPRTXZ")) {
+        names.push_back(unit + std::u16string(60, u'x'));
+    }
+    Make(names);
+    ASSERT_EQ(Find(names.back()), kOk);
+    NodeKey first;
+    ASSERT_EQ(bench_->findData.path[1].node->GetKey(&bench_->header, 0, &first), kOk);
+    struct {
+        u32 at;
+        u32 value;
+    } const damages[] = {{0, 4}, {0, 600}, {0, first.size - 2}, {kCatKeyNameLength, 300}};
+    for (const auto& damage : damages) {
+        const u16 value = GetBe16(first.ptr + damage.at);
+        PutBe32(first.ptr + kCatKeyParentId, 1);
+        PutBe16(first.ptr + damage.at, damage.value);
+        EXPECT_EQ(Find(names[0]), kOk) << damage.at << " " << damage.value;
+        EXPECT_EQ(bench_.capture.Take(), Events{});
+        PutBe16(first.ptr + damage.at, value);
+        PutBe32(first.ptr + kCatKeyParentId, 7);
+        EXPECT_EQ(Find(names.back()), kOk);
+    }
+}
+
 INSTANTIATE_TEST_SUITE_P(Shapes, FindInLeaf,
                          ::testing::Values(LeafShape{512, true, true}, LeafShape{1024, true, true},
                                            LeafShape{512, true, false},
