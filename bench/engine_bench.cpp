@@ -25,7 +25,8 @@ namespace VELK::bench {
 namespace {
 
 constexpr u32 kUsualNodeShift = 12;
-constexpr u32 kFolders = 1000;  // parents the names are spread over
+constexpr double kMostMemory = 1.15;  // by the bytes of the cached nodes, these included
+constexpr u32 kFolders = 1000;        // parents the names are spread over
 constexpr u32 kFolderRecord = 88;
 constexpr u32 kFileRecord = 248;
 
@@ -320,6 +321,15 @@ void Print(const Result& result) {
                 static_cast<double>(u64{result.nodesCached} << result.nodeShift) / (1 << 20));
 }
 
+// Whether the engine kept to what it may take beside the nodes; smaller nodes have a larger share.
+bool IsMemoryBounded(const Result& result) {
+    const bool isBounded = MemoryShare(result) <= kMostMemory || result.nodeShift < kUsualNodeShift;
+    if (!isBounded) {
+        std::fprintf(stderr, "engine_bench: more than %.2f times the cached nodes\n", kMostMemory);
+    }
+    return isBounded;
+}
+
 bool WriteJson(const char* name, const std::vector<Result>& results) {
     std::FILE* file = std::fopen(name, "w");
     if (file == nullptr) {
@@ -389,9 +399,11 @@ int Main(int argc, char** argv) {
         return 16;
     }
     std::vector<Result> results;
+    bool isBounded = true;
     for (u64 count : counts) {
         results.push_back(MeasureOften(count, seed, nodeShift));
         Print(results.back());
+        isBounded = IsMemoryBounded(results.back()) && isBounded;
     }
     if (results.size() > 1) {
         std::printf(
@@ -400,7 +412,8 @@ int Main(int argc, char** argv) {
             NanosecondsOf(results.back().figures[0]) / NanosecondsOf(results.front().figures[0]),
             static_cast<unsigned long long>(results.front().records));
     }
-    return json == nullptr || WriteJson(json, results) ? 0 : 8;
+    const bool isKept = json == nullptr || WriteJson(json, results);
+    return isKept && isBounded ? 0 : 8;
 }
 
 }  // namespace VELK::bench
