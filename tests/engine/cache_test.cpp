@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <functional>
 #include <random>
 
 #include "bench.h"
@@ -414,43 +415,73 @@ TEST_P(CacheTest, AMissingHandleIsAssertedAndReleasedAllTheSame) {
     bench_.volume.fs.cache.Release(handle, 0);
 }
 
-// A volume that breaks its contract: its Map asks the tree for the very node being mapped.
+// A volume that breaks its contract: its Map calls the tree once.
 class ReentrantVolume {
 public:
-    explicit ReentrantVolume(Bench* bench) : bench_(bench), next_(bench->volume.fs.service) {
+    using Inside = std::function<void(CBTreeHfs* tree)>;
+    ReentrantVolume(Bench* bench, Inside inside)
+        : bench_(bench), next_(bench->volume.fs.service), inside_(std::move(inside)) {
         bench->volume.fs.service = {};
         bench->volume.fs.service.ops = &kOps;
         bench->volume.fs.service.self = this;
     }
     ~ReentrantVolume() { bench_->volume.fs.service = next_; }
 
-    HfsNode* inner = nullptr;
-
 private:
     static int Map(void* self, CFileSystemHfs* fs, HfsRuns* runs, HfsFork* fork, u8 forkType,
                    u32 fileId, u64 byteOffset, u32 bytes, bool noRead, HfsBcbBuf* bufs) {
         auto* volume = static_cast<ReentrantVolume*>(self);
-        CBTreeHfs& tree = *volume->bench_->tree;
         fs->service = volume->next_;
-        tree.GetINode(static_cast<u32>(byteOffset >> tree.nodeShift), &volume->inner, false);
+        volume->inside_(&*volume->bench_->tree);
         return fs->Map(runs, fork, forkType, fileId, byteOffset, bytes, noRead, bufs);
     }
     static constexpr HfsVolumeOps kOps = {Map, nullptr, nullptr, nullptr};
 
     Bench* bench_;
     HfsService<HfsVolumeOps> next_;
+    Inside inside_;
 };
 
 TEST_P(CacheTest, ANumberThatIsThereAlreadyIsAssertedAndNotLinked) {
-    ReentrantVolume volume(&bench_);
+    HfsNode* inner = nullptr;
+    ReentrantVolume volume(&bench_, [&](CBTreeHfs* tree) { tree->GetINode(2, &inner, false); });
     HfsNode* outer = Get(2);
     EXPECT_EQ(bench_.capture.Take(), Events{Asserted(2706)});
-    EXPECT_NE(outer, volume.inner);
-    EXPECT_EQ(CachedNode(*bench_.tree, 2), volume.inner);
+    EXPECT_NE(outer, inner);
+    EXPECT_EQ(CachedNode(*bench_.tree, 2), inner);
     EXPECT_TRUE(LedgerHolds(*bench_.tree, 1));
     bench_->PutINode(outer, false);
     EXPECT_TRUE(LedgerHolds(*bench_.tree, 1));
     EXPECT_EQ(bench_.volume.Lent(), GetParam().Blocks());
+}
+
+// The place that was found for node 2 is the one that node 1 takes: behind node 3, in front of it.
+TEST_P(CacheTest, NodesThatCameInMeanwhileAreLinkedBesideTheNewOne) {
+    HfsNode* third = Get(3);
+    HfsNode* inner = nullptr;
+    ReentrantVolume volume(&bench_, [&](CBTreeHfs* tree) { tree->GetINode(1, &inner, false); });
+    HfsNode* outer = Get(2);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+    EXPECT_EQ(CachedNode(*bench_.tree, 1), inner);
+    EXPECT_EQ(CachedNode(*bench_.tree, 2), outer);
+    EXPECT_EQ(CachedNode(*bench_.tree, 3), third);
+    EXPECT_TRUE(LedgerHolds(*bench_.tree, 3));
+}
+
+// As many nodes are cached as before, and the one that the place hangs from is gone.
+TEST_P(CacheTest, ANodeThatLeftMeanwhileIsNotLinkedTo) {
+    HfsNode* third = Get(3);
+    HfsNode* inner = nullptr;
+    ReentrantVolume volume(&bench_, [&](CBTreeHfs* tree) {
+        tree->PutINode(third, false);
+        tree->GetINode(1, &inner, false);
+    });
+    HfsNode* outer = Get(2);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+    EXPECT_EQ(CachedNode(*bench_.tree, 1), inner);
+    EXPECT_EQ(CachedNode(*bench_.tree, 2), outer);
+    EXPECT_EQ(CachedNode(*bench_.tree, 3), nullptr);
+    EXPECT_TRUE(LedgerHolds(*bench_.tree, 2));
 }
 
 INSTANTIATE_GEOMETRIES(CacheTest, FewGeometries);
