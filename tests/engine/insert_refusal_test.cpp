@@ -227,6 +227,24 @@ TEST_F(InsertRefusal, MapThatCallsTheFullLeafFree) {
                  Upwards({Asserted(4404), Reported(kReasonTree, 9232)}, kErrCorrupt));
 }
 
+// The key lies in front of all nodes in memory, so in none.
+TEST_F(InsertRefusal, AFreeNodeThatSomebodyHoldsIsTakenWithAnAssertion) {
+    static HostKey key;
+    key = NthHostKey(kCatalogFileId, 1, true);
+    TreeImage image = Image(3 * kFit);
+    Open(image);
+    HfsNode* held = nullptr;
+    ASSERT_EQ(Tree().GetINode(Tree().header.totalNodes - Tree().header.freeNodes, &held, true), 0);
+    EXPECT_LT(reinterpret_cast<std::uintptr_t>(key.Get()),
+              reinterpret_cast<std::uintptr_t>(held->bufs[0].data));
+    const Bytes data = Pattern(kData, 1);
+    EXPECT_EQ(Tree().InsertRecord(key.Get(), key.id, data.data(), kData), kOk);
+    EXPECT_EQ(tree_->capture.Take(), Events{Asserted(4404)});
+    EXPECT_EQ(Tree().FindRecord(key.Get(), key.id, nullptr, 0, nullptr, nullptr), kOk);
+    EXPECT_EQ(held->refCount, 1);
+    Tree().PutINode(held, false);
+}
+
 // The separator on its way up lies in the leaf that the map calls free: emptied and refilled, it
 // would be read as something else.
 TEST_F(InsertRefusal, MapThatCallsTheNodeOfASeparatorFree) {
