@@ -230,7 +230,6 @@ TEST_F(FindAgain, ARecordMovedByHandIsWhereItsSeparatorSaysOrNowhere) {
     EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
-// A record goes where the ID given with its key leads, here behind the last one of the first leaf.
 // The same exchange in a root that was read, and has room to remember its records. Keys that differ
 // from all separators in what is remembered are led down without a look at the root's keys.
 TEST(FindRemembered, ChildrenExchangedInTheRootAreFollowed) {

@@ -57,6 +57,7 @@ TEST_P(FindInOrder, RecordsAreWhereTheyWerePut) {
     EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
+// A record goes where the ID given with its key leads, here behind the last one of the first leaf.
 // A lookup by the ID it carries ends in the last leaf.
 TEST_P(FindInOrder, AKeyGivenWithAnotherIdIsNotFoundByItsOwn) {
     EXPECT_EQ(Find(Key(0), Key(0).id), kOk);
