@@ -34,6 +34,9 @@ libfuzzer_run() {
         "$work/$1" "$work/seeds/$1" "$here/corpus/$1" >"$work/$1.log" 2>&1
 }
 
+# New code is looked for as long as it turns up; too short a run says nothing of that.
+libfuzzer_edges() { awk -v enough=50000 -f "$here/edges.awk" "$work/$1.log"; }
+
 libfuzzer_runs() { sed -n 's/^stat::number_of_executed_units: *//p' "$work/$1.log"; }
 
 # Inputs that ended a run lie in AFL++'s folder of crashes and hangs.
@@ -49,7 +52,11 @@ afl_run() {
     [ -z "$(find "$to/default/crashes" "$to/default/hangs" -type f -name 'id:*')" ]
 }
 
-afl_runs() { sed -n 's/^execs_done *: *//p' "$work/afl-$1/default/fuzzer_stats"; }
+afl_stat() { sed -n "s/^$2 *: *//p" "$work/afl-$1/default/fuzzer_stats"; }
+
+afl_edges() { echo "$(afl_stat "$1" edges_found) edges"; }
+
+afl_runs() { afl_stat "$1" execs_done; }
 
 # The canary's input is in its corpus, so the targets' seeds are not needed to kill it.
 libfuzzer_canary() {
@@ -66,11 +73,13 @@ case $fuzzer in
         canary() { libfuzzer_canary; }
         run_target() { libfuzzer_run "$1"; }
         runs_of() { libfuzzer_runs "$1"; }
+        edges_of() { libfuzzer_edges "$1"; }
         ;;
     afl)
         canary() { afl_canary; }
         run_target() { afl_run "$1"; }
         runs_of() { afl_runs "$1"; }
+        edges_of() { afl_edges "$1"; }
         ;;
 esac
 
@@ -89,7 +98,8 @@ for target in "${targets[@]}"; do
     fi
     mkdir -p "$work/$target"
     if run_target "$target"; then
-        echo "$target: $(runs_of "$target") runs in $seconds s, nothing found"
+        edges=$(edges_of "$target")
+        echo "$target: $(runs_of "$target") runs in $seconds s, nothing found; $edges"
     else
         status=1
         echo "$target: FAILED, see $work/$target.log; the input lies beside it"

@@ -65,10 +65,11 @@ IoResult MemoryDevice::Write(u64 offset, const void* source, std::size_t bytes) 
         const std::size_t piece = std::min<std::size_t>(bytes, kChunkSize - at);
         std::unique_ptr<u8[]>& chunk = chunks_[static_cast<std::size_t>(offset / kChunkSize)];
         if (!chunk) {
-            chunk.reset(new (std::nothrow) u8[kChunkSize]());
+            chunk.reset(new (std::nothrow) u8[kChunkSize]);
             if (!chunk) {
                 return {kIoNoMemory, offset};
             }
+            std::memset(chunk.get(), 0, kChunkSize);
         }
         std::memcpy(chunk.get() + at, in, piece);
         in += piece;
