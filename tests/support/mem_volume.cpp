@@ -110,7 +110,10 @@ MemVolume::Snapshot MemVolume::Save() {
 void MemVolume::Restore(const Snapshot& snapshot) {
     std::erase_if(files_, [&](const auto& file) { return !snapshot.files.contains(file.first); });
     for (const auto& [fileId, bytes] : snapshot.files) {
-        files_[fileId] = bytes;  // into the memory that is there
+        // Mostly nothing changed, and copies are slow where sanitizers watch them.
+        if (Bytes& file = files_[fileId]; file != bytes) {
+            file = bytes;
+        }
     }
     for (const auto& [fileId, fork] : snapshot.forks) {
         *fs.ForkOf(fileId) = fork;

@@ -12,9 +12,9 @@ mkdir -p "$logs"
 # A build in the meantime would have later parts run another program.
 [ -x "$logs/program" ] || cp "$program" "$logs/program"
 program=$logs/program
-# Trials allocate much and hold little: short stacks and a small quarantine save a third. A part
-# that fails fails again without these options, with its stacks.
-export ASAN_OPTIONS=malloc_context_size=1:quarantine_size_mb=8:${ASAN_OPTIONS:-}
+# Trials allocate much and hold little: short stacks and a small quarantine, which still holds what
+# several trials free, save a third. A part that fails fails again without these, with its stacks.
+export ASAN_OPTIONS=malloc_context_size=1:quarantine_size_mb=1:${ASAN_OPTIONS:-}
 
 # Names of parts, one a line.
 parts() {
