@@ -95,6 +95,7 @@ void Run(fuzz::Input* input) {
     options.access = (how & 1) != 0 ? Access::kOverlay : Access::kReadOnly;
     options.backupHeader = (how & 2) != 0;
     options.partition = how >> 4 & 3;
+    options.replay = (how & 0x40) != 0;
     options.mapBlockSize = (how & 4) != 0 ? 512 : 0;
     options.cacheBudget = 1u << 14;
     VolumeScan scan;

@@ -2,11 +2,14 @@
 // or written outside it, every walk ends, nothing leaks, no service is used against its contract,
 // and after a change that failed the restored tree is the one before it.
 //
-// Input: tree kind, geometry, what to do, then the tree file.
+// Input: tree kind, geometry, what to do (bits: 1 change, 2 keys between those there are, 4 every
+// call there is, as the sweep makes them, 8 grow the file by more nodes than one map node covers),
+// then the tree file.
 #include "fuzz.h"
 #include "keys.h"
 #include "mem_volume.h"
 #include "mutate.h"
+#include "trial.h"
 
 namespace {
 
@@ -15,6 +18,7 @@ using namespace VELK;
 constexpr std::size_t kMostBytes = 1u << 18;
 constexpr u32 kSteps = 400;
 constexpr u32 kKeys = 24;
+constexpr u32 kGrowth = 2600;
 constexpr u32 kFiles[] = {kCatalogFileId, kExtentsFileId, kAttributesFileId};
 
 struct alignas(8) Buffers {
@@ -53,6 +57,12 @@ bool IsAnswer(int status) {
            status == kErrTooLarge;
 }
 
+void Restore(test::Metered tree, test::MemVolume* volume, const test::MemVolume::Snapshot& before) {
+    tree->findData.ClearPath();
+    volume->Restore(before);
+    tree->RestoreModifiedNodes();
+}
+
 // Changes until one fails, then restores, as a volume does. False: restored.
 bool Change(test::Metered tree, test::MemVolume* volume, u8 pattern) {
     if (tree->Flush(0) != kOk) {
@@ -67,11 +77,14 @@ bool Change(test::Metered tree, test::MemVolume* volume, u8 pattern) {
                                : tree->InsertRecord(key.Get(), key.id, record.data(),
                                                     static_cast<unsigned>(record.size()));
         if (!IsAnswer(status)) {
-            tree->findData.ClearPath();
-            volume->Restore(before);
-            tree->RestoreModifiedNodes();
+            Restore(tree, volume, before);
             return false;
         }
+    }
+    if ((pattern & 8) != 0 &&
+        tree->ExtendBTree((*tree).header.totalNodes + kGrowth, nullptr, nullptr) != kOk) {
+        Restore(tree, volume, before);
+        return false;
     }
     tree->Flush(0);
     return true;
@@ -87,8 +100,13 @@ void Run(fuzz::Input* input) {
     options.listsCalls = false;
     options.totalBlocks = 4096;
     options.hasJournal = (geometry & 4) != 0;
+    options.version = (geometry & 8) != 0 ? kVersionHfsx : kVersionHfsPlus;
+    const test::Bytes file = input->Rest(kMostBytes);
+    if ((pattern & 4) != 0) {
+        test::Trial(fileId, options.mapBlockSize).RunTree(file, 1 + (pattern >> 4));
+    }
     test::MemVolume volume(options);
-    volume.LoadFile(fileId, input->Rest(kMostBytes));
+    volume.LoadFile(fileId, file);
     {
         test::TestTree owner(&volume, fileId);
         const test::Metered tree(&owner.tree);

@@ -1,7 +1,8 @@
 // A sequence of operations on a sound tree, in any order, against a plain model. The tree on disk
 // is then read without the engine and compared record by record.
 //
-// Input: tree kind, geometry, then operations of three bytes: what, key, size.
+// Input: tree kind, geometry (low bits: map block, journal, made by Create; high bits: node size,
+// binary order of names), then operations of three bytes: what, key, and a size or a variety.
 #include <algorithm>
 #include <cstring>
 #include <map>
@@ -20,24 +21,23 @@ using namespace VELK;
 
 constexpr u32 kFiles[] = {kCatalogFileId, kExtentsFileId, kAttributesFileId};
 constexpr u32 kMostOperations = 2000;
+constexpr u32 kMostTakenBack = 8;  // each copies the whole volume
+constexpr u32 kGrowth = 2600;      // nodes, more than the map of a header node of 512 bytes covers
 
 class Run {
 public:
     explicit Run(fuzz::Input* input)
-        : fileId_(kFiles[input->U8() % 3]), geometry_(input->U8()), volume_(Options(geometry_)) {
-        test::TreeShape shape;
-        shape.fileId = fileId_;
-        shape.nodeSize = 512u << (geometry_ >> 4 & 3);
-        shape.nodeSize = shape.nodeSize < volume_.options.mapBlockSize
-                             ? volume_.options.mapBlockSize
-                             : shape.nodeSize;
-        shape.clumpSize = 4 * shape.nodeSize;
-        shape.freeNodes = 2;
-        mostData_ = shape.nodeSize / 4;
-        volume_.LoadTree(test::BuildTree(shape, {}));
+        : fileId_(kFiles[input->U8() % 3]),
+          geometry_(input->U8()),
+          nodeSize_(std::max(512u << (geometry_ >> 4 & 3), 512u << (geometry_ & 3))),
+          volume_(Options(geometry_)) {
         test::TestTree tree(&volume_, fileId_);
         tree_ = test::Metered(&tree.tree);
-        FUZZ_CHECK(tree_->Init() == kOk);
+        if ((geometry_ & 8) != 0) {
+            Create();
+        } else {
+            Open();
+        }
         for (u32 i = 0; i < kMostOperations && !input->IsEmpty(); ++i) {
             Operate(input);
         }
@@ -52,29 +52,117 @@ private:
         options.listsCalls = false;
         options.totalBlocks = 1u << 15;
         options.hasJournal = (geometry & 4) != 0;
+        options.version = (geometry & 0x40) != 0 ? kVersionHfsx : kVersionHfsPlus;
         return options;
     }
+
+    // What is built without the engine is opened.
+    void Open() {
+        test::TreeShape shape;
+        shape.fileId = fileId_;
+        shape.nodeSize = nodeSize_;
+        shape.clumpSize = 4 * nodeSize_;
+        shape.freeNodes = 2;
+        shape.keyCompareType = IsBinary() ? kKeyCompareBinary : kKeyCompareFolding;
+        volume_.LoadTree(test::BuildTree(shape, {}));
+        FUZZ_CHECK(tree_->Init() == kOk);
+    }
+
+    // The engine searches faster in a tree that it built itself.
+    void Create() {
+        u32 shift = 9;
+        while (1u << shift < nodeSize_) {
+            ++shift;
+        }
+        const unsigned long long size = 4 * nodeSize_;
+        volume_.fs.ForkOf(fileId_)->clumpSize = 4 * nodeSize_;
+        test::PrepareCreate(tree_.Get());
+        if (IsBinary() && fileId_ == kCatalogFileId) {
+            tree_->compareKeys = CompareCatKeysCaseBin;
+            tree_->keyCompareType = kKeyCompareBinary;
+        }
+        FUZZ_CHECK(tree_->Create(shift, 0, &size) == kOk);
+        FUZZ_CHECK(tree_->Flush(0) == kOk);
+    }
+
+    bool IsBinary() const { return (geometry_ & 0x40) != 0; }
 
     void Operate(fuzz::Input* input) {
         const u8 what = input->U8();
         const u32 n = input->U8() | (what & 0xF0u) << 4;
-        const u32 size = 2 + 2 * (input->U8() % (mostData_ / 2));
+        const u8 third = input->U8();
         switch (what & 7) {
             case 0:
             case 1:
             case 2:
-                return Insert(n, size);
+                return Insert(n, 2 + 2 * (third % (nodeSize_ / 8)));
             case 3:
-                return Delete(n);
+                return (third & 1) != 0 ? DeleteAtPath(n) : Delete(n);
             case 4:
-                return Find(n);
+                return (third & 1) != 0 ? FindAbsent(n) : Find(n);
             case 5:
                 return Update(n);
             case 6:
-                FUZZ_CHECK(tree_->Flush(what >> 4 & 4) == kOk);
-                return;
+                return Maintain(n, what, third);
             default:
-                return Step(n, what);
+                return (third & 1) != 0 ? Return(n) : Step(n, what);
+        }
+    }
+
+    // What leaves the records as they are.
+    void Maintain(u32 n, u8 what, u8 third) {
+        switch (third & 7) {
+            case 3:
+                return TakeBack(n);
+            case 4:
+                FUZZ_CHECK(tree_->ReserveSpace(1 + static_cast<int>(n % 8), &reserve_) == kOk);
+                return tree_->ReleaseSpace(&reserve_);
+            case 5:
+                return Extend(n);
+            case 6:
+                FUZZ_CHECK(tree_->Clear() == kOk);
+                return;
+            case 7:
+                return AllocateAndFree();
+            default:
+                FUZZ_CHECK(tree_->Flush(what >> 4 & 4) == kOk);
+        }
+    }
+
+    // Two changes that the volume drops again.
+    void TakeBack(u32 n) {
+        if (takenBack_++ >= kMostTakenBack) {
+            return;
+        }
+        FUZZ_CHECK(tree_->Flush(0) == kOk);
+        const test::MemVolume::Snapshot before = volume_.Save();
+        const std::map<u32, test::Bytes> known = model_;
+        Insert(n, nodeSize_ / 8);
+        Delete(n + 1);
+        tree_->findData.ClearPath();
+        volume_.Restore(before);
+        tree_->RestoreModifiedNodes();
+        FUZZ_CHECK(!(*tree_).IsDirty());
+        model_ = known;
+    }
+
+    // Once, so that runs stay short.
+    void Extend(u32 n) {
+        if (!hasExtended_) {
+            hasExtended_ = true;
+            const u32 more = 1 + n % (nodeSize_ == 512 ? kGrowth : 64);
+            FUZZ_CHECK(tree_->ExtendBTree((*tree_).header.totalNodes + more, nullptr, nullptr) ==
+                       kOk);
+        }
+    }
+
+    void AllocateAndFree() {
+        if ((*tree_).header.freeNodes != 0) {
+            HfsNode* node = nullptr;
+            FUZZ_CHECK(tree_->AllocateNode(&node) == kOk);
+            const u32 number = node->nodeNum;
+            node->refCount -= 1;
+            FUZZ_CHECK(tree_->FreeNode(number) == kOk);
         }
     }
 
@@ -92,6 +180,13 @@ private:
         FUZZ_CHECK(tree_->DeleteRecord(key.Get(), key.id, false) == (isThere ? kOk : kErrNotFound));
     }
 
+    void DeleteAtPath(u32 n) {
+        if (Find(n, nullptr)) {
+            FUZZ_CHECK(tree_->DeleteRecord(nullptr, 0, true) == kOk);
+            model_.erase(n);
+        }
+    }
+
     // Leaves the record in `record_`. True: it is there, and is the model's.
     bool Find(u32 n, HfsFindData* path) {
         const test::HostKey key = test::NthHostKey(fileId_, n);
@@ -107,6 +202,30 @@ private:
     void Find(u32 n) {
         HfsFindData path;
         Find(n, &path);
+        path.ClearPath();
+    }
+
+    // A key that nobody inserts, looked for from where the tree's own path stands.
+    void FindAbsent(u32 n) {
+        const test::HostKey key = test::NthHostKey(fileId_, n, true);
+        unsigned size = 0;
+        FUZZ_CHECK(tree_->FindRecord(key.Get(), key.id, record_, sizeof record_, &size, nullptr) ==
+                   kErrNotFound);
+    }
+
+    // Away from a record, and back to it by its position.
+    void Return(u32 n) {
+        HfsFindData path;
+        if (Find(n, &path)) {
+            const unsigned long long position = tree_->GetPos(&path, nullptr, nullptr);
+            path.ClearPath();
+            path.level = 0;
+            unsigned size = 0;
+            unsigned keySize = 0;
+            FUZZ_CHECK(tree_->SetPos(position, record_, sizeof record_, &size, key_, sizeof key_,
+                                     &keySize, &path) == kOk);
+            FUZZ_CHECK(test::Bytes(record_, record_ + size) == model_.at(n));
+        }
         path.ClearPath();
     }
 
@@ -154,10 +273,14 @@ private:
 
     u32 fileId_;
     u8 geometry_;
-    u32 mostData_ = 0;
+    u32 nodeSize_;
     test::MemVolume volume_;
     test::Metered tree_{nullptr};
     std::map<u32, test::Bytes> model_;
+    BTReserve reserve_ = {};
+    u32 takenBack_ = 0;
+    bool hasExtended_ = false;
+    alignas(8) u8 key_[kKeyLengthSize + kMaxKeyLength + 6] = {};
     alignas(8) u8 record_[8192] = {};
 };
 

@@ -8,6 +8,7 @@
 #include "journal_base.h"
 #include "keys.h"
 #include "node_image.h"
+#include "specimen.h"
 #include "tree_image.h"
 
 namespace {
@@ -58,7 +59,8 @@ void Trees() {
                 shape, test::NthRecords(shape.fileId, records, kind == 1 ? 64 : 40));
             const std::string name = std::to_string(shape.fileId) + "-" + std::to_string(records);
             Write("open", name + "-read", {kind, 0, 0}, tree.bytes);
-            Write("open", name + "-change", {kind, 4, 7}, tree.bytes);
+            Write("open", name + "-change", {kind, 4, 3}, tree.bytes);
+            Write("open", name + "-all", {kind, 4, 15}, tree.bytes);
         }
     }
 }
@@ -71,7 +73,8 @@ void Operations() {
             const u8 n = static_cast<u8>(i);
             const u8 scattered = static_cast<u8>(i * 97);
             test::AppendBytes(&rise, {0, n, static_cast<u8>(40 + i % 60)});
-            test::AppendBytes(&mixed, {static_cast<u8>(i % 8), scattered, n});
+            test::AppendBytes(&mixed,
+                              {static_cast<u8>(i % 8), scattered, static_cast<u8>(i + i / 8)});
             test::AppendBytes(&mixed, {0x11, static_cast<u8>(i * 31), n});
         }
         for (u32 i = 0; i < 250; ++i) {
@@ -81,9 +84,20 @@ void Operations() {
         Write("ops", "rise-and-fall-" + name, {kind, 0}, rise);
         Write("ops", "mixed-" + name, {kind, 0x14}, mixed);
         Write("ops", "mixed-in-two-blocks-" + name, {kind, 0x11}, mixed);
+        Write("ops", "made-here-" + name, {kind, 8}, rise);
+        Write("ops", "made-here-mixed-" + name, {kind, 0x49}, mixed);
     }
 }
 
+// One image, opened in several ways.
+void Image(const std::string& name, const Bytes& image) {
+    Write("image", name + "-read", {0, 0}, image);
+    Write("image", name + "-change", {1, 1}, image);
+    Write("image", name + "-full", {8, 0}, image);
+}
+
+// Volumes just made, where nothing is; one where everything is, files in pieces too; one whose
+// journal holds a transaction.
 void Images() {
     for (const bool caseSensitive : {false, true}) {
         FormatOptions options;
@@ -104,11 +118,14 @@ void Images() {
         const Bytes image(text, text + size);
         std::free(text);
         FUZZ_CHECK(!image.empty());
-        const std::string name = caseSensitive ? "sensitive" : "plain";
-        Write("image", name + "-read", {0, 0}, image);
-        Write("image", name + "-change", {1, 1}, image);
-        Write("image", name + "-full", {8, 0}, image);
+        Image(caseSensitive ? "sensitive" : "plain", image);
     }
+    test::Specimen specimen;
+    specimen.Narrow();
+    Image("full", specimen.bytes);
+    const fuzz::JournalBase base = fuzz::MakeJournalBase();
+    Image("journal", base.image);
+    Write("image", "journal-replay", {0x41, 1}, base.image);
 }
 
 // Header and first transaction; the seed's first byte says which checksums are mended.

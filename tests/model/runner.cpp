@@ -81,14 +81,7 @@ void Runner::Start() {
     tree_->volume = &volume_->fs;
     tree_->fileId = setup_.fileId;
     tree_->convert = ConvertFor(setup_.fileId);
-    if (setup_.fileId != kAttributesFileId) {
-        const bool catalog = setup_.fileId == kCatalogFileId;
-        tree_->compareKeys = catalog ? CompareCatKeysCaseIns : CompareExtentKeysPlus;
-        tree_->header.maxKeyLength =
-            static_cast<u16>(catalog ? kCatMaxKeyLength : kExtMaxKeyLength);
-        tree_->header.attributes = kBTBigKeysMask | (catalog ? kBTVariableIndexKeysMask : 0);
-        tree_->keyCompareType = catalog ? kKeyCompareFolding : 0;
-    }
+    PrepareCreate(object_.get());
 }
 
 std::optional<std::string> Runner::Run(const std::vector<Operation>& operations) {

@@ -147,13 +147,21 @@ void Specimen::Rebuild() {
     SetHeader32(VolumeField::kAttributes, kClean);
 }
 
-void Specimen::Widen() {
-    volume.freeNodes = 2100;
-    volume.totalBlocks = 3000;
-    volume.dataStart = 2700;
+void Specimen::MoveFiles(u32 dataStart, u32 totalBlocks) {
+    volume.totalBlocks = totalBlocks;
+    volume.dataStart = dataStart;
     FillCatalog(&volume);
     FillOthers(&volume);
     Rebuild();
+}
+
+void Specimen::Widen() {
+    volume.freeNodes = 2100;
+    MoveFiles(2700, 3000);
+}
+
+void Specimen::Narrow() {
+    MoveFiles(110, 350);
 }
 
 void Specimen::Erase(std::vector<TreeRecord>* records, const Bytes& key) {

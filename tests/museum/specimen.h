@@ -95,6 +95,8 @@ public:
     void Rebuild();
     // Gives the catalog so many nodes that its map needs a node of its own.
     void Widen();
+    // Leaves no more room before the files than the trees need.
+    void Narrow();
     // The data of a record, to be changed before Rebuild.
     Bytes& CatalogData(const Bytes& key) { return *VolumeImage::DataOf(&volume.catalog, key); }
     Bytes& ExtentsData(const Bytes& key) { return *VolumeImage::DataOf(&volume.extents, key); }
@@ -117,6 +119,9 @@ public:
     u64 JournalInfoOffset() const;             // of the info block
     void SetJournal32(u32 offset, u32 value);  // in the journal header, with a checksum that fits
     void BreakJournalChecksum();
+
+private:
+    void MoveFiles(u32 dataStart, u32 totalBlocks);
 };
 
 }  // namespace VELK::test

@@ -206,6 +206,17 @@ Bytes DiskFormOf(u32 fileId, const BTreeKey* hostKey) {
     return key;
 }
 
+void PrepareCreate(CBTreeHfs* tree) {
+    if (tree->fileId != kAttributesFileId) {
+        const bool isCatalog = tree->fileId == kCatalogFileId;
+        tree->compareKeys = isCatalog ? CompareCatKeysCaseIns : CompareExtentKeysPlus;
+        tree->header.maxKeyLength =
+            static_cast<u16>(isCatalog ? kCatMaxKeyLength : kExtMaxKeyLength);
+        tree->header.attributes = kBTBigKeysMask | (isCatalog ? kBTVariableIndexKeysMask : 0);
+        tree->keyCompareType = isCatalog ? kKeyCompareFolding : 0;
+    }
+}
+
 HfsConvert ConvertFor(u32 fileId) {
     switch (fileId) {
         case kExtentsFileId:

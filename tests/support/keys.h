@@ -40,4 +40,7 @@ Bytes DiskFormOf(u32 fileId, const BTreeKey* hostKey);
 // ToMemory hooks copy the disk bytes. The two minimum sizes are 0.
 HfsConvert ConvertFor(u32 fileId);
 
+// Sets what Create takes from a tree of `fileId`: order, longest key, attributes.
+void PrepareCreate(CBTreeHfs* tree);
+
 }  // namespace VELK::test

@@ -243,7 +243,7 @@ void Trial::RunTree(const Bytes& file, u32 nodeNum) const {
     MemVolumeOptions options;
     options.mapBlockSize = mapBlock_;
     options.allocBlockSize = mapBlock_;
-    options.totalBlocks = 512;
+    options.totalBlocks = 512 + static_cast<u32>(file.size() / mapBlock_);
     options.listsCalls = false;
     MemVolume volume(options);
     volume.LoadFile(fileId_, file);
