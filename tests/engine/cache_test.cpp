@@ -337,6 +337,12 @@ TEST_P(CacheTest, EmptyingANodeThatWasNeverWrittenIsTraced) {
     EXPECT_EQ(bench_.capture.Take(), expected);
 }
 
+TEST_P(CacheTest, EmptyingANodeThatWasWrittenIsNotTraced) {
+    bench_.capture.TraceAll();
+    Get(1, true);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
 TEST_P(CacheTest, EmptyingANodeThatWasNeverWrittenSaysNothingWithoutTraces) {
     MakeNew(5);
     HfsNode* node = Get(5, true);

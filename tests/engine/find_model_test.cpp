@@ -148,23 +148,42 @@ INSTANTIATE_TEST_SUITE_P(
 
 // ---- any damage
 
+// Trees whose records lie far from the blocks' ends, and such as lie across them.
+enum class Layout {
+    kSmall,      // all in the first blocks of their nodes
+    kWideLeaf,   // the key of the third record of each leaf in two blocks
+    kWideIndex,  // as many records in the root as it has room for
+};
+
 struct Damaged {
     Geometry geometry;
     u32 fileId;
+    Layout layout = Layout::kSmall;
+    u16 version = kVersionHfsPlus;
 };
 std::ostream& operator<<(std::ostream& out, const Damaged& damaged) {
-    return out << damaged.geometry << ", file " << damaged.fileId;
+    return out << damaged.geometry << ", file " << damaged.fileId << ", layout "
+               << static_cast<int>(damaged.layout) << ", version " << damaged.version;
 }
 
 class FindLiteral : public ::testing::TestWithParam<Damaged> {
 protected:
-    FindLiteral() : bench_(Blocks(GetParam().geometry.mapBlock), GetParam().fileId) {
+    FindLiteral() : bench_(OptionsOf(GetParam()), GetParam().fileId) {
+        const Layout layout = GetParam().layout;
+        const bool isWideIndex = layout == Layout::kWideIndex;
         TreeShape shape;
         shape.fileId = GetParam().fileId;
         shape.nodeSize = GetParam().geometry.nodeSize;
-        shape.recordsPerLeaf = 4;
-        shape.childrenPerIndex = 3;
-        sound_ = BuildTree(shape, NthRecords(shape.fileId, 16, 10));
+        shape.recordsPerLeaf = isWideIndex ? 1 : 4;
+        shape.childrenPerIndex = isWideIndex ? 0 : 3;
+        shape.keyCompareType = GetParam().version == kVersionHfsx ? kKeyCompareBinary : 0;
+        const u32 dataSize = layout == Layout::kWideLeaf ? 220 : 10;
+        sound_ = BuildTree(shape, NthRecords(shape.fileId, isWideIndex ? 30 : 16, dataSize));
+    }
+    static MemVolumeOptions OptionsOf(const Damaged& damaged) {
+        MemVolumeOptions options = Blocks(damaged.geometry.mapBlock);
+        options.version = damaged.version;
+        return options;
     }
 
     // Looks several keys up on a fresh tree, each compared with the plain lookup.
@@ -174,7 +193,8 @@ protected:
         LiteralFind plain(image, GetParam().geometry.mapBlock, bench_->compareKeys);
         HfsFindData path;
         HfsFindData* used = ownPath ? &bench_->findData : &path;
-        for (const u32 n : {6u, 4u, 5u, 7u, 0u, 15u}) {
+        const u32 last = sound_.leafRecords - 1;
+        for (const u32 n : {6u, 4u, 5u, 7u, 0u, last, last * 2 / 3}) {
             const HostKey key = NthHostKey(GetParam().fileId, n, n == 5);
             bench_.capture.Take();
             bool found = false;
@@ -202,16 +222,35 @@ protected:
         }
         return held;
     }
-    // One word of a node in use replaced, at each place of records, slots and descriptor in turn.
+    // Whether the search reads the word at this place of a node: anything but the data of a leaf,
+    // the space behind the records, and most of a name.
+    bool IsSearched(u32 nodeNum, u32 at) const {
+        const Bytes node = sound_.Node(nodeNum);
+        const u32 count = Get16(node, 10);
+        if (at < 14 || at >= node.size() - 2 * (count + 1)) {
+            return true;
+        }
+        for (u32 n = 0; n < count; ++n) {
+            const u32 start = Get16(node, node.size() - 2 * (n + 1));
+            const u32 end = Get16(node, node.size() - 2 * (n + 2));
+            if ((at >= start && at < start + 14) || (at + 4 >= end && at < end)) {
+                return true;
+            }
+        }
+        return false;
+    }
+    // One word of a node in use replaced, at each place that a search reads in turn.
     void ExpectSameForEveryWord(bool ownPath) {
         const u32 nodeSize = sound_.shape.nodeSize;
+        const u32 mapBlock = GetParam().geometry.mapBlock;
         const u32 used = sound_.totalNodes - sound_.freeNodes;
-        for (u32 at = nodeSize; at < used * nodeSize; at += 2) {
-            const u32 inNode = at % nodeSize;
-            if (inNode > 140 && inNode < nodeSize - 12) {
+        const u32 first = GetParam().layout == Layout::kWideIndex ? sound_.rootNode : 1;
+        for (u32 at = first * nodeSize; at < used * nodeSize; at += 2) {
+            if (!IsSearched(at / nodeSize, at % nodeSize)) {
                 continue;
             }
-            for (const u32 value : {0u, 3u, 14u, 0x00FFu, 0xFFFFu, nodeSize - 8}) {
+            for (const u32 value :
+                 {0u, 3u, 14u, 0x00FFu, 0xFFFFu, nodeSize - 8, nodeSize, mapBlock - 1, mapBlock}) {
                 TreeImage image = sound_;
                 Put16(&image.bytes, at, value);
                 SCOPED_TRACE(::testing::Message() << "byte " << at << " value " << value);
@@ -243,7 +282,13 @@ TEST_P(FindLiteral, AnyWordReplacedOnTheTreesOwnPath) {
 
 INSTANTIATE_TEST_SUITE_P(Trees, FindLiteral,
                          ::testing::Values(Damaged{{512, 512}, 4}, Damaged{{1024, 512}, 4},
-                                           Damaged{{512, 512}, 3}, Damaged{{512, 512}, 8}));
+                                           Damaged{{512, 512}, 3}, Damaged{{512, 512}, 8},
+                                           Damaged{{1024, 512}, 3}, Damaged{{1024, 512}, 8},
+                                           Damaged{{512, 512}, 4, Layout::kSmall, kVersionHfsx},
+                                           Damaged{{1024, 512}, 4, Layout::kWideLeaf},
+                                           Damaged{{1024, 512}, 4, Layout::kWideLeaf, kVersionHfsx},
+                                           Damaged{{1024, 512}, 4, Layout::kWideIndex},
+                                           Damaged{{1024, 512}, 8, Layout::kWideIndex}));
 
 }  // namespace
 }  // namespace VELK::test

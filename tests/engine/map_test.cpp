@@ -248,6 +248,16 @@ TEST_P(MapAllocate, BitInAMapNodeLeavesTheHeaderUnsaved) {
     EXPECT_EQ(Get32(volume->DiskNode(NodeSize(), 0), kHeadFreeNodes), 9u);
 }
 
+TEST_P(MapAllocate, AMapNodeChangedOnceMoreIsTheLastToHandOver) {
+    Open(HeadBits() + 10, HeadBits());
+    for (u32 n = 0; n < 2; ++n) {
+        ASSERT_EQ(Allocate(), kOk);
+        Taken();
+    }
+    EXPECT_EQ(ModifiedNodes(Tree()), (std::vector<u32>{HeadBits(), 1, HeadBits() + 1}));
+    EXPECT_EQ(Live(1)[14], 0xC0);
+}
+
 TEST_P(MapAllocate, SecondMapNodeIsFound) {
     Open(HeadBits() + StepBits() + 10, HeadBits() + StepBits() + 9);
     ASSERT_EQ(Allocate(), kOk);

@@ -40,6 +40,12 @@ class Lines:
             self.used.add(key)
         return self.why.get(key)
 
+    def remarks(self, name, code):
+        """Yields all remarks on a line, as (what, why)."""
+        for (file, text, what), why in self.why.items():
+            if (file, text) == (name, code.strip()):
+                yield what, why
+
     def has(self, name, code, what):
         return (name, code.strip(), what) in self.why
 

@@ -8,8 +8,12 @@ again. A mutant is killed when a test fails, crashes, or uses much more time or 
 should. Jumps to a trap are left out: reversing those kills by itself.
 
 Mutants that behave as the original does may stand in a list (see line_list.py); `what` is
-"reversed", "removed" or "any". They are tried all the same; those that survive are left out of the
-score.
+"reversed", "removed" or "any", and may go on with "in FUNCTION": of the copies that the compiler
+made of a line, those put into such a function. FUNCTION is a pattern of the shell, met by a name
+without its namespaces. They are tried all the same; those that survive are left out of the score.
+
+What became of each mutant is noted, so that a run broken off can go on: a mutant that was killed is
+tried again with its killer first, one that survived only after the tests have changed.
 
 usage: mutants.py LIBRARY SOURCES [options] TEST...
        TEST: a program with its arguments, as one word; the quickest first"""
@@ -17,6 +21,8 @@ usage: mutants.py LIBRARY SOURCES [options] TEST...
 import argparse
 import collections
 import concurrent.futures
+import fnmatch
+import hashlib
 import os
 import pathlib
 import random
@@ -35,7 +41,10 @@ MEMORY = 4 << 30
 JUMP = re.compile(r"^\s*([0-9a-f]+):\t([0-9a-f ]+?)\s*\tj(?!mp)([a-z]+)\s+([0-9a-f]+)\b")
 ANY = re.compile(r"^\s*([0-9a-f]+):\t([0-9a-f ]+?)\s*(?:\t(\S+).*)?$")
 
-Mutant = collections.namedtuple("Mutant", "address what file line function old new")
+FAILED = re.compile(r"\[  FAILED  \] ([^\s,]+)")
+
+# `functions`: that of the line, then those it was put into.
+Mutant = collections.namedtuple("Mutant", "address what file line functions old new")
 
 
 def output(*words):
@@ -57,14 +66,21 @@ def jumps(library):
                 yield address, code
 
 
+def bare(function):
+    """A function's name without namespaces and classes."""
+    return re.sub(r"(\(anonymous namespace\)|\w+)::", "", function)
+
+
 def places(library, addresses):
-    """Function, file and line of each address."""
-    text = subprocess.run(["addr2line", "-Cfe", library, *map(hex, addresses)], check=True,
+    """File and line of each address, and the functions it is in, the innermost first."""
+    text = subprocess.run(["addr2line", "-Cfie", library, "-a", *map(hex, addresses)], check=True,
                           capture_output=True, text=True).stdout.splitlines()
-    for function, place in zip(text[::2], text[1::2]):
-        file, _, line = place.partition(":")
+    starts = [at for at, line in enumerate(text) if re.fullmatch("0x[0-9a-f]+", line)]
+    for start, end in zip(starts, [*starts[1:], len(text)]):
+        file, _, line = text[start + 2].partition(":")
         number = re.match(r"\d+", line)
-        yield function, file, int(number[0]) if number else 0
+        functions = tuple(bare(name) for name in text[start + 1:end:2])
+        yield file, int(number[0]) if number else 0, functions
 
 
 def reversed_jump(code):
@@ -77,14 +93,14 @@ def population(library, sources):
     found = list(jumps(library))
     top = os.path.realpath(sources) + "/"
     mutants = []
-    for (address, code), (function, file, line) in zip(
+    for (address, code), (file, line, functions) in zip(
             found, places(library, [address for address, _ in found])):
         if not os.path.realpath(file).startswith(top):
             continue
         file = os.path.realpath(file)
-        mutants.append(Mutant(address, "reversed", file, line, function, code,
+        mutants.append(Mutant(address, "reversed", file, line, functions, code,
                               reversed_jump(code)))
-        mutants.append(Mutant(address, "removed", file, line, function, code,
+        mutants.append(Mutant(address, "removed", file, line, functions, code,
                               b"\x90" * len(code)))
     return mutants
 
@@ -106,8 +122,18 @@ class Tests:
         self.commands = [shlex.split(command) for command in commands]
         self.seconds = [None] * len(commands)
 
-    def run(self, index, folder):
-        """None when the test passes with the library in this folder, else how it failed."""
+    def digest(self):
+        """Of the programs and how they are called."""
+        whole = hashlib.sha256(repr(sorted(
+            (name, value) for name, value in os.environ.items() if name.startswith("TREEHFS_")
+        )).encode())
+        for command in self.commands:
+            whole.update(repr(command).encode() + pathlib.Path(command[0]).read_bytes())
+        return whole.hexdigest()[:16]
+
+    def run(self, index, folder, test=None):
+        """None when this program, or one test of it, passes with the library in this folder; else
+        how it failed."""
         limit = self.seconds[index]
 
         def limits():
@@ -118,12 +144,13 @@ class Tests:
 
         environment = dict(os.environ, LD_LIBRARY_PATH=str(folder), MALLOC_PERTURB_="165")
         environment.pop("TREEHFS_SITES_DIR", None)
-        done = subprocess.run(self.commands[index], env=environment, preexec_fn=limits,
-                              cwd=folder, stdin=subprocess.DEVNULL, stdout=subprocess.PIPE,
+        words = self.commands[index] + ([f"--gtest_filter={test}"] if test else [])
+        done = subprocess.run(words, env=environment, preexec_fn=limits, cwd=folder,
+                              stdin=subprocess.DEVNULL, stdout=subprocess.PIPE,
                               stderr=subprocess.STDOUT, text=True, errors="replace", check=False)
         if done.returncode == 0:
             return None
-        failed = re.search(r"\[  FAILED  \] (\S+)", done.stdout)
+        failed = FAILED.search(done.stdout)
         return failed[1] if failed else f"status {done.returncode}"
 
     def prepare(self, folder, mutant):
@@ -136,15 +163,20 @@ class Tests:
         copy.write_bytes(code)
         copy.chmod(0o755)
 
-    def killer(self, mutant):
+    def killer(self, mutant, notes):
         """How the tests notice this mutant, or None."""
+        if notes.has_survived(mutant):
+            return None
         folder = tempfile.mkdtemp(prefix="mutant")
         try:
             self.prepare(folder, mutant)
-            for index in range(len(self.commands)):
-                failed = self.run(index, folder)
+            for index, test in [*notes.killers(mutant),
+                                *((index, None) for index in range(len(self.commands)))]:
+                failed = self.run(index, folder, test)
                 if failed is not None:
+                    notes.add(mutant, index, failed)
                     return failed
+            notes.add(mutant, None, None)
             return None
         finally:
             shutil.rmtree(folder)
@@ -165,14 +197,55 @@ class Tests:
                       f"limit {self.seconds[index]} s", flush=True)
 
 
+class Notes:
+    """What became of the mutants of one library, in a file of a folder; nowhere without one. A line
+    is an address, what was done there, and the number of the program that noticed and its test; or
+    "survived" and the digest of the tests."""
+
+    def __init__(self, folder, library, tests):
+        self.tests = tests.digest()
+        self.known = {}
+        self.remembered = 0
+        self.path = None
+        if folder:
+            digest = hashlib.sha256(pathlib.Path(library).read_bytes()).hexdigest()[:16]
+            self.path = pathlib.Path(folder, digest)
+            self.path.parent.mkdir(parents=True, exist_ok=True)
+            self.path.touch()
+            for line in self.path.read_text(encoding="utf-8").splitlines():
+                address, what, result, how = line.split(" ", 3)
+                self.known[int(address, 16), what] = (result, how)
+
+    def has_survived(self, mutant):
+        if self.known.get((mutant.address, mutant.what)) != ("survived", self.tests):
+            return False
+        self.remembered += 1
+        return True
+
+    def killers(self, mutant):
+        """The program and test that noticed before, where known."""
+        result, how = self.known.get((mutant.address, mutant.what), ("survived", ""))
+        if result != "survived":
+            yield int(result), None if how.startswith("status ") else how
+
+    def add(self, mutant, index, failed):
+        entry = ("survived", self.tests) if failed is None else (str(index), failed)
+        if self.path and self.known.get((mutant.address, mutant.what)) != entry:
+            with self.path.open("a", encoding="utf-8") as file:
+                file.write(f"{mutant.address:x} {mutant.what} {' '.join(entry)}\n")
+
+
 class Excuses:
     def __init__(self, path):
         self.lines = Lines.read(path) if path else Lines("")
 
     def find(self, mutant):
-        name = pathlib.Path(mutant.file).name
-        code = code_of(mutant)
-        return self.lines.find(name, code, mutant.what) or self.lines.find(name, code, "any")
+        for what, why in self.lines.remarks(pathlib.Path(mutant.file).name, code_of(mutant)):
+            what, _, function = what.partition(" in ")
+            if what in (mutant.what, "any") and (not function or any(
+                    fnmatch.fnmatchcase(name, function) for name in mutant.functions)):
+                return why
+        return None
 
 
 def code_of(mutant):
@@ -182,7 +255,8 @@ def code_of(mutant):
 
 def describe(mutant):
     name = f"{pathlib.Path(mutant.file).name}:{mutant.line}"
-    return f"{name}: jump {mutant.address:x} {mutant.what} in {mutant.function}: {code_of(mutant)}"
+    functions = " < ".join(name.partition("(")[0] for name in mutant.functions)
+    return f"{name}: jump {mutant.address:x} {mutant.what} in {functions}: {code_of(mutant)}"
 
 
 def arguments():
@@ -199,7 +273,9 @@ def arguments():
     parser.add_argument("--least", type=float, default=90.0, help="percent that have to be killed")
     parser.add_argument("--equivalent", help="list of mutants that change nothing")
     parser.add_argument("--file", action="append", help="only jumps of this file, or of these")
-    parser.add_argument("--verbose", action="store_true", help="name what kills each mutant")
+    parser.add_argument("--notes", metavar="FOLDER", help="where to note what became of mutants")
+    parser.add_argument("--verbose", action="store_true",
+                        help="name what kills each mutant, and those in the list")
     return parser.parse_args()
 
 
@@ -215,17 +291,21 @@ def main():
     sample = random.Random(args.seed).sample(mutants, count)
     excuses = Excuses(args.equivalent)
     tests = Tests(args.binary, args.tests, args.spare)
+    notes = Notes(args.notes, args.binary, tests)
     tests.measure()
     started = time.monotonic()
     killed = survived = equivalent = 0
     with concurrent.futures.ThreadPoolExecutor(args.jobs) as pool:
-        for mutant, killer in zip(sample, pool.map(tests.killer, sample)):
+        results = pool.map(lambda mutant: tests.killer(mutant, notes), sample)
+        for mutant, killer in zip(sample, results):
             if killer is not None:
                 killed += 1
                 if args.verbose:
                     print("killed:", describe(mutant), "by", killer, flush=True)
             elif excuses.find(mutant):
                 equivalent += 1
+                if args.verbose:
+                    print("equivalent:", describe(mutant), flush=True)
             else:
                 survived += 1
                 print("survived:", describe(mutant), flush=True)
@@ -233,6 +313,8 @@ def main():
                 print(f"{killed + survived + equivalent} of {count} tried, {survived} survived",
                       flush=True)
     percent = 100.0 * killed / (killed + survived) if killed + survived else 0.0
+    if notes.remembered:
+        print(f"{notes.remembered} had survived these tests before and were not tried again")
     print(f"{killed} killed, {survived} survived, {equivalent} equivalent, of {count}: "
           f"{percent:.1f}% killed (wanted {args.least}%), {time.monotonic() - started:.0f} s")
     return 0 if percent >= args.least else 1

@@ -1,0 +1,266 @@
+// What an index node remembers of its records: exactly this, and no longer than it holds.
+#include "hfs/treehfs/hints.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstring>
+
+#include "bench.h"
+#include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/node_desc.h"
+
+namespace VELK::test {
+namespace {
+
+// ---- the separators by themselves
+
+class SeparatorTable : public ::testing::Test {
+protected:
+    static constexpr u32 kRoom = 16;  // of a node of 512 bytes
+
+    SeparatorTable() : bench_(Blocks(512)), node_(NodeImage{}.Build(512), 512) {
+        bench_->nodeShift = 9;
+        EXPECT_EQ(SeparatorRoom(&bench_.tree.tree), kRoom);
+        memory_.resize(HintBytes(&bench_.tree.tree) / sizeof(HfsHintSet) + 2);
+        std::memset(static_cast<void*>(memory_.data()), 0, memory_.size() * sizeof(HfsHintSet));
+        node_->hints = memory_.data();
+    }
+    ~SeparatorTable() override { node_->hints = nullptr; }
+
+    Separators Table() { return {&bench_.tree.tree, node_.Get()}; }
+    // Record n leads to child 100 + n.
+    void LearnFirst(u32 count) {
+        Table().Forget();
+        model_.assign(kRoom, 0);
+        for (u32 n = 0; n < std::min(count, kRoom); ++n) {
+            Table().Learn(n, 1000 + n, 100 + n);
+            model_[n] = 100 + n;
+        }
+    }
+    void ExpectModel() {
+        for (u32 n = 0; n < kRoom; ++n) {
+            ASSERT_EQ(Table().Child(n), model_[n]) << n;
+            if (model_[n] != 0) {
+                ASSERT_EQ(Table().Order(n), u64{900} + model_[n]) << n;
+            }
+        }
+        ASSERT_EQ(Table().Child(kRoom), 0u);
+        ASSERT_EQ(Table().Child(kRoom + 5), 0u);
+    }
+
+    Bench bench_;
+    LooseNode node_;
+    std::vector<HfsHintSet> memory_;
+    std::vector<u32> model_;
+};
+
+TEST_F(SeparatorTable, ARecordComesInAtAnyPlace) {
+    for (u32 count = 0; count <= kRoom + 4; ++count) {
+        for (u32 index = 0; index <= count; ++index) {
+            LearnFirst(count);
+            Table().Insert(index, count);
+            if (index < kRoom) {
+                model_.insert(model_.begin() + index, 0);
+                model_.resize(kRoom);
+            }
+            ExpectModel();
+        }
+    }
+}
+
+TEST_F(SeparatorTable, ARecordLeavesAnyPlace) {
+    for (u32 count = 1; count <= kRoom + 4; ++count) {
+        for (u32 index = 0; index < count; ++index) {
+            LearnFirst(count);
+            Table().Remove(index, count);
+            if (index < kRoom) {
+                model_.erase(model_.begin() + index);
+                model_.push_back(0);
+            }
+            ExpectModel();
+        }
+    }
+}
+
+TEST_F(SeparatorTable, RecordsBeyondItsRoomAreNotLearnt) {
+    LearnFirst(kRoom);
+    Table().Learn(kRoom, 5, 5);
+    Table().Learn(kRoom + 1, 6, 6);
+    ExpectModel();
+}
+
+TEST_F(SeparatorTable, WhatIsForgottenIsUnknown) {
+    LearnFirst(kRoom);
+    Table().Forget();
+    model_.assign(kRoom, 0);
+    ExpectModel();
+}
+
+TEST_F(SeparatorTable, ANodeWithoutRoomHasNothingToForget) {
+    LearnFirst(3);
+    node_->hints = nullptr;
+    ForgetSeparators(&bench_.tree.tree, node_.Get());
+    node_->hints = memory_.data();
+    ExpectModel();
+    ForgetSeparators(&bench_.tree.tree, node_.Get());
+    model_.assign(kRoom, 0);
+    ExpectModel();
+}
+
+// ---- what lookups let the root remember
+
+class RootRemembers : public ::testing::TestWithParam<u32> {
+protected:
+    RootRemembers() : bench_(Blocks(512)) {}
+    ~RootRemembers() override { bench_->findData.ClearPath(); }
+
+    void Open(const std::vector<std::u16string>& names, u32 recordsPerLeaf) {
+        TreeShape shape;
+        shape.nodeSize = GetParam();
+        shape.recordsPerLeaf = recordsPerLeaf;
+        std::vector<TreeRecord> records;
+        for (const std::u16string& name : names) {
+            records.push_back({DiskCatKey(7, name), Pattern(8, 1)});
+        }
+        bench_.Open(BuildTree(shape, records));
+        ASSERT_EQ(bench_->header.treeDepth, 2);
+    }
+    int Find(const std::u16string& name) {
+        return bench_->FindRecord(HostCatKey(7, name), 7, nullptr, 0, nullptr, nullptr);
+    }
+    HfsNode* Root() { return bench_->findData.path[2].node; }
+    Separators Remembered() { return {&bench_.tree.tree, Root()}; }
+
+    Bench bench_;
+};
+
+// Parent, first and second unit of the name, folded, as one number; a unit that is not there is 0.
+// Nothing where folding ignores one of the two, as a later unit counts in its place.
+TEST_P(RootRemembers, TheOrderOfEachKeyThatHasOne) {
+    const std::vector<std::u16string> names = {u"",   u"\u200Cb",  u"b\u200Cx", u"C",
+                                               u"Cd", u"C\u200Dx", u"\u00C6",   u"\u4E00z"};
+    Open(names, 1);
+    for (const std::u16string& name : names) {
+        ASSERT_EQ(Find(name), kOk);
+    }
+    const u64 orders[] = {0x700000000, 0, 0, 0x700630000, 0x700630064, 0, 0x700E60000, 0x74E00007A};
+    for (u32 n = 0; n < names.size(); ++n) {
+        const bool hasOrder = orders[n] != 0;
+        EXPECT_EQ(Remembered().Child(n), hasOrder ? n + 1 : 0) << n;
+        if (hasOrder) {
+            EXPECT_EQ(Remembered().Order(n), orders[n]) << n;
+        }
+    }
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// Each of two records in a leaf, so that a wrong turn above misses one.
+TEST_P(RootRemembers, KeysThatDifferInOneUnitAreToldApart) {
+    const std::vector<std::u16string> names = {
+        u"",   u"\u0001", u"A",       u"a1",      u"AA",     u"aB",      u"B",       u"Bc",
+        u"bm", u"bn",     u"BX",      u"bxx",     u"by",     u"C",       u"D\u00E0", u"D\u00E6",
+        u"E",  u"\u00E6", u"\u00E6a", u"\u00E6c", u"\u4E00", u"\u4E00b", u"\u4E01",  u"\u4E01a"};
+    Open(names, 2);
+    for (u32 round = 0; round < 3; ++round) {
+        for (std::size_t n = 0; n < names.size(); ++n) {
+            EXPECT_EQ(Find(names[n]), kOk) << n;
+            EXPECT_EQ(bench_->findData.path[2].index, static_cast<s32>(n / 2)) << n;
+        }
+        for (std::size_t n = names.size(); n-- > 0;) {
+            EXPECT_EQ(Find(names[n] + u"\u0002"), kErrNotFound) << n;
+            EXPECT_EQ(bench_->findData.path[2].index, static_cast<s32>(n / 2)) << n;
+        }
+    }
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// Somebody who holds the root writes another key and another child into a record, and says nothing.
+// The child tells, and the root is searched as it is now.
+TEST_P(RootRemembers, ARecordExchangedUnannouncedIsSearchedAgain) {
+    Open({u"B", u"C", u"D", u"E"}, 1);
+    for (const char16_t* name : {u"B", u"C", u"D", u"E"}) {
+        ASSERT_EQ(Find(name), kOk);
+    }
+    ASSERT_EQ(Remembered().Child(1), 2u);
+    NodeKey second;
+    ASSERT_EQ(Root()->GetKey(&bench_->header, 1, &second), kOk);
+    second.ptr[kCatKeyName + 1] = u'c' + 1;  // D, as the record behind it
+    PutBe32(second.data, 4);
+    EXPECT_EQ(Find(u"CA"), kErrNotFound);
+    EXPECT_EQ(bench_->findData.path[2].index, 0);
+    EXPECT_EQ(bench_->findData.path[1].node->nodeNum, 1u);
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// A child of no number, of no child's size, or none of an index node: the record is not learnt.
+TEST_P(RootRemembers, NothingOfARecordThatLeadsNowhere) {
+    Open({u"B", u"C", u"D", u"E"}, 1);
+    ASSERT_EQ(Find(u"E"), kOk);
+    ASSERT_EQ(Remembered().Child(1), 2u);
+    ForgetSeparators(&bench_.tree.tree, Root());
+    NodeKey second;
+    ASSERT_EQ(Root()->GetKey(&bench_->header, 1, &second), kOk);
+    PutBe32(second.data, 0);
+    EXPECT_EQ(Find(u"E"), kOk);
+    EXPECT_EQ(Remembered().Child(1), 0u);
+    EXPECT_EQ(Remembered().Child(2), 3u);
+    PutBe32(second.data, 2);
+    EXPECT_EQ(Find(u"E"), kOk);
+    EXPECT_EQ(Remembered().Child(1), 2u);
+}
+
+// More records than have room: those behind are found as they lie.
+TEST_P(RootRemembers, OnlyTheFirstOfManyRecords) {
+    std::vector<std::u16string> names;
+    for (u32 n = 0; n < 24; ++n) {
+        names.push_back({static_cast<char16_t>(u'A' + n)});
+    }
+    Open(names, 1);
+    for (u32 round = 0; round < 2; ++round) {
+        for (u32 n = 0; n < 24; ++n) {
+            EXPECT_EQ(Find(names[n]), kOk);
+            EXPECT_EQ(bench_->findData.path[2].index, static_cast<s32>(n));
+        }
+        const u32 room = GetParam() / 32;
+        for (u32 n = 0; n < 24; ++n) {
+            EXPECT_EQ(Remembered().Child(n), n < room ? n + 1 : 0) << n;
+        }
+    }
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+// ---- children that are cached
+
+TEST_P(RootRemembers, WhereItsCachedChildrenLie) {
+    Open({u"B", u"C", u"D", u"E"}, 1);
+    ASSERT_EQ(Find(u"C"), kOk);
+    const HfsNode* leaf = bench_->findData.path[1].node;
+    const HintPlace hint = FindHint(&bench_.tree.tree, Root(), 2);
+    ASSERT_TRUE(hint);
+    EXPECT_EQ(hint.Node(), leaf);
+    EXPECT_EQ(hint.Data(), leaf->bufs[0].data);
+    EXPECT_EQ(leaf->hintedBy, Root());
+    EXPECT_FALSE(FindHint(&bench_.tree.tree, Root(), 1));
+    EXPECT_FALSE(FindHint(&bench_.tree.tree, leaf, 2));
+    EXPECT_FALSE(FindHint(&bench_.tree.tree, nullptr, 2));
+    EXPECT_EQ(bench_->rootHint, Root());
+}
+
+TEST_P(RootRemembers, NoChildThatLeftTheCache) {
+    Open({u"B", u"C", u"D", u"E"}, 1);
+    ASSERT_EQ(Find(u"C"), kOk);
+    HfsNode* root = Root();
+    HfsNode* leaf = bench_->findData.path[1].node;
+    ASSERT_EQ(Find(u"D"), kOk);
+    bench_->PutINode(leaf, false);
+    EXPECT_FALSE(FindHint(&bench_.tree.tree, root, 2));
+    EXPECT_TRUE(FindHint(&bench_.tree.tree, root, 3));
+    EXPECT_EQ(Find(u"C"), kOk);
+    EXPECT_TRUE(FindHint(&bench_.tree.tree, root, 2));
+}
+
+INSTANTIATE_TEST_SUITE_P(Roots, RootRemembers, ::testing::Values(512u, 1024u));
+
+}  // namespace
+}  // namespace VELK::test
