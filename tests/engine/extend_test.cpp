@@ -293,6 +293,16 @@ TEST_P(Extend, LastMapNodeIsLinkedAndNodeZeroLeftAlone) {
     EXPECT_TRUE(MapIsSound());
 }
 
+TEST_P(Extend, NodeZeroChangedOnceMoreIsHandedOverBehindTheOthers) {
+    Open(HeadBits(), 3);
+    HfsNode* taken = nullptr;
+    ASSERT_EQ(Tree().AllocateNode(&taken), kOk);
+    taken->refCount -= 1;
+    EXPECT_EQ(ModifiedNodes(Tree()), (std::vector<u32>{0, 3}));
+    ASSERT_EQ(GrowTo(HeadBits() + 9), kOk);
+    EXPECT_EQ(ModifiedNodes(Tree()), (std::vector<u32>{3, 0, HeadBits()}));
+}
+
 TEST_P(Extend, BitsOfNewMapNodesRunOverIntoThem) {
     Open(HeadBits() - 1, 3);
     ASSERT_EQ(GrowTo(HeadBits() + 2 * StepBits() + 5), kOk);

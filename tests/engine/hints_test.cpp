@@ -260,6 +260,106 @@ TEST_P(RootRemembers, NoChildThatLeftTheCache) {
     EXPECT_TRUE(FindHint(&bench_.tree.tree, root, 2));
 }
 
+// ---- places of children
+
+// A parent with four sets of three places each; a child belongs into the set of its number and
+// into the one beside, 0 with 1 and 2 with 3.
+class ChildPlaces : public ::testing::Test {
+protected:
+    ChildPlaces() : bench_(Blocks(512)), parent_(NodeImage{}.Build(512), 512, 100) {
+        bench_->nodeShift = 9;
+        EXPECT_EQ(HintSetCount(&bench_.tree.tree), 4u);
+        memory_.resize(HintBytes(&bench_.tree.tree) / sizeof(HfsHintSet) + 1);
+        std::memset(static_cast<void*>(memory_.data()), 0, memory_.size() * sizeof(HfsHintSet));
+        parent_->hints = memory_.data();
+    }
+    ~ChildPlaces() override { parent_->hints = nullptr; }
+
+    HfsNode* Hint(u32 number) {
+        children_.push_back(std::make_unique<LooseNode>(NodeImage{}.Build(512), 512, number));
+        SetHint(&bench_.tree.tree, parent_.Get(), children_.back()->Get());
+        EXPECT_EQ(children_.back()->Get()->hintedBy, parent_.Get());
+        return children_.back()->Get();
+    }
+    // Set and place of the hint at a child, as 10 x set + place; 99: there is none.
+    u32 PlaceOf(u32 number) {
+        const HintPlace hint = FindHint(&bench_.tree.tree, parent_.Get(), number);
+        return hint ? 10 * static_cast<u32>(hint.set - memory_.data()) + hint.place : 99;
+    }
+
+    Bench bench_;
+    LooseNode parent_;
+    std::vector<HfsHintSet> memory_;
+    std::vector<std::unique_ptr<LooseNode>> children_;
+};
+
+TEST_F(ChildPlaces, OwnSetThenTheOneBeside) {
+    std::vector<u32> places;
+    for (const u32 number : {5u, 9u, 13u, 17u, 21u, 25u, 6u, 7u}) {
+        const HfsNode* child = Hint(number);
+        places.push_back(PlaceOf(number));
+        EXPECT_EQ(FindHint(&bench_.tree.tree, parent_.Get(), number).Node(), child);
+        EXPECT_EQ(FindHint(&bench_.tree.tree, parent_.Get(), number).Data(), child->bufs[0].data);
+    }
+    EXPECT_EQ(places, (std::vector<u32>{10, 11, 12, 0, 1, 2, 20, 30}));
+    EXPECT_EQ(PlaceOf(29), 99u);
+}
+
+TEST_F(ChildPlaces, OneTooManyTakesThePlaceOfAnotherInTurn) {
+    std::vector<HfsNode*> children;
+    for (u32 n = 0; n < 11; ++n) {
+        children.push_back(Hint(4 + 4 * n));
+    }
+    const std::vector<u32> places = {99, 99, 99, 10, 11, 12, 99, 99, 2, 0, 1};
+    for (u32 n = 0; n < 11; ++n) {
+        EXPECT_EQ(PlaceOf(4 + 4 * n), places[n]) << n;
+        EXPECT_EQ(children[n]->hintedBy, places[n] == 99 ? nullptr : parent_.Get()) << n;
+    }
+}
+
+TEST_F(ChildPlaces, AChildHasOnePlaceOnly) {
+    HfsNode* child = Hint(5);
+    Hint(9);
+    SetHint(&bench_.tree.tree, parent_.Get(), child);
+    EXPECT_EQ(PlaceOf(5), 10u);
+    EXPECT_EQ(PlaceOf(9), 11u);
+    EXPECT_EQ(memory_[1].node[2], nullptr);
+}
+
+TEST_F(ChildPlaces, ANodeIsNotItsOwnChild) {
+    SetHint(&bench_.tree.tree, parent_.Get(), parent_.Get());
+    EXPECT_EQ(PlaceOf(100), 99u);
+    EXPECT_EQ(parent_->hintedBy, nullptr);
+}
+
+TEST_F(ChildPlaces, AForgottenPlaceIsFreeAgain) {
+    HfsNode* first = Hint(5);
+    Hint(9);
+    bench_->rootHint = first;
+    ForgetHints(&bench_.tree.tree, first);
+    EXPECT_EQ(first->hintedBy, nullptr);
+    EXPECT_EQ(bench_->rootHint, nullptr);
+    EXPECT_EQ(PlaceOf(5), 99u);
+    Hint(13);
+    EXPECT_EQ(PlaceOf(13), 10u);
+    EXPECT_EQ(PlaceOf(9), 11u);
+}
+
+TEST_F(ChildPlaces, AParentThatGoesLetsItsChildrenGo) {
+    std::vector<HfsNode*> children;
+    for (const u32 number : {5u, 9u, 6u, 7u}) {
+        children.push_back(Hint(number));
+    }
+    HfsNode* other = children_[0]->Get();
+    bench_->rootHint = other;
+    ForgetHints(&bench_.tree.tree, parent_.Get());
+    for (const HfsNode* child : children) {
+        EXPECT_EQ(child->hintedBy, nullptr);
+    }
+    EXPECT_EQ(bench_->rootHint, other);
+    bench_->rootHint = nullptr;
+}
+
 INSTANTIATE_TEST_SUITE_P(Roots, RootRemembers, ::testing::Values(512u, 1024u));
 
 }  // namespace

@@ -323,5 +323,79 @@ TEST_F(IterateBadPath, AnEmptyLeafAtTheFrontLeavesNoUsablePosition) {
     EXPECT_EQ(Step(1), kErrInvalid);
 }
 
+// ---- delivery
+
+// Keys in folded order are delivered by a short way where nothing is out of the ordinary, keys in
+// other orders never are: whatever the bytes, both come to the same.
+struct DeliveryShape {
+    u32 nodeSize;
+    u32 dataSize;  // of 10 bytes: all in the first block; of more: the third key or data in two
+};
+
+struct Delivered {
+    int status;
+    Events events;
+    Bytes key;
+    Bytes record;
+
+    bool operator==(const Delivered&) const = default;
+};
+
+class DeliverDamaged : public ::testing::TestWithParam<DeliveryShape> {
+protected:
+    static constexpr u32 kRecords = 4;
+
+    static Delivered Deliver(const TreeImage& image, CompareKeysFn compare, s32 index) {
+        Bench bench(Blocks(512));
+        bench.Open(image);
+        bench->compareKeys = compare;
+        HfsFindData path;
+        EXPECT_EQ(bench->ReadLevel(1, 1, &path), kOk);
+        path.level = 1;
+        path.valid = true;
+        path.path[1].index = index;
+        alignas(8) u8 key[kKeyLengthSize + kMaxKeyLength] = {};
+        Bytes record(image.shape.nodeSize);
+        u32 size = 0;
+        u32 keySize = 0;
+        const int status =
+            bench->IncPos(0, record.data(), image.shape.nodeSize, &size, key, 40, &keySize, &path);
+        path.ClearPath();
+        record.resize(size);
+        return {status, bench.capture.Take(), Bytes(key, key + keySize), record};
+    }
+};
+
+TEST_P(DeliverDamaged, AnyWordReplaced) {
+    const u32 nodeSize = GetParam().nodeSize;
+    TreeShape shape;
+    shape.nodeSize = nodeSize;
+    shape.freeNodes = 1;
+    const TreeImage sound = BuildTree(shape, NthRecords(4, kRecords, GetParam().dataSize));
+    const u32 recordSize = 20 + GetParam().dataSize;
+    u32 delivered = 0;
+    for (u32 at = 10; at < nodeSize; at += 2) {
+        const bool isData = at >= 14 && (at - 14) % recordSize >= 10;
+        if (at < nodeSize - 2 * (kRecords + 1) && (isData || at >= 14 + kRecords * recordSize)) {
+            continue;
+        }
+        for (const u32 value : {0u, 3u, 14u, 0xFFu, 0xFFFFu, 510u, 511u, 512u, 513u, 1024u}) {
+            TreeImage image = sound;
+            image.Patch16(1, at, value);
+            for (s32 index = 0; index < static_cast<s32>(kRecords); ++index) {
+                const Delivered folded = Deliver(image, CompareCatKeysCaseIns, index);
+                ASSERT_TRUE(folded == Deliver(image, CompareCatKeysCaseBin, index))
+                    << "byte " << at << " value " << value << " record " << index;
+                delivered += folded.status == kOk ? 1 : 0;
+            }
+        }
+    }
+    EXPECT_GT(delivered, 500u);
+}
+
+INSTANTIATE_TEST_SUITE_P(Leaves, DeliverDamaged,
+                         ::testing::Values(DeliveryShape{512, 10}, DeliveryShape{1024, 10},
+                                           DeliveryShape{1024, 150}, DeliveryShape{1024, 220}));
+
 }  // namespace
 }  // namespace VELK::test

@@ -10,7 +10,8 @@ should. Jumps to a trap are left out: reversing those kills by itself.
 Mutants that behave as the original does may stand in a list (see line_list.py); `what` is
 "reversed", "removed" or "any", and may go on with "in FUNCTION": of the copies that the compiler
 made of a line, those put into such a function. FUNCTION is a pattern of the shell, met by a name
-without its namespaces. They are tried all the same; those that survive are left out of the score.
+without its namespaces, or by all of them as they are printed, "INNER < OUTER". Such mutants are
+tried all the same; those that survive are left out of the score.
 
 What became of each mutant is noted, so that a run broken off can go on: a mutant that was killed is
 tried again with its killer first, one that survived only after the tests have changed.
@@ -242,8 +243,9 @@ class Excuses:
     def find(self, mutant):
         for what, why in self.lines.remarks(pathlib.Path(mutant.file).name, code_of(mutant)):
             what, _, function = what.partition(" in ")
+            names = [*mutant.functions, chain_of(mutant)]
             if what in (mutant.what, "any") and (not function or any(
-                    fnmatch.fnmatchcase(name, function) for name in mutant.functions)):
+                    fnmatch.fnmatchcase(name, function) for name in names)):
                 return why
         return None
 
@@ -253,10 +255,14 @@ def code_of(mutant):
     return lines[mutant.line - 1].strip() if 0 < mutant.line <= len(lines) else "?"
 
 
+def chain_of(mutant):
+    """The function of the line < the one it was put into < ..."""
+    return " < ".join(name.partition("(")[0] for name in mutant.functions)
+
+
 def describe(mutant):
     name = f"{pathlib.Path(mutant.file).name}:{mutant.line}"
-    functions = " < ".join(name.partition("(")[0] for name in mutant.functions)
-    return f"{name}: jump {mutant.address:x} {mutant.what} in {functions}: {code_of(mutant)}"
+    return f"{name}: jump {mutant.address:x} {mutant.what} in {chain_of(mutant)}: {code_of(mutant)}"
 
 
 def arguments():

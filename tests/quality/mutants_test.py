@@ -25,7 +25,7 @@ class Mutants(unittest.TestCase):
 
     def run_on(self, source, program=SHOULD, listed=""):
         source_folder = self.folder / "source"
-        source_folder.mkdir()
+        source_folder.mkdir(exist_ok=True)
         (source_folder / "lib.cpp").write_text(source, encoding="utf-8")
         (self.folder / "test.cpp").write_text(program, encoding="utf-8")
         (self.folder / "equivalent.list").write_text(listed, encoding="utf-8")
@@ -37,7 +37,8 @@ class Mutants(unittest.TestCase):
                        cwd=self.folder, check=True)
         done = subprocess.run(
             [sys.executable, HERE / "mutants.py", "libx.so", "source", str(self.folder / "test"),
-             "--count", "0", "--spare", "1", "--equivalent", "equivalent.list"],
+             "--count", "0", "--spare", "1", "--equivalent", "equivalent.list",
+             "--notes", "notes"],
             cwd=self.folder, capture_output=True, text=True, check=False)
         return done.returncode, done.stdout + done.stderr
 
@@ -58,6 +59,26 @@ class Mutants(unittest.TestCase):
                                    listed="lib.cpp: if (a < 0) {\n    any: nobody asks\n")
         self.assertEqual(status, 0, text)
         self.assertIn("2 killed, 0 survived, 2 equivalent, of 4: 100.0% killed", text)
+
+    def test_a_mutant_is_listed_for_the_function_it_is_in(self):
+        listed = "lib.cpp: if (a < 0) {\n    any in {}: nobody asks\n"
+        status, text = self.run_on(TRIED + UNTRIED, listed=listed.replace("{}", "Larg*"))
+        self.assertIn("2 killed, 2 survived, 0 equivalent, of 4", text)
+        status, text = self.run_on(TRIED + UNTRIED, listed=listed.replace("{}", "Sign(*"))
+        self.assertEqual(status, 0, text)
+        self.assertIn("2 killed, 0 survived, 2 equivalent, of 4", text)
+
+    def test_what_survived_is_tried_again_when_the_tests_have_changed(self):
+        self.run_on(TRIED + UNTRIED)
+        _, text = self.run_on(TRIED + UNTRIED)
+        self.assertIn("2 had survived these tests before and were not tried again", text)
+        self.assertIn("2 killed, 2 survived, 0 equivalent, of 4", text)
+        better = SHOULD.replace("int main() { return", "int Sign(int a);\nint main() { return "
+                                "Sign(-7) == -1 && Sign(0) == 1 &&")
+        status, text = self.run_on(TRIED + UNTRIED, better)
+        self.assertEqual(status, 0, text)
+        self.assertNotIn("not tried again", text)
+        self.assertIn("4 killed, 0 survived, 0 equivalent, of 4", text)
 
     def test_endless_mutants_are_killed(self):
         loop = "int Larger(int a, int b) {\n    while (a == 77) {\n    }\n"
