@@ -29,8 +29,10 @@ most_bytes() {
     esac
 }
 
+# Without entropic schedules: weighing thousands of inputs by their features takes a third of the
+# time and finds no more.
 libfuzzer_run() {
-    "$build/fuzz_$1" -max_total_time="$seconds" -timeout=20 -rss_limit_mb=2048 \
+    "$build/fuzz_$1" -max_total_time="$seconds" -timeout=20 -rss_limit_mb=2048 -entropic=0 \
         -max_len="$(most_bytes "$1")" -print_final_stats=1 -artifact_prefix="$work/$1-" \
         "$work/$1" "$work/seeds/$1" "$here/corpus/$1" >"$work/$1.log" 2>&1
 }

@@ -63,6 +63,22 @@ void Trees() {
             Write("open", name + "-all", {kind, 4, 15}, tree.bytes);
         }
     }
+    test::TreeShape binary;
+    binary.keyCompareType = kKeyCompareBinary;
+    const auto tree = test::BuildTree(binary, test::NthRecords(kCatalogFileId, 80, 40));
+    Write("open", "binary", {0, 8, 7}, tree.bytes);
+}
+
+// Keys that come in any order and are there when the other operations ask for them.
+Bytes Settled() {
+    Bytes settled;
+    for (u32 i = 0; i < 400; ++i) {
+        const u8 key = static_cast<u8>(i * 37);
+        test::AppendBytes(&settled, {0, key, static_cast<u8>(i * 5)});
+        const u8 earlier = static_cast<u8>(i / 2 * 37);
+        test::AppendBytes(&settled, {static_cast<u8>(3 + i % 5), earlier, static_cast<u8>(i / 5)});
+    }
+    return settled;
 }
 
 void Operations() {
@@ -84,7 +100,13 @@ void Operations() {
         Write("ops", "rise-and-fall-" + name, {kind, 0}, rise);
         Write("ops", "mixed-" + name, {kind, 0x14}, mixed);
         Write("ops", "mixed-in-two-blocks-" + name, {kind, 0x11}, mixed);
+        Bytes grown = Settled();
+        test::AppendBytes(&grown, {0x96, 0, 5});  // by so many nodes that the map needs another one
+        test::AppendBytes(&grown, mixed);
+        Write("ops", "grown-" + name, {kind, 0}, grown);
+        Write("ops", "settled-" + name, {kind, 0x10}, Settled());
         Write("ops", "made-here-" + name, {kind, 8}, rise);
+        Write("ops", "made-here-settled-" + name, {kind, 8}, Settled());
         Write("ops", "made-here-mixed-" + name, {kind, 0x49}, mixed);
     }
 }
