@@ -22,6 +22,15 @@ void Mutator::Node(u8* node, u32 nodeSize, u32 fileId, u32 totalNodes) {
     Field(node, test::FieldsOfNode(node, nodeSize, fileId), nodeSize, totalNodes);
 }
 
+// A number in the records of one node, if it is a leaf: an ID, a size, an extent.
+void Mutator::Data(u8* tree, u32 nodeSize, u32 nodes) {
+    u8* node = tree + std::size_t{Below(nodes)} * nodeSize;
+    const std::vector<test::Field> words = test::DataOfNode(node, nodeSize);
+    if (!words.empty()) {
+        Field(node, words, nodeSize, nodes);
+    }
+}
+
 // One node's link or child number names another node, often tying a ring.
 void Mutator::Link(u8* tree, u32 nodeSize, u32 nodes) {
     u8* node = tree + std::size_t{Below(nodes)} * nodeSize;
@@ -54,6 +63,8 @@ void Mutator::TreeFile(u8* tree, std::size_t size, u32 fileId) {
             CopyNode(tree, nodeSize, nodes);
         } else if (verb < 4) {
             Link(tree, nodeSize, nodes);
+        } else if (verb < 7) {
+            Data(tree, nodeSize, nodes);
         } else {
             const u32 number = OneIn(3) ? 0 : Below(nodes);
             Node(tree + std::size_t{number} * nodeSize, nodeSize, fileId, nodes);

@@ -1,6 +1,6 @@
 // Mutations that know the format: they pick a node and one of its fields and give it a telling
-// number, or tie nodes into rings, exchange them, take records away. Targets build their
-// LLVMFuzzerCustomMutator from these; libFuzzer and the replay both call it.
+// number, or tie nodes into rings and exchange them. Targets build their LLVMFuzzerCustomMutator
+// from these; libFuzzer and the replay both call it.
 #pragma once
 
 #include <cstddef>
@@ -26,10 +26,12 @@ public:
     // Gives one of the fields a telling value, or any.
     void Field(u8* bytes, const std::vector<test::Field>& fields, u32 nodeSize, u64 limit);
     void Node(u8* node, u32 nodeSize, u32 fileId, u32 totalNodes);
-    // A field of one node mostly; or links two nodes, copies one over another, drops a record.
+    // A field of one node mostly; or a number in a record's data; or links two nodes, copies one
+    // over another.
     void TreeFile(u8* tree, std::size_t size, u32 fileId);
 
 private:
+    void Data(u8* tree, u32 nodeSize, u32 nodes);
     void Link(u8* tree, u32 nodeSize, u32 nodes);
     void CopyNode(u8* tree, u32 nodeSize, u32 nodes);
 

@@ -157,6 +157,28 @@ std::vector<Field> FieldsOfNode(const u8* node, u32 nodeSize, u32 fileId) {
     return list.fields;
 }
 
+std::vector<Field> DataOfNode(const u8* node, u32 nodeSize) {
+    std::vector<Field> fields;
+    const u32 records =
+        std::min(Number16(node + kDescNumRecords), (nodeSize - kDescSize) / kSlotSize - 1);
+    for (u32 i = 0; i < records && static_cast<s8>(node[kDescKind]) == kBTLeafNode; ++i) {
+        const u8* slot = node + nodeSize - kSlotSize * (i + 1);
+        const u32 start = Number16(slot);
+        const u32 end = std::min(Number16(slot - kSlotSize), nodeSize);
+        if (start + kKeyLengthSize > nodeSize) {
+            continue;
+        }
+        u32 at = start + ((kKeyLengthSize + Number16(node + start) + 1) & ~1u);
+        if (at + 2 <= end) {
+            fields.push_back({at, 2, "record type"});
+        }
+        for (; at + 4 <= end; at += 4) {
+            fields.push_back({at, 4, "data"});
+        }
+    }
+    return fields;
+}
+
 const std::vector<Field>& FieldsOfVolumeHeader() {
     static const std::vector<Field> fields = VolumeHeaderFields();
     return fields;

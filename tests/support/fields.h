@@ -24,6 +24,8 @@ void SetField(u8* bytes, const Field& field, u64 value);
 // first words; else of every record its key length, the numbers of its key, and its child.
 // `fileId` says how keys are laid out.
 std::vector<Field> FieldsOfNode(const u8* node, u32 nodeSize, u32 fileId);
+// The numbers in the data of a leaf's records, whatever they mean: the type, then words.
+std::vector<Field> DataOfNode(const u8* node, u32 nodeSize);
 // The fields of a volume header, from its first byte.
 const std::vector<Field>& FieldsOfVolumeHeader();
 // Those of a journal header and of a block list with `blocks` blocks.
