@@ -7,6 +7,7 @@
 #include <string>
 
 #include "fuzz.h"
+#include "hfs/records/record_fields.h"
 #include "mutate.h"
 #include "tool/script.h"
 
@@ -53,6 +54,15 @@ void Run(const ScriptContext& given, const std::string& text, u32 lines) {
     FUZZ_CHECK(again.line == problem.line && again.what == problem.what);
     FUZZ_CHECK(second.lines.size() == script.lines.size());
     FUZZ_CHECK(secondContext.fileId == context.fileId);
+}
+
+// The start of a record, or of one of its fields.
+std::string RecordWord(fuzz::Mutator* mutator) {
+    const RecordKind& kind = kRecordKinds[mutator->Below(kRecordKindCount)];
+    if (kind.fieldCount == 0 || mutator->OneIn(4)) {
+        return std::string(kind.name) + "{";
+    }
+    return std::string(",") + kind.fields[mutator->Below(kind.fieldCount)].name + ":";
 }
 
 }  // namespace
@@ -120,15 +130,18 @@ extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::
                                          "id=",
                                          "name=",
                                          "data",
-                                         "rsrc"};
+                                         "rsrc",
+                                         "2001-02-03T04:05:06",
+                                         "0755"};
     static const std::vector<std::string> operations = ScriptOpNames();
     fuzz::Mutator mutator(seed);
     if (mutator.OneIn(2)) {
         return LLVMFuzzerMutate(data, size, most);
     }
     const std::string word =
-        mutator.OneIn(2) ? operations[mutator.Below(static_cast<u32>(operations.size()))] + " "
-                         : kWords[mutator.Below(static_cast<u32>(std::size(kWords)))];
+        mutator.OneIn(3)   ? RecordWord(&mutator)
+        : mutator.OneIn(2) ? operations[mutator.Below(static_cast<u32>(operations.size()))] + " "
+                           : kWords[mutator.Below(static_cast<u32>(std::size(kWords)))];
     if (size == 0 || size + word.size() > most) {
         return LLVMFuzzerMutate(data, size, most);
     }

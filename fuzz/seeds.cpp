@@ -10,6 +10,9 @@
 #include "node_image.h"
 #include "specimen.h"
 #include "tree_image.h"
+#ifdef TREEHFS_WITH_SCRIPTS
+#include "tool/script.h"
+#endif
 
 namespace {
 
@@ -182,25 +185,42 @@ void Finder() {
     write("nothing", usual, Bytes(1024), 1024);
 }
 
+// Each is accepted: one that is refused leads nowhere.
 void Scripts() {
     const std::pair<const char*, const char*> scripts[] = {
         {"keys",
          "use extents\ninsert 16:data:0 extents{[[1,2],[9,4]]}\nuse attributes\n"
          "insert 37:\"com.example.tag\" inline{\"text\"}\nfind 37:big:8\nuse catalog\n"
-         "get hex:0008000000020001\nseek first\nnext 3\nprev\nhere\npos\ngoto 4294967296\n"},
+         "get hex:0006000000020000\nseek first\nnext 3\nprev\nhere\npos\ngoto 4294967296\n"},
         {"changes",
-         "#!treehfs apply --script 1\ncreate catalog node=512\nrepeat 20\n"
+         "#!treehfs apply --script 1\ncreate 9\nrepeat 20\n"
          "insert 2:\"n$i\" file{id:$i,size:1107,data:[[17,1]]} # a comment\nexpect ok\n"
          "repeat 2\nfind $j:x$i\nend\nend\nupdate 2:n1 zero:248\ndelete 2:n2\nflush\n"
-         "replace 2:n3 folder{id:9,valence:3,created:\"2001-01-01T00:00:00\"}\nexpect exists\n"},
+         "replace 2:n3 folder{id:9,valence:3,created:2001-01-01T00:00:00}\nexpect exists\n"},
         {"looks",
-         "state\nheader\nnode 0\ncheck full\nstats\ndigest\nshow data\nset strict\n"
-         "echo $i anything\nwalk 5\nreserve 3\nrelease\nextend 20\nclear\nrestore\nreopen\n"
-         "badblocks\nfail alloc 3\nwalk 2 back\n"},
+         "state\nheader\nnode 0\ncheck quick\nstats\ndigest\nshow data\nset trace on\n"
+         "repeat 2\necho $i anything\nend\nwalk 5\nreserve 3\nrelease\nextend "
+         "20\nclear\nrestore\nreopen\n"
+         "badblocks\nfail alloc after 3\nwalk 2\n"},
+        {"records",
+         "insert 2:\"a b\" file{id:20,size:1107,data:[[17,1],[30,2]],rsrc:[[40,3]],rblocks:9,"
+         "created:2001-02-03T04:05:06,mode:0100644,filetype:\"TEXT\",flags:0x2,xflags:1}\n"
+         "update 2:a folder{id:9,valence:3,modified:3000000000,backup:2001-02-03,mode:493}\n"
+         "insert 9:\"\" thread{parent:2,name:\"a b\"}\n"
+         "insert 20:\"\" thread-file{parent:2,name:b}\nuse extents\n"
+         "insert 16:rsrc:8 extents{[[1,2]]}\ninsert 17:data:0 zero:64\nuse attributes\n"
+         "insert 37:t fork{size:5,data:[[9,1]]}\ninsert 37:t:8 extents{[[9,1]]}\n"
+         "insert 37:u inline{hex:00ff}\ninsert 37:v fill:7F*30\ninsert 37:w seq:9\n"
+         "update 37:w same\n"},
     };
     for (const auto& [name, text] : scripts) {
         const std::string all = text;
-        Write("script", name, {4}, Bytes(all.begin(), all.end()));
+#ifdef TREEHFS_WITH_SCRIPTS
+        tool::ScriptContext context;
+        tool::Script script;
+        FUZZ_CHECK(!tool::ParseScript(name, all, &context, &script));
+#endif
+        Write("script", name, {12}, Bytes(all.begin(), all.end()));
     }
 }
 
