@@ -309,6 +309,8 @@ TEST_P(Extend, BitsOfNewMapNodesRunOverIntoThem) {
     EXPECT_EQ(Chain(), (std::vector<u32>{HeadBits() - 1, HeadBits(), HeadBits() + 1}));
     EXPECT_EQ(Live(0)[NodeSize() - 9], 0x01);
     EXPECT_EQ(Live(HeadBits() - 1)[14], 0xC0);
+    EXPECT_EQ(ModifiedNodes(Tree()),
+              (std::vector<u32>{HeadBits(), HeadBits() + 1, 0, HeadBits() - 1}));
     EXPECT_EQ(Tree().header.freeNodes, HeadBits() + 2 * StepBits() + 5 - 3 - 3);
     EXPECT_TRUE(MapIsSound());
     EXPECT_EVENTS();

@@ -56,6 +56,11 @@ TEST_P(PositionTest, ConvertsTheCallersKey) {
     std::copy(host.bytes, host.bytes + sizeof key.bytes, key.bytes);
     EXPECT_EQ(bench_->GetPos(&path_, &key, &copy), Position(4, 1));
     EXPECT_EQ(Bytes(copy.bytes, copy.bytes + 20), NthDiskKey(4, 7));
+    copy = {};
+    path_.level = 2;
+    EXPECT_EQ(bench_->GetPos(&path_, &key, &copy), Position(10, 3));
+    EXPECT_EQ(Bytes(copy.bytes, copy.bytes + 20), NthDiskKey(4, 7));
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(3151)});
 }
 
 TEST_P(PositionTest, WithoutACopyOrAHookNoKeyIsConverted) {
