@@ -105,5 +105,32 @@ TEST_F(InsertAloneIntoTheLeft, RootWithASiblingTellsNobody) {
     EXPECT_EQ(RecordsOf(2), kFit);
 }
 
+// An index node of another writer is full of separators with more data than a child's number, but
+// for the first. One more, of the first leaf, which is split, sends some of them to the left
+// sibling: nobody is led by the odd ones, and nothing is said of them.
+TEST(InsertBesideDamage, SeparatorsOutOfTheOrdinaryThatMoveAreNotReported) {
+    TreeShape shape;
+    shape.childrenPerIndex = 4;
+    const std::vector<TreeRecord> records = NthRecords(kCatalogFileId, 32, 100);
+    TreeImage image = BuildTree(shape, records);
+    ASSERT_EQ(image.levels[1].size(), 8u);
+    NodeImage index;
+    index.kind = kBTIndexNode;
+    index.height = 2;
+    index.bLink = 9;
+    index.records = {Record(records[16].key, 5)};
+    for (u32 n = 1; n < 4; ++n) {
+        Bytes data(134);
+        Put32(&data, 0, 5 + n);
+        index.records.push_back(Record(records[16 + 4 * n].key, data));
+    }
+    image.SetNode(10, index.Build(512));
+    TreeOnVolume tree(image, 512);
+    EXPECT_EQ(tree.InsertNth(17, 100, true), kOk);
+    EXPECT_TRUE(tree.capture.Take().empty());
+    EXPECT_EQ(Get16(tree.Node(9), kDescNumRecords), 7u);
+    EXPECT_EQ(Get16(tree.Node(10), kDescNumRecords), 2u);
+}
+
 }  // namespace
 }  // namespace VELK::test

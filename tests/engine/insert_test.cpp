@@ -2,7 +2,9 @@
 // becomes of header, links and separators.
 #include <algorithm>
 
+#include "bench.h"
 #include "geometry.h"
+#include "hfs/treehfs/node_desc.h"
 #include "node_bench.h"
 #include "tree_test.h"
 
@@ -284,6 +286,48 @@ TEST(InsertGrowth, NodesBeyondTheMapBringAMapNode) {
     EXPECT_EQ(tree->header.freeNodes, 0u);          // map node, new leaf, new root
     EXPECT_EQ(tree.Node(2048)[kDescKind], kBTMapNode);
     EXPECT_EQ(tree->header.rootNode, 2050u);
+}
+
+// In a tree made here keys come into one leaf in descending order, behind its first record: each is
+// looked up on the leaf of the one before. The root is split meanwhile, and that leaf gets another
+// parent, where the next split of the leaf has to be entered.
+TEST(InsertOnOneLeaf, ASplitOfItsParentIsFollowed) {
+    Bench bench(Blocks(512));
+    bench->compareKeys = CompareCatKeysCaseIns;
+    bench->header.maxKeyLength = kCatMaxKeyLength;
+    bench->header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
+    const unsigned long long size = 128 * 512;
+    ASSERT_EQ(bench->Create(9, 0, &size), kOk);
+    const Bytes data = Pattern(100, 1);
+    const auto insert = [&](u32 parent, const std::u16string& name) {
+        return bench->InsertRecord(HostCatKey(parent, name), parent, data.data(), 100);
+    };
+    const HfsFindLevel* path = bench->findData.path;
+    u32 last = 0;
+    while (bench->header.treeDepth < 2 || NumRecords(path[2].node) < 24) {
+        ASSERT_EQ(insert(++last, u"a"), kOk);
+    }
+    // Full leaves, so that none takes records of its right sibling.
+    for (u32 parent = 1; parent <= last; ++parent) {
+        ASSERT_EQ(insert(parent, u"a"), kErrExists);
+        for (u32 n = NumRecords(path[1].node); n < 4; ++n) {
+            ASSERT_EQ(insert(parent, std::u16string(n, u'b')), kOk);
+        }
+    }
+    u32 parent = last;
+    do {
+        ASSERT_EQ(insert(--parent, u"a"), kErrExists);
+    } while (path[1].index != 0);
+    const s32 index = path[2].index;
+    EXPECT_GE(index, 20);
+    EXPECT_EQ(NumRecords(path[2].node), 24u);
+    for (char16_t unit = u'z'; unit >= u'a'; --unit) {
+        ASSERT_EQ(insert(parent, {u'a', unit, u'x'}), kOk) << static_cast<u32>(unit);
+    }
+    EXPECT_EQ(bench->header.treeDepth, 3);
+    EXPECT_LT(path[2].index, index);
+    EXPECT_EQ(bench.capture.Take(), Events{});
+    bench->findData.ClearPath();
 }
 
 }  // namespace
