@@ -45,6 +45,26 @@ TEST_P(RecordInsert, MinusOneAppendsToAnEmptyNode) {
     EXPECT_EQ(Get16(content, NodeSize() - 4), 34u);
 }
 
+// Nodes of records without keys are changed by the long way.
+TEST_P(RecordInsert, ANodeChangedOnceMoreIsTheLastToHandOver) {
+    for (const s8 kind : {kBTLeafNode, kBTIndexNode, kBTMapNode}) {
+        NodeImage image;
+        image.kind = kind;
+        image.records = SomeRecords(2, kChildSize);
+        const auto node = bench_.Node(image.Build(NodeSize()), 1);
+        const auto other = bench_.Node(Leaf(), 2);
+        ASSERT_EQ(tree_.SetDirty(node->Get(), 0, NodeSize()), kOk);
+        ASSERT_EQ(tree_.SetDirty(other->Get(), 0), kOk);
+        NodeKey key{};
+        EXPECT_EQ(tree_._InsertRecord(node->Get(), 1, 8, &key, nullptr), kOk);
+        EXPECT_EQ(key.offset, 14u + image.records[0].size());
+        EXPECT_EQ(tree_.modifiedList.next, &other->Get()->modifiedLink);
+        EXPECT_EQ(tree_.modifiedList.prev, &node->Get()->modifiedLink);
+        node->Get()->modifiedLink.Unlink();
+        other->Get()->modifiedLink.Unlink();
+    }
+}
+
 TEST_P(RecordInsert, RecordOfExactlyTheFreeSpaceFits) {
     const auto node = bench_.Node(Leaf());
     NodeKey key{};
