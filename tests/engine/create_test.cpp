@@ -147,10 +147,13 @@ TEST_P(CreateTree, CreatedTreeHandsOutItsNodes) {
 
 TEST_P(CreateTree, NodeSizesOutOfRangeAreRefused) {
     for (const unsigned shift : {0u, 8u, 16u, 0xFFFFFFFFu}) {
-        MakeSmallVolume(kAttributesFileId);
-        EXPECT_EQ(Tree().Create(shift, 0, nullptr), kErrInvalid);
-        EXPECT_EVENTS(Reported(kReasonUnknown, 5302));
-        ExpectNothingDone();
+        for (const u32 fileId : {kAttributesFileId, kCatalogFileId}) {
+            MakeSmallVolume(fileId);
+            Tree().compareKeys = CompareCatKeysCaseIns;
+            EXPECT_EQ(Tree().Create(shift, 0, nullptr), kErrInvalid);
+            EXPECT_EVENTS(Reported(kReasonUnknown, 5302));
+            ExpectNothingDone();
+        }
     }
 }
 

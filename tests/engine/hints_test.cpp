@@ -260,6 +260,54 @@ TEST_P(RootRemembers, NoChildThatLeftTheCache) {
     EXPECT_TRUE(FindHint(&bench_.tree.tree, root, 2));
 }
 
+// Three levels: leaves 1 .. 9, index nodes 10 .. 12 of four, four and one of them, root 13. A leaf
+// met beside another gets the parent of that one, unless a parent leads to it already.
+class BesideRemembers : public ::testing::Test {
+protected:
+    BesideRemembers() : bench_(Blocks(512)) { bench_.Open(SmallTree(512, 9)); }
+    ~BesideRemembers() override { bench_->findData.ClearPath(); }
+
+    HfsNode* Find(u32 n) {
+        const HostKey key = NthHostKey(4, n);
+        EXPECT_EQ(bench_->FindRecord(key.Get(), key.id, nullptr, 0, nullptr, nullptr), kOk);
+        return bench_->findData.path[1].node;
+    }
+    HfsNode* Step(int count) {
+        u8 record[8];
+        u32 size = 0;
+        u32 keySize = 0;
+        alignas(8) u8 key[40];
+        EXPECT_EQ(bench_->IncPos(count, record, 8, &size, key, 40, &keySize, nullptr), kOk);
+        return bench_->findData.path[1].node;
+    }
+    u32 ParentOf(const HfsNode* leaf) {
+        return leaf->hintedBy != nullptr ? leaf->hintedBy->nodeNum : 0;
+    }
+    // A leaf stays cached as long as it is modified.
+    void Keep(HfsNode* leaf) { ASSERT_EQ(bench_->SetDirty(leaf, 0), kOk); }
+
+    Bench bench_;
+};
+
+TEST_F(BesideRemembers, TheParentItCameFrom) {
+    EXPECT_EQ(ParentOf(Find(6)), 10u);
+    const HfsNode* next = Step(2);
+    EXPECT_EQ(next->nodeNum, 5u);
+    EXPECT_EQ(ParentOf(next), 10u);
+    EXPECT_TRUE(FindHint(&bench_.tree.tree, CachedNode(*bench_.tree, 10), 5));
+}
+
+TEST_F(BesideRemembers, TheParentThatLeadsThere) {
+    HfsNode* next = Find(8);
+    EXPECT_EQ(ParentOf(next), 11u);
+    Keep(next);
+    HfsNode* leaf = Find(6);
+    EXPECT_EQ(ParentOf(leaf), 10u);
+    EXPECT_EQ(Step(2), next);
+    EXPECT_EQ(ParentOf(next), 11u);
+    bench_->modifiedList.prev->Unlink();
+}
+
 // ---- places of children
 
 // A parent with four sets of three places each; a child belongs into the set of its number and
