@@ -154,6 +154,16 @@ TEST_F(SmallBalance, FullerLeftSiblingReceivesNothing) {
     EXPECT_EQ(out.index, 1);
 }
 
+TEST_F(SmallBalance, FullerRightSiblingReceivesNothing) {
+    bench_.Load(Even(6, 50, 20), Even(3, 50), kRight);  // 328 against 224
+    const Outcome out = bench_.Right(3, Sized(5, 50));
+    EXPECT_EQ(out.status, kOk);
+    EXPECT_EQ(out.moved, 0u);
+    EXPECT_EQ(bench_.Sibling(), Even(6, 50, 20));
+    EXPECT_EQ(out.nodeNum, kNode);
+    EXPECT_EQ(out.index, 3);
+}
+
 TEST_F(SmallBalance, LastEntryIsGivenBackWhenItDoesNotFitTheSibling) {
     // 304 against 484 + 52; 52 makes it 356 to 484, 252 more would be 608.
     bench_.Load({Sized(0, 286)},

@@ -6,6 +6,7 @@ add_executable(change_tests
   churn_test.cpp
   delete_test.cpp
   flat_tree.cpp
+  hand_over_test.cpp
   hazard_test.cpp
   insert_left_test.cpp
   insert_refusal_test.cpp

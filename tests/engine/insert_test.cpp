@@ -288,23 +288,6 @@ TEST(InsertGrowth, NodesBeyondTheMapBringAMapNode) {
     EXPECT_EQ(tree->header.rootNode, 2050u);
 }
 
-// Nodes are handed over in the order in which they were changed last: the map, the right sibling,
-// the two halves, the parent.
-TEST(InsertSplit, NodesChangedBeforeAreHandedOverInTheirNewOrder) {
-    const u32 fit = PerLeaf(512);
-    TreeOnVolume tree(Image(512, 3 * fit), 512);
-    ASSERT_EQ(tree->header.treeDepth, 2);
-    for (const u32 number : {3u, 2u, 4u, 1u}) {
-        HfsNode* node = nullptr;
-        ASSERT_EQ(tree->GetINode(number, &node, false), kOk);
-        ASSERT_EQ(tree->SetDirty(node, 0), kOk);
-        node->refCount -= 1;
-    }
-    EXPECT_EQ(ModifiedNodes(*tree), (std::vector<u32>{3, 2, 4, 1}));
-    EXPECT_EQ(tree.InsertNth(fit + 1, kData, true), kOk);
-    EXPECT_EQ(ModifiedNodes(*tree), (std::vector<u32>{1, 0, 3, 5, 2, 4}));
-}
-
 // In a tree made here keys come into one leaf in descending order, behind its first record: each is
 // looked up on the leaf of the one before. The root is split meanwhile, and that leaf gets another
 // parent, where the next split of the leaf has to be entered.

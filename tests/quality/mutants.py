@@ -319,10 +319,12 @@ def main():
                 print(f"{killed + survived + equivalent} of {count} tried, {survived} survived",
                       flush=True)
     percent = 100.0 * killed / (killed + survived) if killed + survived else 0.0
+    children = resource.getrusage(resource.RUSAGE_CHILDREN)
     if notes.remembered:
         print(f"{notes.remembered} had survived these tests before and were not tried again")
     print(f"{killed} killed, {survived} survived, {equivalent} equivalent, of {count}: "
-          f"{percent:.1f}% killed (wanted {args.least}%), {time.monotonic() - started:.0f} s")
+          f"{percent:.1f}% killed (wanted {args.least}%), {time.monotonic() - started:.0f} s, "
+          f"{children.ru_utime + children.ru_stime:.0f} s of processor time")
     return 0 if percent >= args.least else 1
 
 
