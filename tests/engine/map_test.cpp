@@ -345,6 +345,10 @@ TEST_P(MapAllocate, MapNodeRecordOutOfPlaceIsRefused) {
         EXPECT_EVENTS(Reported(kReasonNode, 9402), Reported(kErrCorrupt, 3698));
         ExpectUntouched(10);
     }
+    Open(HeadBits() + 10, HeadBits());
+    Poke32(1, NodeSize() - 4, (NodeSize() - 4) << 16 | 16);  // as long as it should be
+    EXPECT_EQ(Allocate(), kErrCorrupt);
+    EXPECT_EVENTS(Reported(kReasonNode, 9402), Reported(kErrCorrupt, 3698));
 }
 
 TEST_P(MapAllocate, NodeZeroIsNeverHandedOut) {
