@@ -438,5 +438,21 @@ TEST(ClearPath, AssertsGapsAndCountsBelowZero) {
     nodes[1]->refCount = 0;
 }
 
+// What lies behind a key without a name is no unit of it, though it may look like one.
+TEST(FindNameless, DataBehindTheKeyIsNoName) {
+    for (const u32 nodeSize : {512u, 1024u}) {
+        Bench bench(Blocks(512));
+        TreeShape shape;
+        shape.nodeSize = nodeSize;
+        bench.Open(BuildTree(shape, {{DiskCatKey(7, u""), {0, 'z', 0, 'z'}},
+                                     {DiskCatKey(7, u"B"), {1, 2}},
+                                     {DiskCatKey(7, u"C"), {3, 4}}}));
+        EXPECT_EQ(bench->FindRecord(HostCatKey(7, u"A"), 7, nullptr, 0, nullptr, nullptr),
+                  kErrNotFound);
+        EXPECT_EQ(bench->findData.path[1].index, 1);
+        bench->findData.ClearPath();
+    }
+}
+
 }  // namespace
 }  // namespace VELK::test
