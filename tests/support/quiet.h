@@ -1,5 +1,5 @@
-// An engine that says nothing, its heap counted: for runs that are repeated so often that nobody
-// would read what they say. At the end nothing may be left on the heap.
+// An engine that says nothing, for runs that are repeated so often that nobody would read what they
+// say.
 #pragma once
 
 #include "heap_guard.h"
@@ -7,12 +7,12 @@
 
 namespace VELK::test {
 
-class Quiet {
+class Silence {
 public:
-    Quiet() : before_(SetHostSinks(&kSilent)) {}
-    ~Quiet() { SetHostSinks(before_); }
-    Quiet(const Quiet&) = delete;
-    Quiet& operator=(const Quiet&) = delete;
+    Silence() : before_(SetHostSinks(&kSilent)) {}
+    ~Silence() { SetHostSinks(before_); }
+    Silence(const Silence&) = delete;
+    Silence& operator=(const Silence&) = delete;
 
 private:
     static void NoText(void*, const char*) {}
@@ -22,6 +22,12 @@ private:
 
     static constexpr HostSinks kSilent = {NoError, NoText, NoLog, NoDump, nullptr};
     const HostSinks* before_;
+};
+
+// With its heap counted: at the end nothing may be left on it.
+class Quiet {
+private:
+    Silence silence_;
     HeapGuard heap_;
 };
 
