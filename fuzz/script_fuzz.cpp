@@ -3,6 +3,7 @@
 // their check accepts; and the same text gives the same answer again.
 //
 // Input: which tree, whether faults may be injected; then the text.
+#include <algorithm>
 #include <cstring>
 #include <string>
 
@@ -147,6 +148,6 @@ extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::
     }
     const u32 at = 1 + mutator.Below(static_cast<u32>(size));
     std::memmove(data + at + word.size(), data + at, size - at);
-    std::memcpy(data + at, word.data(), word.size());
+    std::copy(word.begin(), word.end(), data + at);
     return size + word.size();
 }
