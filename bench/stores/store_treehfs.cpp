@@ -109,23 +109,23 @@ public:
         }
     }
     bool Insert(u32 i, const u8* data, u32 size, bool) override {
-        return tree_.InsertRecord(load_.Host(i), load_.parent[i], data, size) == kOk;
+        return tree_.InsertRecord(load_.Host(i), Parent(i), data, size) == kOk;
     }
     int Lookup(u32 i, u8* out) override {
         unsigned size = 0;
-        return tree_.FindRecord(load_.Host(i), load_.parent[i], out, kLargestData, &size, &path_) ==
+        return tree_.FindRecord(load_.Host(i), Parent(i), out, kLargestData, &size, &path_) ==
                        kOk
                    ? static_cast<int>(size)
                    : -1;
     }
     bool Update(u32 i, const u8* data, u32) override {
         bool found = false;
-        return tree_.FindEntry(Key(i), load_.parent[i], nullptr, &found, nullptr, nullptr, nullptr,
+        return tree_.FindEntry(Key(i), Parent(i), nullptr, &found, nullptr, nullptr, nullptr,
                                nullptr) == kOk &&
                found && tree_.UpdateKeyAndRecord(nullptr, data) == kOk;
     }
     bool Delete(u32 i) override {
-        return tree_.DeleteRecord(load_.Host(i), load_.parent[i], false) == kOk;
+        return tree_.DeleteRecord(load_.Host(i), Parent(i), false) == kOk;
     }
     u32 Scan(u64* sum) override { return Walk(0, sum, false); }
     u32 List(u32 parent, u64* sum) override { return Walk(parent, sum, true); }
@@ -141,6 +141,12 @@ public:
     }
 
 private:
+    // As the key has it: who asks has its key at hand.
+    u32 Parent(u32 i) const {
+        u32 parent;
+        std::memcpy(&parent, load_.Host(i) + kCatKeyParentId, sizeof parent);
+        return parent;
+    }
     const BTreeKey* Key(u32 i) const { return reinterpret_cast<const BTreeKey*>(load_.Host(i)); }
 
     // From the first key of `parent` on; keys are delivered because a listing needs them.

@@ -67,16 +67,19 @@ struct NodePtr {
 
 struct HfsNode;
 
-// Shortcuts from an index node to cached children: each child, and where its first block lies. They
-// stand beside the red-black tree of cached nodes, never instead of it. One line of a processor's
-// cache.
-struct HfsHintSet {
-    // Children that one set leads to.
-    static constexpr u32 kPlaces = 3;
-    u32 nodeNum[kPlaces];     // the children's numbers
-    u32 next;                 // place to give up when one more child comes
-    HfsNode* node[kPlaces];   // not counted; null: the place is free
-    const u8* data[kPlaces];  // the children's first blocks
+// What an index node remembers of one of its records: the order of its key, and the cached child it
+// leads to. It stands beside the red-black tree of cached nodes, never instead of it.
+struct HfsHint {
+    u64 order;       // parent and first two units of the key as one number; 0: not known
+    HfsNode* child;  // not counted; null: not known to be cached
+    const u8* data;  // the child's first block
+};
+
+// The hints of an index node, by record. Allocated with room for as many records as the tree's node
+// size allows.
+struct HfsHintTable {
+    u32 used;  // hints from here on are empty
+    HfsHint hints[1];
 };
 
 // A cached node. Its bytes are the blocks of `bufs` one after the other; they are not contiguous in
@@ -85,9 +88,10 @@ struct HfsNode {
     rb_node link;            // by nodeNum; first member
     list_head modifiedLink;  // linked to itself when no block is dirty
     HfsNode* hintedBy;       // the one node whose hints lead to this one; null: none
-    HfsHintSet* hints;       // of an index node, in the node's own heap block; null: none
+    HfsHintTable* hints;     // of an index node, in the node's own heap block; null: none
     u32 nodeNum;             // its place in the file: byte nodeNum << nodeShift
     s32 refCount;            // references held; 0: cached all the same, -1: discarded
+    u32 hintedAt;            // record of that hint, unless records came or left before it since
     HfsBcbBuf bufs[1];       // the blocks, in order; blocksPerNode of them
 
     // Accessors (node_access.cpp). They change nothing and return 0 or kErrCorrupt, reported with
@@ -156,13 +160,14 @@ struct HfsConvert {
 
 // A key with its data on the way into a node.
 struct InsertKey {
-    HfsConvert* convert;     // null: key and data are in disk form (all separators)
-    const BTreeKey* key;     // the caller's, in the form `convert` takes
-    u32 keyLength;           // recorded in the stored key's length field
-    const void* data;        // the caller's; a child's number, big-endian, for index records
-    u32 dataSize;            // bytes; 4 for index records
-    bool replacesSeparator;  // new separator of a child whose first key changed
-    bool secondKeyFollows;   // a second key goes into the same node right after this one
+    HfsConvert* convert;       // null: key and data are in disk form (all separators)
+    const BTreeKey* key;       // the caller's, in the form `convert` takes
+    u32 keyLength;             // recorded in the stored key's length field
+    const void* data;          // the caller's; a child's number, big-endian, for index records
+    u32 dataSize;              // bytes; 4 for index records
+    bool replacesSeparator;    // new separator of a child whose first key changed
+    bool secondKeyFollows;     // a second key goes into the same node right after this one
+    HfsNode* child = nullptr;  // the cached child of an index record, if it is at hand
 };
 
 // A reservation of nodes (space_reserve.cpp).

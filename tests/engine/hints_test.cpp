@@ -13,99 +13,214 @@
 namespace VELK::test {
 namespace {
 
-// ---- the separators by themselves
+// ---- the table by itself
 
-class SeparatorTable : public ::testing::Test {
+// A node with room for 16 records, and children to hint at; a model of both beside it.
+class HintTable : public ::testing::Test {
 protected:
     static constexpr u32 kRoom = 16;  // of a node of 512 bytes
 
-    SeparatorTable() : bench_(Blocks(512)), node_(NodeImage{}.Build(512), 512) {
-        bench_->nodeShift = 9;
-        EXPECT_EQ(SeparatorRoom(&bench_.tree.tree), kRoom);
-        memory_.resize(HintBytes(&bench_.tree.tree) / sizeof(HfsHintSet) + 2);
-        std::memset(static_cast<void*>(memory_.data()), 0, memory_.size() * sizeof(HfsHintSet));
-        node_->hints = memory_.data();
-    }
-    ~SeparatorTable() override { node_->hints = nullptr; }
+    struct Known {
+        u64 order = 0;
+        HfsNode* child = nullptr;
+        bool operator==(const Known&) const = default;
+    };
+    struct Parent {
+        explicit Parent(u32 number) : node(NodeImage{}.Build(512), 512, number) {
+            node->hints = reinterpret_cast<HfsHintTable*>(memory);
+        }
+        ~Parent() { node->hints = nullptr; }
+        LooseNode node;
+        alignas(HfsHintTable) u8 memory[offsetof(HfsHintTable, hints) + kRoom * sizeof(HfsHint)]{};
+        std::vector<Known> model = std::vector<Known>(kRoom);
+    };
 
-    Separators Table() { return {&bench_.tree.tree, node_.Get()}; }
-    // Record n leads to child 100 + n.
-    void LearnFirst(u32 count) {
-        Table().Forget();
-        model_.assign(kRoom, 0);
-        for (u32 n = 0; n < std::min(count, kRoom); ++n) {
-            Table().Learn(n, 1000 + n, 100 + n);
-            model_[n] = 100 + n;
+    HintTable() : bench_(Blocks(512)) {
+        bench_->nodeShift = 9;
+        EXPECT_EQ(HintRoom(&bench_.tree.tree), kRoom);
+        EXPECT_EQ(HintBytes(&bench_.tree.tree), sizeof parent_.memory);
+        for (u32 n = 0; n < kChildren; ++n) {
+            children_.push_back(std::make_unique<LooseNode>(NodeImage{}.Build(512), 512, 300 + n));
         }
     }
-    void ExpectModel() {
-        for (u32 n = 0; n < kRoom; ++n) {
-            ASSERT_EQ(Table().Child(n), model_[n]) << n;
-            if (model_[n] != 0) {
-                ASSERT_EQ(Table().Order(n), u64{900} + model_[n]) << n;
+    ~HintTable() override {
+        Table(parent_).Forget();
+        Table(other_).Forget();
+    }
+
+    Hints Table(const Parent& parent) { return {&bench_.tree.tree, parent.node.Get()}; }
+    HfsNode* Child(u32 n) { return children_[n]->Get(); }
+    // Record n has order 1000 + n and leads to child `from` + n; every third is not cached.
+    void Fill(Parent* parent, u32 count, u32 from = 0) {
+        Table(*parent).Forget();
+        parent->model.assign(kRoom, {});
+        for (u32 n = 0; n < std::min(count, kRoom); ++n) {
+            Table(*parent).LearnOrder(n, 1000 + n);
+            parent->model[n].order = 1000 + n;
+            if (n % 3 != 2) {
+                Table(*parent).SetChild(n, Child(from + n));
+                parent->model[n].child = Child(from + n);
             }
         }
-        ASSERT_EQ(Table().Child(kRoom), 0u);
-        ASSERT_EQ(Table().Child(kRoom + 5), 0u);
     }
-
+    void Expect(const Parent& parent) {
+        for (u32 n = 0; n < kRoom; ++n) {
+            const Known& known = parent.model[n];
+            ASSERT_EQ(Table(parent).Order(n), known.order) << n;
+            ASSERT_EQ(Table(parent).Child(n), known.child) << n;
+            if (known.child != nullptr) {
+                ASSERT_EQ(known.child->hintedBy, parent.node.Get()) << n;
+                ASSERT_EQ(Table(parent).IndexOf(known.child), n);
+                ASSERT_EQ(Table(parent).Data(n), known.child->bufs[0].data) << n;
+            }
+        }
+        ASSERT_EQ(Table(parent).Order(kRoom), 0u);
+        ASSERT_EQ(Table(parent).Child(kRoom + 5), nullptr);
+        for (const auto& child : children_) {
+            HfsNode* node = child->Get();
+            const bool isHinted = node->hintedBy == parent.node.Get();
+            ASSERT_EQ(Table(parent).IndexOf(node) < kRoom, isHinted);
+            ASSERT_EQ(std::any_of(parent.model.begin(), parent.model.end(),
+                                  [node](const Known& known) { return known.child == node; }),
+                      isHinted);
+        }
+    }
+    static constexpr u32 kChildren = 40;
     Bench bench_;
-    LooseNode node_;
-    std::vector<HfsHintSet> memory_;
-    std::vector<u32> model_;
+    std::vector<std::unique_ptr<LooseNode>> children_;
+    Parent parent_{100};
+    Parent other_{200};
 };
 
-TEST_F(SeparatorTable, ARecordComesInAtAnyPlace) {
-    for (u32 count = 0; count <= kRoom + 4; ++count) {
-        for (u32 index = 0; index <= count; ++index) {
-            LearnFirst(count);
-            Table().Insert(index, count);
-            if (index < kRoom) {
-                model_.insert(model_.begin() + index, 0);
-                model_.resize(kRoom);
+TEST_F(HintTable, RecordsComeInAtAnyPlace) {
+    for (const u32 count : {1u, 3u, kRoom + 4}) {
+        for (u32 filled = 0; filled <= kRoom; ++filled) {
+            for (u32 index = 0; index <= kRoom + 1; ++index) {
+                Fill(&parent_, filled);
+                Table(parent_).Insert(index, count);
+                std::vector<Known>& model = parent_.model;
+                if (index < kRoom) {
+                    model.insert(model.begin() + index, count, Known{});
+                    model.resize(kRoom);
+                }
+                Expect(parent_);
             }
-            ExpectModel();
         }
     }
 }
 
-TEST_F(SeparatorTable, ARecordLeavesAnyPlace) {
-    for (u32 count = 1; count <= kRoom + 4; ++count) {
-        for (u32 index = 0; index < count; ++index) {
-            LearnFirst(count);
-            Table().Remove(index, count);
-            if (index < kRoom) {
-                model_.erase(model_.begin() + index);
-                model_.push_back(0);
+TEST_F(HintTable, RecordsLeaveAnyPlace) {
+    for (const u32 count : {1u, 3u, kRoom + 4}) {
+        for (u32 filled = 0; filled <= kRoom; ++filled) {
+            for (u32 index = 0; index <= kRoom + 1; ++index) {
+                Fill(&parent_, filled);
+                Table(parent_).Remove(index, count);
+                std::vector<Known>& model = parent_.model;
+                if (index < kRoom) {
+                    model.erase(model.begin() + index,
+                                model.begin() + std::min(index + count, kRoom));
+                    model.resize(kRoom);
+                }
+                Expect(parent_);
             }
-            ExpectModel();
         }
     }
 }
 
-TEST_F(SeparatorTable, RecordsBeyondItsRoomAreNotLearnt) {
-    LearnFirst(kRoom);
-    Table().Learn(kRoom, 5, 5);
-    Table().Learn(kRoom + 1, 6, 6);
-    ExpectModel();
+TEST_F(HintTable, RecordsGoToAnotherNode) {
+    Fill(&parent_, 8);
+    Fill(&other_, 12, 20);
+    Table(other_).Insert(2, 3);
+    Table(other_).Take(2, Table(parent_), 4, 3);
+    Table(parent_).Remove(4, 3);
+    std::vector<Known>& from = parent_.model;
+    std::vector<Known>& to = other_.model;
+    to.insert(to.begin() + 2, from.begin() + 4, from.begin() + 7);
+    to.resize(kRoom);
+    from.erase(from.begin() + 4, from.begin() + 7);
+    from.resize(kRoom);
+    Expect(parent_);
+    Expect(other_);
 }
 
-TEST_F(SeparatorTable, WhatIsForgottenIsUnknown) {
-    LearnFirst(kRoom);
-    Table().Forget();
-    model_.assign(kRoom, 0);
-    ExpectModel();
+// What has no room any more is let go, and what nobody knew stays unknown.
+TEST_F(HintTable, RecordsGoWhereThereIsNoRoom) {
+    Fill(&parent_, 6);
+    Fill(&other_, kRoom, 20);
+    Table(other_).Take(kRoom, Table(parent_), 4, 4);
+    parent_.model[4].child = nullptr;
+    Expect(parent_);
+    Expect(other_);
+    EXPECT_EQ(Child(4)->hintedBy, nullptr);
 }
 
-TEST_F(SeparatorTable, ANodeWithoutRoomHasNothingToForget) {
-    LearnFirst(3);
-    node_->hints = nullptr;
-    ForgetSeparators(&bench_.tree.tree, node_.Get());
-    node_->hints = memory_.data();
-    ExpectModel();
-    ForgetSeparators(&bench_.tree.tree, node_.Get());
-    model_.assign(kRoom, 0);
-    ExpectModel();
+TEST_F(HintTable, RecordsBeyondItsRoomAreNotLearnt) {
+    Fill(&parent_, kRoom);
+    Table(parent_).LearnOrder(kRoom, 5);
+    Table(parent_).SetChild(kRoom, Child(30));
+    Expect(parent_);
+    EXPECT_EQ(Child(30)->hintedBy, nullptr);
+}
+
+TEST_F(HintTable, WhatIsForgottenIsUnknown) {
+    Fill(&parent_, kRoom);
+    Table(parent_).Forget();
+    parent_.model.assign(kRoom, {});
+    Expect(parent_);
+}
+
+TEST_F(HintTable, ANodeWithoutRoomHasNothingToForget) {
+    Fill(&parent_, 3);
+    HfsHintTable* table = parent_.node->hints;
+    parent_.node->hints = nullptr;
+    ForgetRecords(&bench_.tree.tree, parent_.node.Get());
+    parent_.node->hints = table;
+    Expect(parent_);
+    ForgetRecords(&bench_.tree.tree, parent_.node.Get());
+    parent_.model.assign(kRoom, {});
+    Expect(parent_);
+}
+
+TEST_F(HintTable, AChildHasOneHintOnly) {
+    Fill(&parent_, 6);
+    Fill(&other_, 6, 20);
+    Table(parent_).SetChild(5, Child(0));
+    parent_.model[5].child = Child(0);
+    parent_.model[0].child = nullptr;
+    Expect(parent_);
+    Table(other_).SetChild(1, Child(0));
+    parent_.model[5].child = nullptr;
+    other_.model[1].child = Child(0);
+    Expect(parent_);
+    Expect(other_);
+    EXPECT_EQ(Child(21)->hintedBy, nullptr);
+}
+
+TEST_F(HintTable, ANodeIsNotItsOwnChild) {
+    Table(parent_).SetChild(0, parent_.node.Get());
+    EXPECT_EQ(parent_.node->hintedBy, nullptr);
+    Expect(parent_);
+}
+
+TEST_F(HintTable, AChildThatLeavesTheCacheIsForgotten) {
+    Fill(&parent_, 6);
+    bench_->rootHint = Child(1);
+    ForgetHints(&bench_.tree.tree, Child(1));
+    EXPECT_EQ(bench_->rootHint, nullptr);
+    parent_.model[1].child = nullptr;
+    Expect(parent_);
+    ForgetHints(&bench_.tree.tree, Child(1));
+    Expect(parent_);
+}
+
+TEST_F(HintTable, AParentThatGoesLetsItsChildrenGo) {
+    Fill(&parent_, 6);
+    bench_->rootHint = Child(1);
+    ForgetHints(&bench_.tree.tree, parent_.node.Get());
+    EXPECT_EQ(bench_->rootHint, Child(1));
+    bench_->rootHint = nullptr;
+    parent_.model.assign(kRoom, {});
+    Expect(parent_);
 }
 
 // ---- what lookups let the root remember
@@ -130,7 +245,7 @@ protected:
         return bench_->FindRecord(HostCatKey(7, name), 7, nullptr, 0, nullptr, nullptr);
     }
     HfsNode* Root() { return bench_->findData.path[2].node; }
-    Separators Remembered() { return {&bench_.tree.tree, Root()}; }
+    Hints Remembered() { return {&bench_.tree.tree, Root()}; }
 
     Bench bench_;
 };
@@ -146,11 +261,7 @@ TEST_P(RootRemembers, TheOrderOfEachKeyThatHasOne) {
     }
     const u64 orders[] = {0x700000000, 0, 0, 0x700630000, 0x700630064, 0, 0x700E60000, 0x74E00007A};
     for (u32 n = 0; n < names.size(); ++n) {
-        const bool hasOrder = orders[n] != 0;
-        EXPECT_EQ(Remembered().Child(n), hasOrder ? n + 1 : 0) << n;
-        if (hasOrder) {
-            EXPECT_EQ(Remembered().Order(n), orders[n]) << n;
-        }
+        EXPECT_EQ(Remembered().Order(n), orders[n]) << n;
     }
     EXPECT_EQ(bench_.capture.Take(), Events{});
 }
@@ -182,7 +293,7 @@ TEST_P(RootRemembers, ARecordExchangedUnannouncedIsSearchedAgain) {
     for (const char16_t* name : {u"B", u"C", u"D", u"E"}) {
         ASSERT_EQ(Find(name), kOk);
     }
-    ASSERT_EQ(Remembered().Child(1), 2u);
+    ASSERT_EQ(Remembered().Child(1)->nodeNum, 2u);
     NodeKey second;
     ASSERT_EQ(Root()->GetKey(&bench_->header, 1, &second), kOk);
     second.ptr[kCatKeyName + 1] = u'c' + 1;  // D, as the record behind it
@@ -193,21 +304,43 @@ TEST_P(RootRemembers, ARecordExchangedUnannouncedIsSearchedAgain) {
     EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
-// A child of no number, of no child's size, or none of an index node: the record is not learnt.
-TEST_P(RootRemembers, NothingOfARecordThatLeadsNowhere) {
+// A child of no number: no hint leads there.
+TEST_P(RootRemembers, NoChildOfARecordThatLeadsNowhere) {
     Open({u"B", u"C", u"D", u"E"}, 1);
     ASSERT_EQ(Find(u"E"), kOk);
-    ASSERT_EQ(Remembered().Child(1), 2u);
-    ForgetSeparators(&bench_.tree.tree, Root());
+    ForgetRecords(&bench_.tree.tree, Root());
     NodeKey second;
     ASSERT_EQ(Root()->GetKey(&bench_->header, 1, &second), kOk);
     PutBe32(second.data, 0);
     EXPECT_EQ(Find(u"E"), kOk);
-    EXPECT_EQ(Remembered().Child(1), 0u);
-    EXPECT_EQ(Remembered().Child(2), 3u);
+    EXPECT_NE(Find(u"C"), kOk);
+    ASSERT_NE(bench_->findData.path[2].node, nullptr);
+    EXPECT_EQ(Remembered().Child(1), nullptr);
+    EXPECT_NE(Remembered().Child(3), nullptr);
     PutBe32(second.data, 2);
-    EXPECT_EQ(Find(u"E"), kOk);
-    EXPECT_EQ(Remembered().Child(1), 2u);
+    EXPECT_EQ(Find(u"C"), kOk);
+    EXPECT_EQ(Remembered().Child(1)->nodeNum, 2u);
+    EXPECT_NE(bench_.capture.Take(), Events{});
+}
+
+// Somebody who announces a change finds it searched, whatever was known before.
+TEST_P(RootRemembers, NothingOfARecordAnnouncedAsChanged) {
+    Open({u"B", u"C", u"D", u"E"}, 1);
+    for (const char16_t* name : {u"B", u"C", u"D", u"E"}) {
+        ASSERT_EQ(Find(name), kOk);
+    }
+    ASSERT_EQ(bench_->SetDirty(Root(), 0), kOk);
+    for (u32 n = 0; n < 4; ++n) {
+        EXPECT_EQ(Remembered().Order(n), 0u);
+        EXPECT_EQ(Remembered().Child(n), nullptr);
+    }
+    NodeKey second;
+    ASSERT_EQ(Root()->GetKey(&bench_->header, 1, &second), kOk);
+    second.ptr[kCatKeyName + 1] = u'b';
+    EXPECT_EQ(Find(u"BA"), kErrNotFound);
+    EXPECT_EQ(bench_->findData.path[2].index, 1);
+    second.ptr[kCatKeyName + 1] = u'c';
+    bench_->RestoreModifiedNodes();
 }
 
 // More records than have room: those behind are found as they lie.
@@ -224,7 +357,8 @@ TEST_P(RootRemembers, OnlyTheFirstOfManyRecords) {
         }
         const u32 room = GetParam() / 32;
         for (u32 n = 0; n < 24; ++n) {
-            EXPECT_EQ(Remembered().Child(n), n < room ? n + 1 : 0) << n;
+            EXPECT_EQ(Remembered().Order(n) != 0, n < room) << n;
+            EXPECT_EQ(Remembered().Child(n) != nullptr, n < room) << n;
         }
     }
     EXPECT_EQ(bench_.capture.Take(), Events{});
@@ -236,32 +370,44 @@ TEST_P(RootRemembers, WhereItsCachedChildrenLie) {
     Open({u"B", u"C", u"D", u"E"}, 1);
     ASSERT_EQ(Find(u"C"), kOk);
     const HfsNode* leaf = bench_->findData.path[1].node;
-    const HintPlace hint = FindHint(&bench_.tree.tree, Root(), 2);
-    ASSERT_TRUE(hint);
-    EXPECT_EQ(hint.Node(), leaf);
-    EXPECT_EQ(hint.Data(), leaf->bufs[0].data);
+    EXPECT_EQ(Remembered().Child(1), leaf);
     EXPECT_EQ(leaf->hintedBy, Root());
-    EXPECT_FALSE(FindHint(&bench_.tree.tree, Root(), 1));
-    EXPECT_FALSE(FindHint(&bench_.tree.tree, leaf, 2));
-    EXPECT_FALSE(FindHint(&bench_.tree.tree, nullptr, 2));
+    EXPECT_EQ(Remembered().Child(0), nullptr);
     EXPECT_EQ(bench_->rootHint, Root());
 }
 
 TEST_P(RootRemembers, NoChildThatLeftTheCache) {
     Open({u"B", u"C", u"D", u"E"}, 1);
     ASSERT_EQ(Find(u"C"), kOk);
-    HfsNode* root = Root();
     HfsNode* leaf = bench_->findData.path[1].node;
     ASSERT_EQ(Find(u"D"), kOk);
     bench_->PutINode(leaf, false);
-    EXPECT_FALSE(FindHint(&bench_.tree.tree, root, 2));
-    EXPECT_TRUE(FindHint(&bench_.tree.tree, root, 3));
+    EXPECT_EQ(Remembered().Child(1), nullptr);
+    EXPECT_NE(Remembered().Child(2), nullptr);
     EXPECT_EQ(Find(u"C"), kOk);
-    EXPECT_TRUE(FindHint(&bench_.tree.tree, root, 2));
+    EXPECT_EQ(Remembered().Child(1), bench_->findData.path[1].node);
+}
+
+// A walk along the leaves tells the parent of each that it meets, and only of its own.
+TEST_P(RootRemembers, NeighboursMetOnAWalk) {
+    Open({u"B", u"C", u"D", u"E"}, 1);
+    ASSERT_EQ(Find(u"B"), kOk);
+    HfsNode* root = Root();
+    const Hints hints(&bench_.tree.tree, root);
+    u8 data[8];
+    unsigned size = 0;
+    for (u32 n = 1; n < 4; ++n) {
+        ASSERT_EQ(bench_->IncPos(1, data, sizeof data, &size, nullptr, 0, nullptr, nullptr), kOk);
+        const HfsNode* leaf = bench_->findData.path[1].node;
+        EXPECT_EQ(hints.Child(n), leaf);
+        EXPECT_EQ(leaf->hintedBy, root);
+        EXPECT_EQ(hints.Child(n - 1), nullptr);  // the clean leaf left the cache
+    }
+    EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
 // Three levels: leaves 1 .. 9, index nodes 10 .. 12 of four, four and one of them, root 13. A leaf
-// met beside another gets the parent of that one, unless a parent leads to it already.
+// met beside another is hinted at by the parent of that one when it is its child as well.
 class BesideRemembers : public ::testing::Test {
 protected:
     BesideRemembers() : bench_(Blocks(512)) { bench_.Open(SmallTree(512, 9)); }
@@ -283,6 +429,9 @@ protected:
     u32 ParentOf(const HfsNode* leaf) {
         return leaf->hintedBy != nullptr ? leaf->hintedBy->nodeNum : 0;
     }
+    HfsNode* Hinted(u32 parent, u32 index) {
+        return Hints(&bench_.tree.tree, CachedNode(*bench_.tree, parent)).Child(index);
+    }
     // A leaf stays cached as long as it is modified.
     void Keep(HfsNode* leaf) { ASSERT_EQ(bench_->SetDirty(leaf, 0), kOk); }
 
@@ -290,11 +439,25 @@ protected:
 };
 
 TEST_F(BesideRemembers, TheParentItCameFrom) {
-    EXPECT_EQ(ParentOf(Find(6)), 10u);
-    const HfsNode* next = Step(2);
-    EXPECT_EQ(next->nodeNum, 5u);
+    EXPECT_EQ(ParentOf(Find(4)), 10u);
+    HfsNode* next = Step(2);
+    EXPECT_EQ(next->nodeNum, 4u);
     EXPECT_EQ(ParentOf(next), 10u);
-    EXPECT_TRUE(FindHint(&bench_.tree.tree, CachedNode(*bench_.tree, 10), 5));
+    EXPECT_EQ(Hinted(10, 3), next);
+    next = Step(-1);
+    EXPECT_EQ(next->nodeNum, 3u);
+    EXPECT_EQ(Hinted(10, 2), next);
+}
+
+TEST_F(BesideRemembers, NotTheParentOfAnotherFamily) {
+    EXPECT_EQ(ParentOf(Find(6)), 10u);
+    HfsNode* next = Step(2);
+    EXPECT_EQ(next->nodeNum, 5u);
+    EXPECT_EQ(ParentOf(next), 0u);
+    EXPECT_EQ(Hinted(10, 4), nullptr);
+    next = Step(-1);
+    EXPECT_EQ(next->nodeNum, 4u);
+    EXPECT_EQ(ParentOf(next), 0u);
 }
 
 TEST_F(BesideRemembers, TheParentThatLeadsThere) {
@@ -305,107 +468,8 @@ TEST_F(BesideRemembers, TheParentThatLeadsThere) {
     EXPECT_EQ(ParentOf(leaf), 10u);
     EXPECT_EQ(Step(2), next);
     EXPECT_EQ(ParentOf(next), 11u);
+    EXPECT_EQ(Hinted(11, 0), next);
     bench_->modifiedList.prev->Unlink();
-}
-
-// ---- places of children
-
-// A parent with four sets of three places each; a child belongs into the set of its number and
-// into the one beside, 0 with 1 and 2 with 3.
-class ChildPlaces : public ::testing::Test {
-protected:
-    ChildPlaces() : bench_(Blocks(512)), parent_(NodeImage{}.Build(512), 512, 100) {
-        bench_->nodeShift = 9;
-        EXPECT_EQ(HintSetCount(&bench_.tree.tree), 4u);
-        memory_.resize(HintBytes(&bench_.tree.tree) / sizeof(HfsHintSet) + 1);
-        std::memset(static_cast<void*>(memory_.data()), 0, memory_.size() * sizeof(HfsHintSet));
-        parent_->hints = memory_.data();
-    }
-    ~ChildPlaces() override { parent_->hints = nullptr; }
-
-    HfsNode* Hint(u32 number) {
-        children_.push_back(std::make_unique<LooseNode>(NodeImage{}.Build(512), 512, number));
-        SetHint(&bench_.tree.tree, parent_.Get(), children_.back()->Get());
-        EXPECT_EQ(children_.back()->Get()->hintedBy, parent_.Get());
-        return children_.back()->Get();
-    }
-    // Set and place of the hint at a child, as 10 x set + place; 99: there is none.
-    u32 PlaceOf(u32 number) {
-        const HintPlace hint = FindHint(&bench_.tree.tree, parent_.Get(), number);
-        return hint ? 10 * static_cast<u32>(hint.set - memory_.data()) + hint.place : 99;
-    }
-
-    Bench bench_;
-    LooseNode parent_;
-    std::vector<HfsHintSet> memory_;
-    std::vector<std::unique_ptr<LooseNode>> children_;
-};
-
-TEST_F(ChildPlaces, OwnSetThenTheOneBeside) {
-    std::vector<u32> places;
-    for (const u32 number : {5u, 9u, 13u, 17u, 21u, 25u, 6u, 7u}) {
-        const HfsNode* child = Hint(number);
-        places.push_back(PlaceOf(number));
-        EXPECT_EQ(FindHint(&bench_.tree.tree, parent_.Get(), number).Node(), child);
-        EXPECT_EQ(FindHint(&bench_.tree.tree, parent_.Get(), number).Data(), child->bufs[0].data);
-    }
-    EXPECT_EQ(places, (std::vector<u32>{10, 11, 12, 0, 1, 2, 20, 30}));
-    EXPECT_EQ(PlaceOf(29), 99u);
-}
-
-TEST_F(ChildPlaces, OneTooManyTakesThePlaceOfAnotherInTurn) {
-    std::vector<HfsNode*> children;
-    for (u32 n = 0; n < 11; ++n) {
-        children.push_back(Hint(4 + 4 * n));
-    }
-    const std::vector<u32> places = {99, 99, 99, 10, 11, 12, 99, 99, 2, 0, 1};
-    for (u32 n = 0; n < 11; ++n) {
-        EXPECT_EQ(PlaceOf(4 + 4 * n), places[n]) << n;
-        EXPECT_EQ(children[n]->hintedBy, places[n] == 99 ? nullptr : parent_.Get()) << n;
-    }
-}
-
-TEST_F(ChildPlaces, AChildHasOnePlaceOnly) {
-    HfsNode* child = Hint(5);
-    Hint(9);
-    SetHint(&bench_.tree.tree, parent_.Get(), child);
-    EXPECT_EQ(PlaceOf(5), 10u);
-    EXPECT_EQ(PlaceOf(9), 11u);
-    EXPECT_EQ(memory_[1].node[2], nullptr);
-}
-
-TEST_F(ChildPlaces, ANodeIsNotItsOwnChild) {
-    SetHint(&bench_.tree.tree, parent_.Get(), parent_.Get());
-    EXPECT_EQ(PlaceOf(100), 99u);
-    EXPECT_EQ(parent_->hintedBy, nullptr);
-}
-
-TEST_F(ChildPlaces, AForgottenPlaceIsFreeAgain) {
-    HfsNode* first = Hint(5);
-    Hint(9);
-    bench_->rootHint = first;
-    ForgetHints(&bench_.tree.tree, first);
-    EXPECT_EQ(first->hintedBy, nullptr);
-    EXPECT_EQ(bench_->rootHint, nullptr);
-    EXPECT_EQ(PlaceOf(5), 99u);
-    Hint(13);
-    EXPECT_EQ(PlaceOf(13), 10u);
-    EXPECT_EQ(PlaceOf(9), 11u);
-}
-
-TEST_F(ChildPlaces, AParentThatGoesLetsItsChildrenGo) {
-    std::vector<HfsNode*> children;
-    for (const u32 number : {5u, 9u, 6u, 7u}) {
-        children.push_back(Hint(number));
-    }
-    HfsNode* other = children_[0]->Get();
-    bench_->rootHint = other;
-    ForgetHints(&bench_.tree.tree, parent_.Get());
-    for (const HfsNode* child : children) {
-        EXPECT_EQ(child->hintedBy, nullptr);
-    }
-    EXPECT_EQ(bench_->rootHint, other);
-    bench_->rootHint = nullptr;
 }
 
 INSTANTIATE_TEST_SUITE_P(Roots, RootRemembers, ::testing::Values(512u, 1024u));

@@ -39,6 +39,34 @@ Place FindPlace(CBTreeHfs* tree, u32 nodeNum) {
     return place;
 }
 
+// The node before a linked one, by number; null: there is none.
+rb_node* NodeBefore(rb_node* node) {
+    if (node->left != nullptr) {
+        node = node->left;
+        while (node->right != nullptr) {
+            node = node->right;
+        }
+        return node;
+    }
+    rb_node* parent = node->Parent();
+    while (parent != nullptr && node == parent->left) {
+        node = parent;
+        parent = node->Parent();
+    }
+    return parent;
+}
+
+// What FindPlace would find for a number right behind `before` (null: in front of all).
+Place PlaceBehind(CBTreeHfs* tree, rb_node* before) {
+    Place place = {before, before != nullptr ? &before->right : &tree->nodeRoot, tree->nodeCount,
+                   tree->readCount};
+    while (*place.link != nullptr) {
+        place.parent = *place.link;
+        place.link = &place.parent->left;
+    }
+    return place;
+}
+
 void LinkAt(CBTreeHfs* tree, const Place& place, HfsNode* node) {
     node->link.Link(place.parent, place.link);
     node->link.insert_color(&tree->nodeRoot);
@@ -54,15 +82,11 @@ bool HasWholeBlocks(const BTHeaderMem& header) {
     return static_cast<u64>(header.blocksPerNode) << header.blockShift == header.nodeSize;
 }
 
-std::size_t RoundUp(std::size_t size, std::size_t unit) {
-    return (size + unit - 1) / unit * unit;
-}
-
 HfsNode* NewNode(const CBTreeHfs* tree, u32 nodeNum, bool withHints) {
     std::size_t ownSize = offsetof(HfsNode, bufs) + tree->header.blocksPerNode * sizeof(HfsBcbBuf);
     std::size_t hintSize = 0;
     if (withHints) {
-        ownSize = RoundUp(ownSize, sizeof(HfsHintSet));  // where the block begins with a line
+        ownSize = HintsOffset(tree);
         hintSize = HintBytes(tree);
     }
     HfsNode* node = static_cast<HfsNode*>(velk_heap_alloc(ownSize + hintSize));
@@ -74,7 +98,7 @@ HfsNode* NewNode(const CBTreeHfs* tree, u32 nodeNum, bool withHints) {
     node->modifiedLink.Init();
     node->link.MarkUnlinked();
     if (withHints) {
-        node->hints = reinterpret_cast<HfsHintSet*>(reinterpret_cast<u8*>(node) + ownSize);
+        node->hints = reinterpret_cast<HfsHintTable*>(reinterpret_cast<u8*>(node) + ownSize);
     }
     return node;
 }
@@ -148,7 +172,7 @@ u32 FirstNonZeroWord(const u8* data, u32 blockSize) {
 void EmptyExisting(CBTreeHfs* tree, HfsNode* node) {
     const BTHeaderMem& header = tree->header;
     tree->pathVersion += 1;
-    ForgetSeparators(tree, node);
+    ForgetRecords(tree, node);
     bool madeDirty = false;
     bool granted = true;
     for (u32 i = 0; i < header.blocksPerNode; ++i) {
@@ -247,6 +271,17 @@ bool LinkNode(CBTreeHfs* tree, HfsNode* node) {
     return true;
 }
 
+bool RelinkNode(CBTreeHfs* tree, HfsNode* node) {
+    if (!node->link.IsLinked()) {
+        return LinkNode(tree, node);
+    }
+    rb_node* before = NodeBefore(&node->link);
+    node->link.remove(&tree->nodeRoot);
+    tree->nodeCount -= 1;
+    LinkAt(tree, PlaceBehind(tree, before), node);
+    return true;
+}
+
 void DiscardNode(CBTreeHfs* tree, HfsNode* node) {
     if (node->link.IsLinked()) {
         tree->nodeCount -= 1;
@@ -301,96 +336,11 @@ int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
     return kOk;
 }
 
-// A request met by a hint. What will be needed is asked for all at once, as each may be cold: the
-// node's block entries, its descriptor, and its offset table, which is long in an index node.
-void TakeHinted(CBTreeHfs* tree, HfsNode* node, const u8* data, NodeUse use, HfsNode** out) {
-    const u8* end = data + tree->header.blockSize;
-    __builtin_prefetch(&node->bufs[0]);
-    __builtin_prefetch(data);
-    __builtin_prefetch(end - 64);
-    if (use == NodeUse::kReadIndex) {
-        __builtin_prefetch(end - 128);
-        __builtin_prefetch(end - 192);
-    }
-    TakeCached(tree, node, out);
-}
-
-int FetchRoot(CBTreeHfs* tree, NodeUse use, HfsNode** out) {
-    HfsNode* root = tree->rootHint;
-    if (root != nullptr && root->nodeNum == tree->header.rootNode) {
-        TakeCached(tree, root, out);
-        return kOk;
-    }
-    const int status = FetchNode(tree, tree->header.rootNode, use, out);
-    if (status == kOk) {
-        tree->rootHint = *out;
-    }
-    return status;
-}
-
-int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNode** out) {
-    const HintPlace hint = FindHint(tree, parent, nodeNum);
-    if (hint) {
-        TakeHinted(tree, hint.Node(), hint.Data(), use, out);
-        return kOk;
-    }
-    const int status = FetchNode(tree, nodeNum, use, out);
-    if (status == kOk && parent->hints != nullptr) {
-        SetHint(tree, parent, *out);
-    }
-    return status;
-}
-
-namespace {
-
-u32 LinkOn(const HfsNode* node, Side side) {
-    return side == Side::kRight ? FLink(node) : BLink(node);
-}
-
-}  // namespace
-
-void Introduce(CBTreeHfs* tree, const HfsNode* node, HfsNode* fresh) {
-    if (node->hintedBy != nullptr) {
-        SetHint(tree, node->hintedBy, fresh);
-    }
-}
-
-int FetchBeside(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, HfsNode** out) {
-    const HintPlace hint = FindHint(tree, parent, nodeNum);
-    if (hint) {
-        TakeHinted(tree, hint.Node(), hint.Data(), NodeUse::kRead, out);
-        return kOk;
-    }
-    const int status = FetchNode(tree, nodeNum, NodeUse::kRead, out);
-    if (status == kOk && parent != nullptr && (*out)->hintedBy == nullptr) {
-        SetHint(tree, parent, *out);
-    }
-    return status;
-}
-
-int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out) {
-    return FetchBeside(tree, node->hintedBy, LinkOn(node, side), out);
-}
-
-void PrefetchSibling(const CBTreeHfs* tree, const HfsNode* node, Side side) {
-    // What the node's own removal from the tree of cached nodes will meet first.
-    __builtin_prefetch(node->link.Parent());
-    __builtin_prefetch(node->link.left);
-    __builtin_prefetch(node->link.right);
-    const HintPlace hint = FindHint(tree, node->hintedBy, LinkOn(node, side));
-    if (hint) {
-        __builtin_prefetch(hint.Node());
-        __builtin_prefetch(&hint.Node()->bufs[0]);
-        __builtin_prefetch(hint.Data());
-        __builtin_prefetch(hint.Data() + tree->header.blockSize - 64);
-    }
-}
-
 int CBTreeHfs::GetINode(unsigned nodeNum, HfsNode** out, bool makeEmpty) {
     const int status = FetchNode(this, nodeNum, makeEmpty ? NodeUse::kEmpty : NodeUse::kRead, out);
     if (status == kOk) {
         isAllOwn = false;  // who asks for a node by its number may write into it
-        ForgetSeparators(this, *out);
+        ForgetRecords(this, *out);
     }
     return status;
 }

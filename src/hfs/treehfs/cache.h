@@ -41,27 +41,12 @@ enum class NodeUse {
 };
 int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out);
 
-// GetINode of the root, and of a child of `parent`, by a hint when there is one.
-int FetchRoot(CBTreeHfs* tree, NodeUse use, HfsNode** out);
-int FetchChild(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, NodeUse use, HfsNode** out);
-
-// Neighbours in the chain of a level.
-enum class Side { kLeft, kRight };
-
-// The parent that leads to `node` by a hint leads to its neighbours as well, as far as it can: that
-// is only a way round the search by number, and a hint at a child of another node does no harm.
-
-// Lets the parent of `node` know the new neighbour `fresh`.
-void Introduce(CBTreeHfs* tree, const HfsNode* node, HfsNode* fresh);
-// GetINode of a neighbour of a child of `parent` (null: nobody), which may have another parent.
-int FetchBeside(CBTreeHfs* tree, HfsNode* parent, u32 nodeNum, HfsNode** out);
-// GetINode of the node that `node` links to on one side. REQUIRES: there is such a link.
-int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out);
-// Asks for the memory of the neighbour of `node`, if a hint leads there.
-void PrefetchSibling(const CBTreeHfs* tree, const HfsNode* node, Side side);
-
 // Links `node` into the tree of cached nodes by its number. False: the number is there already.
 bool LinkNode(CBTreeHfs* tree, HfsNode* node);
+// Takes `node` out of the tree of cached nodes and puts it back under its number, which decides in
+// what order a volume gets blocks back in the end. False: another node stands there and this one
+// stays out.
+bool RelinkNode(CBTreeHfs* tree, HfsNode* node);
 
 // Takes a node whose references are gone out of the cache: count, tree, modified list, blocks,
 // heap. Unsaved changes are lost.

@@ -98,7 +98,7 @@ int MarkBytes(CBTreeHfs* tree, HfsNode* node, u32 offset, u32 length) {
 // Somebody else is about to write into the node.
 int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset, unsigned length) {
     isAllOwn = false;
-    ForgetSeparators(this, node);
+    ForgetRecords(this, node);
     return MarkDirty(this, node, offset, length);
 }
 
@@ -109,7 +109,7 @@ int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset) {
 int CBTreeHfs::Zero(HfsNode* node) {
     pathVersion += 1;
     NoteChange(this);
-    ForgetSeparators(this, node);
+    ForgetRecords(this, node);
     for (u32 i = 0; i < header.blocksPerNode; ++i) {
         const int status = MarkBlock(this, &node->bufs[i]);
         if (status != kOk) {

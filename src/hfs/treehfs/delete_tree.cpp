@@ -10,20 +10,11 @@
 #include "hfs/treehfs/path_level.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/separator.h"
+#include "hfs/treehfs/way.h"
 
 namespace VELK {
 
 namespace {
-
-// Takes a node out of the tree of cached nodes and puts it back under its number. False: another
-// node stands there and this one stays out.
-bool Rekey(CBTreeHfs* tree, HfsNode* node) {
-    if (node->link.IsLinked()) {
-        node->link.remove(&tree->nodeRoot);
-        tree->nodeCount -= 1;
-    }
-    return LinkNode(tree, node);
-}
 
 bool IsSiblingOf(const HfsNode* sibling, const HfsNode* node) {
     return sibling != node && Height(sibling) == Height(node) && Kind(sibling) == Kind(node);
@@ -73,10 +64,10 @@ int ReplaceParentKey(CBTreeHfs* tree, HfsFindData* path, HfsNode* node, int leve
     const BTreeKey* key = nullptr;
     HFS_TRY(FirstKey(tree, node, &key), 4970);
     Separator replacement;
-    replacement.Fill(&tree->header, key, node->nodeNum);
+    replacement.Fill(&tree->header, key, node);
     replacement.entry.replacesSeparator = true;
     HFS_TRY(tree->InsertLevel(path, &replacement.entry, nullptr, parent, index, level + 1), 4981);
-    const bool linked = Rekey(tree, node);
+    const bool linked = RelinkNode(tree, node);
     HFS_ASSERT(linked, 4988);
     return kOk;
 }
@@ -85,7 +76,7 @@ int ReplaceParentKey(CBTreeHfs* tree, HfsFindData* path, HfsNode* node, int leve
 // that the tree is never left without a root. The path takes the child in the old root's place.
 int CollapseOnce(CBTreeHfs* tree, HfsNode* root, HfsFindLevel* entry) {
     BTHeaderMem* hdr = &tree->header;
-    const bool linked = Rekey(tree, root);
+    const bool linked = RelinkNode(tree, root);
     HFS_ASSERT(linked, 4918);
     unsigned childNum = 0;
     HFS_TRY(root->GetChildNodeNum(hdr, 0, &childNum), 4922);

@@ -7,129 +7,119 @@ namespace VELK {
 
 namespace {
 
-// A child has its places in one set and in the one beside it, which takes what the first has no
-// room for.
-HfsHintSet* SetOf(const CBTreeHfs* tree, const HfsNode* parent, u32 nodeNum) {
-    return &parent->hints[nodeNum & (HintSetCount(tree) - 1)];
-}
-HfsHintSet* SetBeside(const CBTreeHfs* tree, const HfsNode* parent, u32 nodeNum) {
-    return &parent->hints[(nodeNum & (HintSetCount(tree) - 1)) ^ 1];
-}
-
-bool FindInSet(HfsHintSet* set, u32 nodeNum, HintPlace* found) {
-    for (u32 place = 0; place < HfsHintSet::kPlaces; ++place) {
-        if (set->nodeNum[place] == nodeNum && set->node[place] != nullptr) {
-            *found = {set, place};
-            return true;
-        }
-    }
-    return false;
-}
-
-bool TakeFreePlace(HfsHintSet* set, HintPlace* taken) {
-    for (u32 place = 0; place < HfsHintSet::kPlaces; ++place) {
-        if (set->node[place] == nullptr) {
-            *taken = {set, place};
-            return true;
-        }
-    }
-    return false;
-}
-
-// Takes the hint that leads to `child` away.
-void ForgetHint(CBTreeHfs* tree, HfsNode* child) {
-    if (tree->rootHint == child) {
-        tree->rootHint = nullptr;
-    }
-    const HintPlace hint = FindHint(tree, child->hintedBy, child->nodeNum);
-    if (hint) {
-        hint.set->node[hint.place] = nullptr;
-    }
-    child->hintedBy = nullptr;
-}
-
 u32 Least(u32 a, u32 b) {
     return a < b ? a : b;
 }
 
 }  // namespace
 
-HintPlace FindHint(const CBTreeHfs* tree, const HfsNode* parent, u32 nodeNum) {
-    HintPlace found = {nullptr, 0};
-    if (parent != nullptr && parent->hints != nullptr &&
-        !FindInSet(SetOf(tree, parent, nodeNum), nodeNum, &found)) {
-        FindInSet(SetBeside(tree, parent, nodeNum), nodeNum, &found);
+void Hints::DropChild(u32 index) const {
+    HfsHint* hint = &table_->hints[index];
+    if (index < table_->used && hint->child != nullptr) {
+        hint->child->hintedBy = nullptr;
+        hint->child = nullptr;
     }
-    return found;
 }
 
-void SetHint(CBTreeHfs* tree, HfsNode* parent, HfsNode* child) {
-    if (parent == child) {
+void Hints::SetChild(u32 index, HfsNode* child) const {
+    if (child == node_ || !Use(index)) {
         return;  // whoever leaves a node asks its parent for the way on, and the node may be gone
     }
-    ForgetHint(tree, child);
-    HfsHintSet* own = SetOf(tree, parent, child->nodeNum);
-    HintPlace to = {own, own->next};
-    if (!TakeFreePlace(own, &to) && !TakeFreePlace(SetBeside(tree, parent, child->nodeNum), &to)) {
-        to.Node()->hintedBy = nullptr;
-        own->next = (own->next + 1) % HfsHintSet::kPlaces;
-    }
-    to.set->nodeNum[to.place] = child->nodeNum;
-    to.set->node[to.place] = child;
-    to.set->data[to.place] = child->bufs[0].data;
-    child->hintedBy = parent;
+    Leave(child);
+    DropChild(index);
+    table_->hints[index].child = child;
+    table_->hints[index].data = child->bufs[0].data;
+    child->hintedBy = const_cast<HfsNode*>(node_);
+    child->hintedAt = index;
 }
 
-// No hint outlives the node it leads to or the node it belongs to.
-void ForgetHints(CBTreeHfs* tree, HfsNode* node) {
-    ForgetHint(tree, node);
-    if (node->hints == nullptr) {
+void Hints::Leave(HfsNode* child) const {
+    if (child->hintedBy != nullptr) {
+        const Hints hints(child->hintedBy, room_);
+        hints.DropChild(hints.IndexOf(child));
+    }
+}
+
+u32 Hints::FindFrom(u32 index, u32 end, const HfsNode* child) const {
+    while (index < end && table_->hints[index].child != child) {
+        index += 1;
+    }
+    return index;
+}
+
+// Mostly the record is where it was, or some came in before it.
+u32 Hints::IndexOf(HfsNode* child) const {
+    const u32 before = Least(child->hintedAt, table_->used);
+    u32 index = FindFrom(before, table_->used, child);
+    if (index == table_->used) {
+        index = FindFrom(0, before, child);
+        if (index == before) {
+            return room_;
+        }
+    }
+    child->hintedAt = index;
+    return index;
+}
+
+void Hints::Insert(u32 index, u32 count) const {
+    HfsHint* hints = table_->hints;
+    if (index >= table_->used) {
         return;
     }
-    const u32 count = HintSetCount(tree);
-    for (HfsHintSet* set = node->hints; set < node->hints + count; ++set) {
-        for (HfsNode* child : set->node) {
-            if (child != nullptr) {
-                child->hintedBy = nullptr;
-            }
+    const u32 gapEnd = Least(index + count, room_);
+    const u32 kept = Least(table_->used - index, room_ - gapEnd);
+    for (u32 i = index + kept; i < table_->used; ++i) {
+        DropChild(i);
+    }
+    std::memmove(hints + gapEnd, hints + index, kept * sizeof *hints);
+    std::memset(hints + index, 0, (gapEnd - index) * sizeof *hints);
+    table_->used = gapEnd + kept;
+}
+
+void Hints::Remove(u32 index, u32 count) const {
+    HfsHint* hints = table_->hints;
+    if (index >= table_->used) {
+        return;
+    }
+    const u32 end = Least(index + count, table_->used);
+    for (u32 i = index; i < end; ++i) {
+        DropChild(i);
+    }
+    const u32 behind = table_->used - end;
+    std::memmove(hints + index, hints + end, behind * sizeof *hints);
+    std::memset(hints + index + behind, 0, (end - index) * sizeof *hints);
+    table_->used = index + behind;
+}
+
+void Hints::Take(u32 index, const Hints& other, u32 from, u32 count) const {
+    const u32 end = Least(from + count, other.table_->used);
+    for (; from < end; ++from, ++index) {
+        HfsNode* child = other.Child(from);
+        other.DropChild(from);
+        LearnOrder(index, other.Order(from));
+        if (child != nullptr) {
+            SetChild(index, child);
         }
     }
 }
 
-void Separators::Prefetch(u32 count) const {
-    constexpr u32 kLine = 64;
-    const u32 known = Least(count, room_);
-    for (u32 at = 0; at < known; at += kLine / sizeof *order_) {
-        __builtin_prefetch(order_ + at);
+void Hints::Forget() const {
+    for (u32 i = 0; i < table_->used; ++i) {
+        DropChild(i);
     }
-    for (u32 at = 0; at < known; at += kLine / sizeof *child_) {
-        __builtin_prefetch(child_ + at);
-    }
+    std::memset(table_->hints, 0, table_->used * sizeof *table_->hints);
+    table_->used = 0;
 }
 
-void Separators::Insert(u32 index, u32 count) const {
-    if (index >= room_) {
-        return;
+// No hint outlives the node it leads to or the node it belongs to.
+void ForgetHints(CBTreeHfs* tree, HfsNode* node) {
+    if (tree->rootHint == node) {
+        tree->rootHint = nullptr;
     }
-    const u32 moved = Least(count, room_ - 1) - index;
-    std::memmove(order_ + index + 1, order_ + index, moved * sizeof *order_);
-    std::memmove(child_ + index + 1, child_ + index, moved * sizeof *child_);
-    child_[index] = 0;
-}
-
-void Separators::Remove(u32 index, u32 count) const {
-    if (index >= room_) {
-        return;
+    if (node->hintedBy != nullptr) {
+        Hints(tree, node->hintedBy).Leave(node);
     }
-    const u32 known = Least(count, room_);
-    const u32 moved = known - index - 1;
-    std::memmove(order_ + index, order_ + index + 1, moved * sizeof *order_);
-    std::memmove(child_ + index, child_ + index + 1, moved * sizeof *child_);
-    child_[known - 1] = 0;
-}
-
-void Separators::Forget() const {
-    std::memset(child_, 0, room_ * sizeof *child_);
+    ForgetRecords(tree, node);
 }
 
 }  // namespace VELK

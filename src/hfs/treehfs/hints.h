@@ -1,90 +1,93 @@
-// What an index node remembers in its own heap block: which of its children are cached and where
-// they lie, and for records that searches have met the order of their keys and their children. All
-// of it only saves the way to the red-black tree and to the node's bytes: a search that goes by it
-// comes to what it would come to without.
+// What an index node remembers in its own heap block, record by record: the order of the keys that
+// searches have met, and which children are cached and where they lie. All of it only saves the way
+// to the red-black tree and to the node's bytes: a search that goes by it comes to what it would
+// come to without. It follows the records: whoever moves some moves their hints.
 #pragma once
+
+#include <cstddef>
 
 #include "hfs/treehfs.h"
 
 namespace VELK {
 
-// Sets of children: about twice as many places as a node is likely to have children, so that few
-// of them find none.
-inline u32 HintSetCount(const CBTreeHfs* tree) {
-    constexpr u32 kNodeBytesPerSet = 64;
-    constexpr u32 kSmallNodeBytesPerSet = 128;  // small nodes have little room for anything
-    constexpr u32 kSmallNodeShift = 10;
-    const u32 perSet = tree->nodeShift > kSmallNodeShift ? kNodeBytesPerSet : kSmallNodeBytesPerSet;
-    return (1u << tree->nodeShift) / perSet;
-}
-
-// Records whose separators have room; those behind them are searched as they lie.
-inline u32 SeparatorRoom(const CBTreeHfs* tree) {
-    constexpr u32 kNodeBytesPerSeparator = 32;
-    return (1u << tree->nodeShift) / kNodeBytesPerSeparator;
+// Records whose hints have room; those behind them are searched as they lie.
+inline u32 HintRoom(const CBTreeHfs* tree) {
+    constexpr u32 kNodeBytesPerHint = 32;
+    return (1u << tree->nodeShift) / kNodeBytesPerHint;
 }
 
 // Bytes of all that an index node remembers.
 inline std::size_t HintBytes(const CBTreeHfs* tree) {
-    return HintSetCount(tree) * sizeof(HfsHintSet) +
-           SeparatorRoom(tree) * (sizeof(u64) + sizeof(u32));
+    return offsetof(HfsHintTable, hints) + HintRoom(tree) * sizeof(HfsHint);
 }
 
-// One hint.
-struct HintPlace {
-    HfsHintSet* set;  // null: there is none
-    u32 place;
+// Bytes from an index node to its hints: the next line of the processor's cache.
+inline std::size_t HintsOffset(const CBTreeHfs* tree) {
+    constexpr std::size_t kLine = 64;
+    const std::size_t nodeSize =
+        offsetof(HfsNode, bufs) + tree->header.blocksPerNode * sizeof(HfsBcbBuf);
+    return (nodeSize + kLine - 1) / kLine * kLine;
+}
 
-    explicit operator bool() const { return set != nullptr; }
-    HfsNode* Node() const { return set->node[place]; }
-    const u8* Data() const { return set->data[place]; }
-};
-
-// The hint by which `parent` (null: nobody) leads to a child.
-HintPlace FindHint(const CBTreeHfs* tree, const HfsNode* parent, u32 nodeNum);
-// Lets `parent`, an index node with room for hints, lead to `child`, perhaps in place of another.
-void SetHint(CBTreeHfs* tree, HfsNode* parent, HfsNode* child);
-// Forgets the node that leaves the cache, and with it what it remembers.
-void ForgetHints(CBTreeHfs* tree, HfsNode* node);
-
-// The separators that an index node remembers, by record.
-class Separators {
+// The hints of one index node.
+class Hints {
 public:
     // REQUIRES: the node has room for hints.
-    Separators(const CBTreeHfs* tree, const HfsNode* node)
-        : order_(reinterpret_cast<u64*>(node->hints + HintSetCount(tree))),
-          child_(reinterpret_cast<u32*>(order_ + SeparatorRoom(tree))),
-          room_(SeparatorRoom(tree)) {}
+    Hints(const CBTreeHfs* tree, const HfsNode* node)
+        : node_(node), table_(node->hints), room_(HintRoom(tree)) {}
 
-    // The child of record `index`; 0: nothing is known of the record.
-    u32 Child(u32 index) const { return index < room_ ? child_[index] : 0; }
-    // Order of the record's key. REQUIRES: Child(index) is not 0.
-    u64 Order(u32 index) const { return order_[index]; }
-    // REQUIRES: `child` is not 0.
-    void Learn(u32 index, u64 order, u32 child) const {
-        if (index < room_) {
-            order_[index] = order;
-            child_[index] = child;
+    // Order of the record's key; 0: not known.
+    u64 Order(u32 index) const { return index < room_ ? table_->hints[index].order : 0; }
+    void LearnOrder(u32 index, u64 order) const {
+        if (Use(index)) {
+            table_->hints[index].order = order;
         }
     }
-    // Asks for the memory of the first `count`.
-    void Prefetch(u32 count) const;
 
-    // Record `index` came in, or left; the node had `count` records before.
+    // The cached child the record leads to, and its first block; null: none is known.
+    HfsNode* Child(u32 index) const { return index < room_ ? table_->hints[index].child : nullptr; }
+    // REQUIRES: there is such a child.
+    const u8* Data(u32 index) const { return table_->hints[index].data; }
+    // REQUIRES: the record leads to `child`. Any other hint at it is given up.
+    void SetChild(u32 index, HfsNode* child) const;
+    // The record whose hint is `child`; a number past the room when there is none.
+    u32 IndexOf(HfsNode* child) const;
+    // `child`, hinted at by this node or another, leaves its place or the cache.
+    void Leave(HfsNode* child) const;
+
+    // `count` records came in before record `index`, or left from there on.
     void Insert(u32 index, u32 count) const;
     void Remove(u32 index, u32 count) const;
+    // `count` records from `index` on came from `from` on of another node.
+    void Take(u32 index, const Hints& other, u32 from, u32 count) const;
+    // Nothing is known any more of any record.
     void Forget() const;
 
 private:
-    u64* order_;
-    u32* child_;
+    Hints(const HfsNode* node, u32 room) : node_(node), table_(node->hints), room_(room) {}
+    bool Use(u32 index) const {
+        if (index >= room_) {
+            return false;
+        }
+        table_->used = table_->used > index ? table_->used : index + 1;
+        return true;
+    }
+    void DropChild(u32 index) const;
+    // The first hint at `child` from `index` on, `end` when there is none before that.
+    u32 FindFrom(u32 index, u32 end, const HfsNode* child) const;
+
+    const HfsNode* node_;
+    HfsHintTable* table_;
     u32 room_;
 };
 
+// Forgets the node that leaves the cache, and with it what it remembers.
+void ForgetHints(CBTreeHfs* tree, HfsNode* node);
+
 // The same for a node that may have no room for hints: what it remembered of its records is void.
-inline void ForgetSeparators(const CBTreeHfs* tree, const HfsNode* node) {
+inline void ForgetRecords(const CBTreeHfs* tree, const HfsNode* node) {
     if (node->hints != nullptr) {
-        Separators(tree, node).Forget();
+        Hints(tree, node).Forget();
     }
 }
 

@@ -117,7 +117,7 @@ int EnterNewNode(CBTreeHfs* tree, HfsFindData* path, Separator* replacement, Hfs
     }
     HFS_TRY(status, 4757);
     Separator entry;
-    entry.Fill(&tree->header, key, newNode->nodeNum);
+    entry.Fill(&tree->header, key, newNode);
     if (replacement != nullptr) {
         status = tree->InsertLevel(path, &replacement->entry, &entry.entry, parent.node,
                                    parent.index, level + 1);
@@ -150,7 +150,7 @@ int TellParent(CBTreeHfs* tree, HfsFindData* path, HfsNode* node, const LevelCha
     const BTreeKey* key = nullptr;
     HFS_TRY(FirstKey(tree, node, &key), 4716);
     Separator replacement;
-    replacement.Fill(hdr, key, node->nodeNum);
+    replacement.Fill(hdr, key, node);
     replacement.entry.replacesSeparator = true;
     replacement.entry.secondKeyFollows = change.enterNewNode;
     if (change.enterNewNode) {

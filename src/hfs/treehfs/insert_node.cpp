@@ -2,11 +2,13 @@
 // into a new right sibling. A full root is split the same way and gets a new root above. What the
 // parent has to learn of it is told, not done: see insert_level.cpp.
 #include "hfs/treehfs/cache.h"
+#include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/map_walk.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/separator.h"
+#include "hfs/treehfs/way.h"
 
 namespace VELK {
 
@@ -99,7 +101,6 @@ int LinkRight(CBTreeHfs* tree, HfsNode* node, HfsNode* fresh) {
     SetHeight(hdr, fresh, Height(node));
     HFS_TRY(MarkDirty(tree, node, 0), 4449);
     SetFLink(hdr, node, fresh->nodeNum);
-    Introduce(tree, node, fresh);
     if (IsLeaf(fresh) && next == 0) {
         tree->header.lastLeafNode = fresh->nodeNum;
         tree->isDirty = true;
@@ -149,12 +150,12 @@ int GrowRoot(CBTreeHfs* tree, HfsNode* node, HfsNode* right, HfsNode** newRoot) 
     const BTreeKey* key = nullptr;
     Separator separator;
     HFS_TRY(FirstKey(tree, node, &key), 4488);
-    separator.Fill(hdr, key, node->nodeNum);
+    separator.Fill(hdr, key, node);
     HFS_TRY(tree->_InsertKeyRecord(root.Get(), 0, key, separator.entry.keyLength, separator.child,
                                    kChildSize, nullptr),
             4501);
     HFS_TRY(FirstKey(tree, right, &key), 4503);
-    separator.Fill(hdr, key, right->nodeNum);
+    separator.Fill(hdr, key, right);
     HFS_TRY(tree->_InsertKeyRecord(root.Get(), 1, key, separator.entry.keyLength, separator.child,
                                    kChildSize, nullptr),
             4516);
@@ -204,6 +205,9 @@ int Place(CBTreeHfs* tree, const InsertKey& key, HfsNode* node, unsigned nodeNum
             4327);
     if (!inserted) {
         return MakeRoom(tree, key, target, index, out);
+    }
+    if (key.child != nullptr && target->hints != nullptr) {
+        Hints(tree, target).SetChild(static_cast<u32>(index), key.child);
     }
     *out.nodeNum = nodeNum;
     *out.index = index;

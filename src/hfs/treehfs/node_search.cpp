@@ -150,15 +150,6 @@ public:
         return true;
     }
 
-    // The child that record `index`, whose key KeyAt gave, leads to; 0: its data is no child.
-    u32 ChildAt(u32 index, const u8* key) const {
-        const u32 slots = blocks_.SlotPair(index);
-        const u32 dataStart = (slots & 0xFFFF) + PaddedKeySize(GetBe16(key));
-        return (slots >> 16) - dataStart == kChildSize && blocks_.IsWhole(dataStart, kChildSize)
-                   ? GetBe32(blocks_.At(dataStart))
-                   : 0;
-    }
-
     void Prefetch(u32 index) const {
         const u32 start = blocks_.SlotPair(index) & 0xFFFF;
         if (start < nodeSize_) {
@@ -208,42 +199,40 @@ bool MakeOrder(u32 parent, u32 length, Unit unit, u64* order) {
 class NothingKnown {
 public:
     static bool Decide(u32, const SearchKey&, int*) { return false; }
-    template <typename Keys>
-    static void Learn(const Keys&, u32, const u8*) {}
+    static void Learn(u32, const u8*) {}
 };
 
-// In an index node of folded keys: their order in one number, and the child.
+// In an index node of folded keys: their order in one number.
 class KnownSeparators {
 public:
-    explicit KnownSeparators(const Separators& separators) : separators_(separators) {}
+    explicit KnownSeparators(const Hints& hints) : hints_(hints) {}
 
     bool Decide(u32 index, const SearchKey& key, int* order) const {
-        if (separators_.Child(index) == 0 || separators_.Order(index) == key.Order()) {
+        const u64 known = hints_.Order(index);
+        if (known == 0 || known == key.Order()) {
             return false;
         }
-        *order = key.Order() > separators_.Order(index) ? 1 : -1;
+        *order = key.Order() > known ? 1 : -1;
         return true;
     }
-    template <typename Keys>
-    void Learn(const Keys& keys, u32 index, const u8* key) const {
+    void Learn(u32 index, const u8* key) const {
         const auto unit = [key](u32 at) { return GetBe16(key + kCatKeyName + 2 * at); };
         u64 order = 0;
-        const u32 child = keys.ChildAt(index, key);
-        if (child != 0 && MakeOrder(GetBe32(key + kCatKeyParentId),
-                                    GetBe16(key + kCatKeyNameLength), unit, &order)) {
-            separators_.Learn(index, order, child);
+        if (MakeOrder(GetBe32(key + kCatKeyParentId), GetBe16(key + kCatKeyNameLength), unit,
+                      &order)) {
+            hints_.LearnOrder(index, order);
         }
     }
 
 private:
-    Separators separators_;
+    Hints hints_;
 };
 
 // Few nodes stand above the lowest index nodes: they stay in the processor's caches.
 template <typename Keys>
 void PrefetchFor(const Keys& keys, u32 height, s32 high) {
     if (height == 1) {
-        PrefetchProbes<4>(keys, 0, high);
+        PrefetchProbes<2>(keys, 0, high);
     } else if (height == 2) {
         PrefetchProbes<3>(keys, 0, high);
     }
@@ -350,7 +339,7 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt dou
                 }
                 order = key.CompareAsAsked(nodeKey);
             } else {
-                known.Learn(keys, index, bytes);
+                known.Learn(index, bytes);
                 order = Shape::Compare(key, nodeKey);
             }
             if (order == 0) {
@@ -389,13 +378,11 @@ int SearchKnown(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doub
                 SearchResult* result) {
     const u32 count = NumRecords(node);
     const QuickKeys<Blocks, FoldedKeys> keys(&tree->header, node, FoldedKeys());
-    const Separators separators(tree, node);
-    if (separators.Child(count / 2) != 0) {
-        separators.Prefetch(count);
-    } else if (HasQuickKeys(tree->header, key, count)) {
+    const Hints hints(tree, node);
+    if (hints.Order(count / 2) == 0 && HasQuickKeys(tree->header, key, count)) {
         PrefetchFor(keys, Height(node), static_cast<s32>(count) - 1);
     }
-    return Search(tree, node, key, doubt, keys, KnownSeparators(separators), result);
+    return Search(tree, node, key, doubt, keys, KnownSeparators(hints), result);
 }
 
 template <typename Blocks>
@@ -503,6 +490,8 @@ u32 PlainChildIn(const BTHeaderMem* hdr, const HfsNode* node, u32 index) {
     return GetBe32(blocks.At(end - kChildSize));
 }
 
+}  // namespace
+
 u32 PlainChild(const BTHeaderMem* hdr, const HfsNode* node, s32 index) {
     const u32 count = NumRecords(node);
     if (index < 0 || static_cast<u32>(index) >= count || !TableFits(*hdr, count) ||
@@ -513,26 +502,9 @@ u32 PlainChild(const BTHeaderMem* hdr, const HfsNode* node, s32 index) {
                                    : PlainChildIn<ManyBlocks>(hdr, node, static_cast<u32>(index));
 }
 
-}  // namespace
-
 int ChildOf(const CBTreeHfs* tree, const HfsNode* node, s32 index, u32* child) {
     *child = PlainChild(&tree->header, node, index);
     return *child != 0 ? kOk : node->GetChildNodeNum(&tree->header, index, child);
-}
-
-u32 RememberedChild(const CBTreeHfs* tree, const HfsNode* node, s32 index, bool* isStale) {
-    if (node->hints == nullptr) {
-        return 0;
-    }
-    u32 child = Separators(tree, node).Child(static_cast<u32>(index));
-    if (child == 0) {
-        return 0;
-    }
-    *isStale = PlainChild(&tree->header, node, index) != child;
-    // What is remembered is there long before the node's bytes are: the way down goes on with it
-    // while they are still on their way, instead of with the equal number they hold.
-    asm("" : "+r"(child));
-    return *isStale ? 0 : child;
 }
 
 }  // namespace VELK

@@ -69,8 +69,7 @@ bool DescribePlain(const CBTreeHfs* tree, const HfsNode* leaf, u32 index, NodeKe
 // GetChildNodeNum without the way round for plain records.
 int ChildOf(const CBTreeHfs* tree, const HfsNode* node, s32 index, u32* child);
 
-// The child of a record as far as the node remembers it from searches; 0: it does not.
-// `*isStale`: the node's bytes say otherwise, so what it remembers is void.
-u32 RememberedChild(const CBTreeHfs* tree, const HfsNode* node, s32 index, bool* isStale);
+// The child of a record of which nothing is out of the ordinary; 0: something is.
+u32 PlainChild(const BTHeaderMem* hdr, const HfsNode* node, s32 index);
 
 }  // namespace VELK

@@ -40,19 +40,6 @@ int CheckPlace(const HfsNode* node, int level) {
     return kOk;
 }
 
-// Brings a node by the shortest way there is.
-int FetchForLevel(CBTreeHfs* tree, u32 nodeNum, HfsNode* parent, bool isBeside, NodeUse use,
-                  HfsNode** out) {
-    if (isBeside) {
-        return FetchBeside(tree, parent, nodeNum, out);
-    }
-    if (parent != nullptr) {
-        return FetchChild(tree, parent, nodeNum, use, out);
-    }
-    return nodeNum == tree->header.rootNode ? FetchRoot(tree, use, out)
-                                            : FetchNode(tree, nodeNum, use, out);
-}
-
 void DeliverFoundKey(const CBTreeHfs* tree, const SearchResult& found, void* keyOut,
                      unsigned* keyOutSize) {
     const u32 size = found.record.keySize;
@@ -75,23 +62,25 @@ int DeliverFoundRecord(CBTreeHfs* tree, const HfsNode* node, const SearchResult&
     return status;
 }
 
-// Searches an index node of the path and gives the child that leads on to the key.
+// Searches an index node of the path and gives the child that leads on to the key, and the way
+// there. The way goes on while the record's bytes may still be on theirs: should they lead to
+// another child, somebody wrote into the node, and it is searched once more as it is.
 int SearchIndex(CBTreeHfs* tree, const SearchKey& key, HfsFindLevel* entry, bool* found,
-                SearchResult* result, u32* child) {
+                SearchResult* result, u32* child, HintedWay* way) {
     const int status = SearchNode(tree, entry->node, key, result);
     if (HFS_UNLIKELY(status != kOk)) {
         return status;
     }
     *found = result->found;
     entry->index = !result->found && result->index > 0 ? result->index - 1 : result->index;
-    bool isStale = false;
-    *child = RememberedChild(tree, entry->node, entry->index, &isStale);
-    if (*child != 0) {
-        return kOk;
-    }
-    if (HFS_UNLIKELY(isStale)) {
-        ForgetSeparators(tree, entry->node);
-        return SearchIndex(tree, key, entry, found, result, child);
+    *way = WayDown(tree, entry->node, static_cast<u32>(entry->index));
+    if (way->node != nullptr) {
+        *child = way->node->nodeNum;
+        if (HFS_LIKELY(PlainChild(&tree->header, entry->node, entry->index) == *child)) {
+            return kOk;
+        }
+        ForgetRecords(tree, entry->node);
+        return SearchIndex(tree, key, entry, found, result, child, way);
     }
     HFS_TRY(ChildOf(tree, entry->node, entry->index, child), 3095);
     return kOk;
@@ -103,14 +92,14 @@ int Descend(CBTreeHfs* tree, const SearchKey& key, HfsFindData* path, bool* foun
             SearchResult* result) {
     u32 nodeNum = tree->header.rootNode;
     int level = tree->header.treeDepth;
-    HfsNode* parent = nullptr;
+    HintedWay way;
     for (;;) {
         if (HFS_UNLIKELY(nodeNum == 0)) {
             return BadTree(2980);
         }
         int status = CheckLevel(level);
         if (status == kOk) {
-            status = LoadLevel(tree, level, nodeNum, parent, path);
+            status = LoadLevel(tree, level, nodeNum, way, path);
         }
         HFS_TRY(status, 2982);
         HfsFindLevel* entry = &path->path[level];
@@ -120,11 +109,10 @@ int Descend(CBTreeHfs* tree, const SearchKey& key, HfsFindData* path, bool* foun
             entry->index = status == kOk ? result->index : entry->index;
             return status;
         }
-        status = SearchIndex(tree, key, entry, found, result, &nodeNum);
+        status = SearchIndex(tree, key, entry, found, result, &nodeNum, &way);
         if (HFS_UNLIKELY(status != kOk)) {
             return status;
         }
-        parent = entry->node;
         level -= 1;
     }
 }
@@ -192,15 +180,14 @@ int CheckLevel(int level) {
     return kOk;
 }
 
-int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, HfsNode* parent, HfsFindData* path,
-              bool isBeside) {
+int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, const HintedWay& way, HfsFindData* path) {
     HfsFindLevel* entry = &path->path[level];
     entry->index = 0;
     ReleaseNode(entry->node);
     entry->node = nullptr;
     const u32 readBefore = tree->readCount;
     const NodeUse use = level > 1 ? NodeUse::kReadIndex : NodeUse::kRead;
-    HFS_TRY(FetchForLevel(tree, nodeNum, parent, isBeside, use, &entry->node), 2909);
+    HFS_TRY(FetchByWay(tree, way, nodeNum, use, &entry->node), 2909);
     const int status = CheckPlace(entry->node, level);
     if (HFS_UNLIKELY(status != kOk && nodeNum >= tree->validNodes &&
                      tree->readCount != readBefore)) {
@@ -223,7 +210,7 @@ int CBTreeHfs::ReadLevel(int level, unsigned nodeNum, HfsFindData* fd) {
     HfsFindData* path = fd != nullptr ? fd : &findData;
     path->leadsAsOf = 0;
     const int status = CheckLevel(level);
-    return status != kOk ? status : LoadLevel(this, level, nodeNum, nullptr, path);
+    return status != kOk ? status : LoadLevel(this, level, nodeNum, {}, path);
 }
 
 int CBTreeHfs::FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, bool* found,

@@ -29,12 +29,12 @@ void LeaveLeaf(CBTreeHfs* tree, HfsFindData* path) {
 
 // Steps from the current leaf to node `sibling` on one side; the index becomes 0.
 int EnterLeaf(CBTreeHfs* tree, u32 sibling, Side side, HfsFindData* path) {
-    HfsNode* parent = path->path[1].node->hintedBy;
+    const HintedWay way = WayBeside(tree, path->path[1].node, side);
     LeaveLeaf(tree, path);
     path->leadsAsOf = 0;
-    const int status = LoadLevel(tree, 1, sibling, parent, path, true);
+    const int status = LoadLevel(tree, 1, sibling, way, path);
     if (status == kOk) {
-        PrefetchSibling(tree, path->path[1].node, side);  // the one after
+        PrefetchForStep(tree, path->path[1].node, side);  // the one after
     }
     return status;
 }
@@ -197,7 +197,7 @@ int CBTreeHfs::SetPos(const unsigned long long& pos, void* record, unsigned reco
     path->valid = false;
     path->level = 1;
     path->leadsAsOf = 0;
-    HFS_TRY(LoadLevel(this, 1, nodeNum, nullptr, path), 3197);
+    HFS_TRY(LoadLevel(this, 1, nodeNum, {}, path), 3197);
     path->valid = true;
     const int index = static_cast<int>(pos & ((1u << nodeShift) - 1));
     HFS_TRY(IncPos(index, record, recordCapacity, recordSize, keyOut, keyCapacity, keySize, path),

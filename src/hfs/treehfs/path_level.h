@@ -2,6 +2,7 @@
 #pragma once
 
 #include "hfs/treehfs.h"
+#include "hfs/treehfs/way.h"
 
 namespace VELK {
 
@@ -11,10 +12,7 @@ int CheckLevel(int level);
 // Puts node `nodeNum` into path[level], index 0, and checks that it belongs there: its height and
 // its kind. After a failed check the node stays in the path for ClearPath to release.
 // REQUIRES: CheckLevel(level) succeeded.
-// `parent` is the node that led there, null: no node did. With `isBeside` a neighbour led there,
-// and `parent` is the one that leads to it.
-int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, HfsNode* parent, HfsFindData* path,
-              bool isBeside = false);
+int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, const HintedWay& way, HfsFindData* path);
 
 // Whether `path` stands on a record of a leaf: level 1, a leaf held there, its index at most
 // `slack` past the last record. False for a path that was cleared, failed half-way or was outlived

@@ -65,9 +65,9 @@ int CBTreeHfs::_DeleteRecord(HfsNode* node, int index) {
     }
     const int status = CloseGap(this, node, slots, record);
     if (status != kOk) {
-        ForgetSeparators(this, node);
+        ForgetRecords(this, node);
     } else if (node->hints != nullptr) {
-        Separators(this, node).Remove(record, count);
+        Hints(this, node).Remove(record, 1);
     }
     return status;
 }

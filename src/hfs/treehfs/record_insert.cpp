@@ -182,11 +182,11 @@ int CBTreeHfs::_InsertRecord(HfsNode* node, int index, unsigned size, NodeKey* k
 
     const int status = MakeRecord(this, node, static_cast<u32>(index), count, size, key);
     if (status != kOk) {
-        ForgetSeparators(this, node);
+        ForgetRecords(this, node);
         return status;
     }
     if (node->hints != nullptr) {
-        Separators(this, node).Insert(static_cast<u32>(index), count);
+        Hints(this, node).Insert(static_cast<u32>(index), 1);
     }
     if (inserted != nullptr) {
         *inserted = true;

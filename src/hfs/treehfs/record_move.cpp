@@ -76,6 +76,21 @@ bool CanMoveInFront(const CBTreeHfs* tree, const HfsNode* receiver) {
     return table.Count() == 0 || HasWholeKey(table, 0);
 }
 
+// What the nodes remember of `count` records that went from place `first` of one to place `at` of
+// the other. Neighbours are of one kind, but one may have come without room for hints.
+void MoveHints(const CBTreeHfs* tree, const HfsNode* giver, u32 first, const HfsNode* receiver,
+               u32 at, u32 count) {
+    if (receiver->hints != nullptr) {
+        Hints(tree, receiver).Insert(at, count);
+    }
+    if (giver->hints != nullptr && receiver->hints != nullptr) {
+        Hints(tree, receiver).Take(at, Hints(tree, giver), first, count);
+    }
+    if (giver->hints != nullptr) {
+        Hints(tree, giver).Remove(first, count);
+    }
+}
+
 // Closes the gap that the first `count` records of `table` leave, as if they had left one by one:
 // each leaves the last bytes there were, as many as it had, once more in front of those that the
 // ones before it left.
@@ -109,10 +124,9 @@ void MoveFront(const CBTreeHfs* tree, HfsNode* left, HfsNode* right, u32 count) 
         to.SetStart(to.Count() + i, free + from.Start(i) - base);
     }
     CloseFront(from, count);
+    MoveHints(tree, right, 0, left, to.Count(), count);
     SetNumRecords(hdr, left, to.Count() + count);
     SetNumRecords(hdr, right, from.Count() - count);
-    ForgetSeparators(tree, left);
-    ForgetSeparators(tree, right);
 }
 
 // The last `count` records of `left` in front of those of `right`.
@@ -135,10 +149,9 @@ void MoveBack(const CBTreeHfs* tree, HfsNode* right, HfsNode* left, u32 count) {
     for (u32 i = first + 1; i <= from.Count(); ++i) {
         from.SetStart(i, 0);
     }
+    MoveHints(tree, left, first, right, 0, count);
     SetNumRecords(hdr, right, to.Count() + count);
     SetNumRecords(hdr, left, first);
-    ForgetSeparators(tree, left);
-    ForgetSeparators(tree, right);
 }
 
 }  // namespace

@@ -36,8 +36,8 @@ int FirstKeyAside(CBTreeHfs* tree, HfsNode* node, const BTreeKey** key, void** h
     return kOk;
 }
 
-void Separator::Fill(const BTHeaderMem* hdr, const BTreeKey* key, u32 nodeNum) {
-    PutBe32(child, nodeNum);
+void Separator::Fill(const BTHeaderMem* hdr, const BTreeKey* key, HfsNode* leadsTo) {
+    PutBe32(child, leadsTo->nodeNum);
     entry.convert = nullptr;
     entry.key = key;
     entry.keyLength = GetKeyLength(hdr, key, false);
@@ -45,6 +45,7 @@ void Separator::Fill(const BTHeaderMem* hdr, const BTreeKey* key, u32 nodeNum) {
     entry.dataSize = kChildSize;
     entry.replacesSeparator = false;
     entry.secondKeyFollows = false;
+    entry.child = leadsTo;
 }
 
 bool WasEmptied(const BTHeaderMem* hdr, const HfsNode* node, const BTreeKey* key) {

@@ -19,7 +19,8 @@ struct Separator {
     InsertKey entry;
     u8 child[kChildSize];
 
-    void Fill(const BTHeaderMem* hdr, const BTreeKey* key, u32 nodeNum);
+    // REQUIRES: `leadsTo` stays cached until the separator is in.
+    void Fill(const BTHeaderMem* hdr, const BTreeKey* key, HfsNode* leadsTo);
 };
 
 // Whether `key`, still to be inserted, lay in the bytes of the newly allocated `node`. A damaged
