@@ -79,7 +79,7 @@ struct HfsHint {
 // size allows.
 struct HfsHintTable {
     u32 used;  // hints from here on are empty
-    HfsHint hints[1];
+    HfsHint hints[1];  // as many as there is room for
 };
 
 // A cached node. Its bytes are the blocks of `bufs` one after the other; they are not contiguous in
