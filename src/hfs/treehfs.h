@@ -78,7 +78,7 @@ struct HfsHint {
 // The hints of an index node, by record. Allocated with room for as many records as the tree's node
 // size allows.
 struct HfsHintTable {
-    u32 used;  // hints from here on are empty
+    u32 used;          // hints from here on are empty
     HfsHint hints[1];  // as many as there is room for
 };
 
