@@ -113,8 +113,7 @@ public:
     }
     int Lookup(u32 i, u8* out) override {
         unsigned size = 0;
-        return tree_.FindRecord(load_.Host(i), Parent(i), out, kLargestData, &size, &path_) ==
-                       kOk
+        return tree_.FindRecord(load_.Host(i), Parent(i), out, kLargestData, &size, &path_) == kOk
                    ? static_cast<int>(size)
                    : -1;
     }
