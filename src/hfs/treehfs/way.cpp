@@ -56,6 +56,11 @@ HintedWay WayBy(const CBTreeHfs* tree, HfsNode* parent, u32 index) {
     return {parent, index, child, child != nullptr ? hints.Data(index) : nullptr};
 }
 
+// Number of the neighbour; 0: there is none.
+u32 LinkOn(const HfsNode* node, Side side) {
+    return side == Side::kRight ? FLink(node) : BLink(node);
+}
+
 }  // namespace
 
 HintedWay WayDown(const CBTreeHfs* tree, HfsNode* parent, u32 index) {
@@ -72,10 +77,6 @@ HintedWay WayBeside(const CBTreeHfs* tree, HfsNode* node, Side side) {
         return {};
     }
     return WayBy(tree, parent, side == Side::kLeft ? own - 1 : own + 1);
-}
-
-u32 LinkOn(const HfsNode* node, Side side) {
-    return side == Side::kRight ? FLink(node) : BLink(node);
 }
 
 int FetchByWay(CBTreeHfs* tree, const HintedWay& way, u32 nodeNum, NodeUse use, HfsNode** out) {

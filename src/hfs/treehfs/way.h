@@ -21,8 +21,6 @@ struct HintedWay {
 HintedWay WayDown(const CBTreeHfs* tree, HfsNode* parent, u32 index);
 // The way to a neighbour of `node` that has the same parent, as far as a hint leads to `node`.
 HintedWay WayBeside(const CBTreeHfs* tree, HfsNode* node, Side side);
-// Number of the neighbour; 0: there is none.
-u32 LinkOn(const HfsNode* node, Side side);
 
 // Requests node `nodeNum`, as FetchNode does. The way may turn out to lead elsewhere.
 int FetchByWay(CBTreeHfs* tree, const HintedWay& way, u32 nodeNum, NodeUse use, HfsNode** out);
