@@ -3,6 +3,7 @@
 
 #include <sys/mman.h>
 
+#include <algorithm>
 #include <cstring>
 
 namespace VELK {
@@ -12,16 +13,20 @@ namespace {
 constexpr std::size_t kRegionSize = std::size_t{1} << 21;  // a huge page
 constexpr unsigned kSpanShift = 18;
 constexpr std::size_t kSpanSize = std::size_t{1} << kSpanShift;
+// The first spans lie in small pages: a program with few nodes is not to pay for a huge one, which
+// costs as much as three or four of them.
+constexpr std::size_t kSmallSpace = 2 * kSpanSize;
 
 void* MapSpace(std::size_t bytes, int access) {
     void* space = mmap(nullptr, bytes, access, MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
     return space == MAP_FAILED ? nullptr : space;
 }
 
-// Small pages reach far enough for a first region, and a program with few nodes is not to pay for a
-// huge one. `offset`: of any byte of the region.
-bool IsHuge(std::size_t offset) {
-    return offset >= kRegionSize;
+// Small pages that all come in at once cost less than one after the other.
+void Supply([[maybe_unused]] void* space, [[maybe_unused]] std::size_t bytes) {
+#if defined(MADV_POPULATE_WRITE)
+    madvise(space, bytes, MADV_POPULATE_WRITE);
+#endif
 }
 
 }  // namespace
@@ -44,7 +49,8 @@ Slabs::~Slabs() {
     }
 }
 
-// Takes the addresses, a region more than needed so that one can begin at its own multiple.
+// Takes the addresses, a region more than needed so that those behind the first spans can begin at
+// a multiple of their size.
 bool Slabs::Reserve() {
     if (base_ != nullptr || isRefused_) {
         return base_ != nullptr;
@@ -60,7 +66,8 @@ bool Slabs::Reserve() {
         return false;
     }
     u8* const start = static_cast<u8*>(space);
-    const std::size_t before = -reinterpret_cast<std::uintptr_t>(start) & (kRegionSize - 1);
+    const std::size_t before =
+        -(reinterpret_cast<std::uintptr_t>(start) + kSmallSpace) & (kRegionSize - 1);
     if (before != 0) {
         munmap(start, before);
     }
@@ -72,14 +79,15 @@ bool Slabs::Reserve() {
 
 bool Slabs::OpenRegion() {
     u8* const region = base_ + opened_;
-    if (opened_ + kRegionSize > space_ ||
-        mprotect(region, kRegionSize, PROT_READ | PROT_WRITE) != 0) {
+    const bool isFirst = opened_ == 0;
+    const std::size_t size = std::min(isFirst ? kSmallSpace : kRegionSize, space_ - opened_);
+    if (size == 0 || mprotect(region, size, PROT_READ | PROT_WRITE) != 0) {
         return false;
     }
-    if (IsHuge(opened_)) {
-        madvise(region, kRegionSize, MADV_HUGEPAGE);
+    if (!isFirst) {
+        madvise(region, size, MADV_HUGEPAGE);
     }
-    opened_ += kRegionSize;
+    opened_ += size;
     return true;
 }
 
@@ -93,14 +101,11 @@ Slabs::Span* Slabs::NewSpan(std::size_t blockSize) {
             return nullptr;
         }
         span = &spans_[taken_ >> kSpanShift];
+        if (taken_ < kSmallSpace) {
+            Supply(BlocksOf(span), kSpanSize);
+        }
         taken_ += kSpanSize;
     }
-#if defined(MADV_POPULATE_WRITE)
-    // Where pages are small, all of a span at once costs less than one after the other.
-    if (!IsHuge(static_cast<std::size_t>(span - spans_) << kSpanShift)) {
-        madvise(BlocksOf(span), kSpanSize, MADV_POPULATE_WRITE);
-    }
-#endif
     *span = {nullptr, nullptr, nullptr, blockSize, 0, 0};
     return span;
 }
