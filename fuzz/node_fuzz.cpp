@@ -94,26 +94,25 @@ void Look(const test::Bytes& bytes, u32 mapBlock, u32 nodeNum, const Questions& 
     FUZZ_CHECK(status != kOk || freeOne <= bytes.size());
 }
 
+void Run(fuzz::Input* input) {
+    const u8 geometry = input->U8();
+    const u32 nodeSize = kSizes[geometry & 3];
+    const u32 mapBlock = 512u << ((geometry >> 2) & 3);
+    const u32 nodeNum = input->U8() & 1;
+    Questions questions = {};
+    for (u32 i = 0; i < 2; ++i) {
+        questions.index[i] = static_cast<int>(input->U16()) - 0x4000;
+        questions.offset[i] = input->U16();
+    }
+    test::Bytes bytes = input->Rest(nodeSize);
+    bytes.resize(nodeSize);
+    Look(bytes, mapBlock < nodeSize ? mapBlock : nodeSize, nodeNum, questions);
+}
+
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
-    fuzz::Input input(data, size);
-    const u8 geometry = input.U8();
-    const u32 nodeSize = kSizes[geometry & 3];
-    const u32 mapBlock = 512u << ((geometry >> 2) & 3);
-    const u32 nodeNum = input.U8() & 1;
-    Questions questions = {};
-    for (u32 i = 0; i < 2; ++i) {
-        questions.index[i] = static_cast<int>(input.U16()) - 0x4000;
-        questions.offset[i] = input.U16();
-    }
-    test::Bytes bytes = input.Rest(nodeSize);
-    bytes.resize(nodeSize);
-    {
-        const fuzz::Quiet quiet;
-        Look(bytes, mapBlock < nodeSize ? mapBlock : nodeSize, nodeNum, questions);
-    }
-    fuzz::CheckNothingFailed();
+    fuzz::RunQuietly(data, size, Run);
     return 0;
 }
 

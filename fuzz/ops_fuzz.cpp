@@ -286,12 +286,7 @@ private:
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
-    fuzz::Input input(data, size);
-    {
-        const fuzz::Quiet quiet;
-        Run run(&input);
-    }
-    fuzz::CheckNothingFailed();
+    fuzz::RunQuietly(data, size, [](fuzz::Input* input) { const Run run(input); });
     return 0;
 }
 

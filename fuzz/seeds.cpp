@@ -231,7 +231,7 @@ int main(int argc, char** argv) {
         std::fprintf(stderr, "usage: fuzz_seeds FOLDER\n");
         return 16;
     }
-    const fuzz::Quiet quiet;
+    const test::Quiet quiet;
     folder = argv[1];
     Nodes();
     Trees();
