@@ -8,8 +8,8 @@
 #include <string>
 
 #include "fuzz.h"
-#include "hfs/records/record_fields.h"
 #include "mutate.h"
+#include "script_line.h"
 #include "tool/script.h"
 
 namespace {
@@ -57,15 +57,6 @@ void Run(const ScriptContext& given, const std::string& text, u32 lines) {
     FUZZ_CHECK(secondContext.fileId == context.fileId);
 }
 
-// The start of a record, or of one of its fields.
-std::string RecordWord(fuzz::Mutator* mutator) {
-    const RecordKind& kind = kRecordKinds[mutator->Below(kRecordKindCount)];
-    if (kind.fieldCount == 0 || mutator->OneIn(4)) {
-        return std::string(kind.name) + "{";
-    }
-    return std::string(",") + kind.fields[mutator->Below(kind.fieldCount)].name + ":";
-}
-
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
@@ -89,7 +80,7 @@ extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
     return 0;
 }
 
-// Puts a word of the language somewhere, or changes bytes.
+// Puts a word or a line of the language somewhere, makes a script of lines, or changes bytes.
 extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::size_t most,
                                                unsigned seed) {
     static const char* const kWords[] = {"repeat 3\n",
@@ -139,15 +130,23 @@ extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::
     if (mutator.OneIn(2)) {
         return LLVMFuzzerMutate(data, size, most);
     }
-    const std::string word =
-        mutator.OneIn(3)   ? RecordWord(&mutator)
+    if (size > 1 && mutator.OneIn(8)) {
+        size = 1;  // a new script
+    }
+    const bool isLine = size == 1 || mutator.OneIn(4);
+    const std::string words =
+        isLine             ? fuzz::ScriptLineText(&mutator)
+        : mutator.OneIn(3) ? fuzz::RecordWord(&mutator)
         : mutator.OneIn(2) ? operations[mutator.Below(static_cast<u32>(operations.size()))] + " "
                            : kWords[mutator.Below(static_cast<u32>(std::size(kWords)))];
-    if (size == 0 || size + word.size() > most) {
+    if (size == 0 || size + words.size() > most) {
         return LLVMFuzzerMutate(data, size, most);
     }
-    const u32 at = 1 + mutator.Below(static_cast<u32>(size));
-    std::memmove(data + at + word.size(), data + at, size - at);
-    std::copy(word.begin(), word.end(), data + at);
-    return size + word.size();
+    std::size_t at = 1 + mutator.Below(static_cast<u32>(size));
+    while (isLine && at > 1 && at < size && data[at - 1] != '\n') {
+        ++at;
+    }
+    std::memmove(data + at + words.size(), data + at, size - at);
+    std::copy(words.begin(), words.end(), data + at);
+    return size + words.size();
 }
