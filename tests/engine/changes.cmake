@@ -11,6 +11,7 @@ add_executable(change_tests
   insert_left_test.cpp
   insert_refusal_test.cpp
   insert_test.cpp
+  own_change_test.cpp
   record_delete_test.cpp
   record_insert_test.cpp
   record_move_test.cpp

@@ -326,6 +326,19 @@ TEST_P(Extend, UnreadableMapPassesItsStatusOn) {
     ExpectUntouched(20, 17);
 }
 
+// Also one that somebody has made before.
+TEST_P(Extend, NewMapNodesAreHandedOverInTheirOrderBeforeTheMapTheyHangFrom) {
+    Open(20, 3);
+    volume->SetFileSize(tree->fileId, Nodes(30));
+    HfsNode* second = nullptr;
+    ASSERT_EQ(Tree().GetINode(21, &second, true), kOk);
+    second->refCount -= 1;
+    EXPECT_EQ(ModifiedNodes(Tree()), std::vector<u32>{21});
+    ASSERT_EQ(GrowTo(HeadBits() + StepBits() + 1), kOk);
+    EXPECT_EQ(ModifiedNodes(Tree()), (std::vector<u32>{20, 21, 0}));
+    EXPECT_EQ(Chain(), (std::vector<u32>{20, 21}));
+}
+
 TEST_P(Extend, LastRecordThatRefusesWritingPassesItsStatusOn) {
     hasJournal = true;
     Open(HeadBits(), 3);

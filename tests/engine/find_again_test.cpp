@@ -156,6 +156,28 @@ TEST(FindRemembered, SeparatorsThatDifferInTheirFirstUnits) {
     }
 }
 
+// A folder's own record has no name: the number of the child behind it is none either.
+TEST(FindRemembered, AnEmptyNameHasNoFirstUnit) {
+    for (const u32 nodeSize : {512u, 1024u}) {
+        Bench bench(Blocks(512));
+        TreeShape shape;
+        shape.nodeSize = nodeSize;
+        shape.recordsPerLeaf = 1;
+        const Bytes data = Pattern(8, 1);
+        TreeImage image = BuildTree(shape, {{DiskCatKey(5, u"x"), data},
+                                            {DiskCatKey(6, u"y"), data},
+                                            {DiskCatKey(7, u""), data},
+                                            {DiskCatKey(7, u"b"), data},
+                                            {DiskCatKey(7, u"d"), data}});
+        const Bytes root = image.Node(image.rootNode);
+        image.Patch32(image.rootNode, Get16(root, nodeSize - 2 * 4) - 4, 0x007A0001);
+        bench.Open(image);
+        EXPECT_EQ(bench->FindRecord(HostCatKey(7, u"b"), 7, nullptr, 0, nullptr, nullptr), kOk);
+        EXPECT_EQ(bench.capture.Take(), Events{});
+        bench->findData.ClearPath();
+    }
+}
+
 // Between good bounds: the key the search meets is told of once.
 TEST_F(FindAgain, AKeyBetweenThatCannotBeReadIsToldOnce) {
     EXPECT_EQ(Find(1), kOk);
@@ -285,7 +307,7 @@ protected:
         const unsigned long long size = 64 * shape.nodeSize;
         ASSERT_EQ(bench_->Create(shape.nodeSize == 512 ? 9 : 10, 0, &size), kOk);
         for (const std::u16string& name : names) {
-            ASSERT_EQ(bench_->InsertRecord(HostCatKey(7, name), 7, "data", 4), kOk);
+            ASSERT_EQ(bench_->InsertRecord(HostCatKey(7, name), 7, kLetters, 4), kOk);
         }
         bench_->isAllOwn = shape.isOwn;
         bench_.Forget();
@@ -294,16 +316,23 @@ protected:
         return bench_->FindRecord(HostCatKey(7, name), 7, nullptr, 0, nullptr, nullptr);
     }
 
+    // Data that behind an empty name would be one.
+    static constexpr u8 kLetters[4] = {0, 'm', 0, 'm'};
     Bench bench_;
 };
 
 // One name after each other one: by first units that are letters, or need more than that, or none;
 // each of these as the bounds of the leaf.
 TEST_P(FindInLeaf, NamesThatDifferInTheirFirstUnits) {
+    const bool isFolded = GetParam().isFolded;
     const std::vector<std::u16string> names = {u"",  u"1",      u"B",      u"Bx",    u"D",
                                                u"Z", u"\u00E9", u"\u03B1", u"\u4E00"};
-    const std::vector<std::u16string> absent = {u"0",  u"A",      u"C",      u"E",
-                                                u"b0", u"\u00E8", u"\u03B2", u"\u5E00"};
+    const struct {
+        std::u16string name;
+        std::size_t smaller;  // of the names
+    } absent[] = {
+        {u"0", 1},      {u"A", 2},      {u"C", 4},     {u"E", 5}, {u"b0", isFolded ? 3u : 6u},
+        {u"\u00E8", 6}, {u"\u03B2", 8}, {u"\u5E00", 9}};
     Make(names);
     for (std::size_t first = 0; first < 4; ++first) {
         for (const std::u16string& before : {names[first], names[5], names.back()}) {
@@ -312,9 +341,11 @@ TEST_P(FindInLeaf, NamesThatDifferInTheirFirstUnits) {
                 ASSERT_EQ(Find(names[i]), kOk);
                 ASSERT_EQ(bench_->findData.path[1].index, static_cast<s32>(i - first));
             }
-            for (const std::u16string& name : absent) {
+            for (const auto& other : absent) {
                 ASSERT_EQ(Find(before), kOk);
-                ASSERT_EQ(Find(name), kErrNotFound);
+                ASSERT_EQ(Find(other.name), kErrNotFound);
+                ASSERT_EQ(bench_->findData.path[1].index,
+                          static_cast<s32>(std::max(other.smaller, first) - first));
             }
         }
         ASSERT_EQ(bench_->DeleteRecord(HostCatKey(7, names[first]), 7, false), kOk);

@@ -296,8 +296,9 @@ std::ostream& operator<<(std::ostream& out, const BadKey& key) {
 
 class FindBadKey : public ::testing::TestWithParam<BadKey> {
 protected:
-    // A tree of one leaf whose only record has this key and ends right behind its data.
-    int Find() {
+    // Looks for another key in a tree of one leaf whose only record has this key and ends right
+    // behind its data.
+    int Find(u32 mapBlock) {
         const BadKey& bad = GetParam();
         Bytes key(2 + bad.keyLength);
         Put16(&key, 0, bad.keyLength);
@@ -308,20 +309,24 @@ protected:
         TreeShape shape;
         shape.fileId = bad.fileId;
         shape.nodeSize = 2048;
-        bench_.Open(BuildTree(shape, {{key, Bytes(2, 0x61)}}));
+        Bench bench(Blocks(mapBlock), bad.fileId);
+        bench.Open(BuildTree(shape, {{key, Bytes(2, 0x61)}}));
         const HostKey search = NthHostKey(bad.fileId, 0);
-        return bench_->FindRecord(search.Get(), 7, nullptr, 0, nullptr, nullptr);
+        const int status = bench->FindRecord(search.Get(), 7, nullptr, 0, nullptr, nullptr);
+        reports_ = bench.capture.Of(Event::Kind::kReport);
+        return status;
     }
-    Bench bench_{Blocks(512), GetParam().fileId};
+    Events reports_;
 };
 
 class FindGoodKey : public FindBadKey {};
 
 TEST_P(FindBadKey, IsRefusedLikeARecordThatCannotBeLocated) {
-    EXPECT_EQ(Find(), kErrCorrupt);
-    EXPECT_EQ(bench_.capture.Of(Event::Kind::kReport),
-              (Events{Reported(kReasonNode, kAnySite), Reported(kErrCorrupt, 3005),
-                      Reported(kErrCorrupt, 3126)}));
+    for (const u32 mapBlock : {512u, 2048u}) {
+        EXPECT_EQ(Find(mapBlock), kErrCorrupt);
+        EXPECT_EQ(reports_, (Events{Reported(kReasonNode, kAnySite), Reported(kErrCorrupt, 3005),
+                                    Reported(kErrCorrupt, 3126)}));
+    }
 }
 
 INSTANTIATE_TEST_SUITE_P(Keys, FindBadKey,
@@ -335,8 +340,10 @@ INSTANTIATE_TEST_SUITE_P(Keys, FindBadKey,
                                            BadKey{8, 266, 0x8000}));
 
 TEST_P(FindGoodKey, IsCompared) {
-    EXPECT_EQ(Find(), kErrNotFound);
-    EXPECT_EQ(bench_.capture.Of(Event::Kind::kReport), Events{});
+    for (const u32 mapBlock : {512u, 2048u}) {
+        EXPECT_EQ(Find(mapBlock), kErrNotFound);
+        EXPECT_EQ(reports_, Events{});
+    }
 }
 
 INSTANTIATE_TEST_SUITE_P(Keys, FindGoodKey,

@@ -1,9 +1,11 @@
 // When a lookup on the tree's own path asks the nodes above the leaf: never for a key between the
 // first and the last of the leaf just visited, nor for one behind all keys of the tree, always for
-// any other, and where a key to compare lies in two blocks. It shows while the root cannot be read.
+// any other, and where a record it goes by is out of the ordinary. It shows while the root cannot
+// be read.
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <functional>
 #include <utility>
 
 #include "bench.h"
@@ -37,7 +39,9 @@ protected:
     }
 
     void Insert(const std::vector<HostKey>& keys) {
-        const Bytes data = Pattern(20, 1);
+        Bytes data = Pattern(20, 1);
+        data[0] = 0;  // behind an empty name: what would be a letter
+        data[1] = 'm';
         for (const HostKey& key : keys) {
             ASSERT_EQ(bench_->InsertRecord(key.Get(), key.id, data.data(), 20), kOk);
         }
@@ -186,6 +190,158 @@ INSTANTIATE_TEST_SUITE_P(
     Shapes, FindExtentShortcut,
     ::testing::Values(ShortcutShape{512, kExtentsFileId, CompareExtentKeysPlus},
                       ShortcutShape{1024, kExtentsFileId, CompareExtentKeysPlus}));
+
+// ---- records out of the ordinary
+
+// Leaves of five records each, one of them changed behind the engine's back: the record in the
+// middle is probed by each search, the first and the last are the bounds.
+struct LeafBlocks {
+    u32 mapBlock;
+    u32 fileId;
+    CompareKeysFn compare;
+};
+std::ostream& operator<<(std::ostream& out, const LeafBlocks& shape) {
+    return out << "blocks of " << shape.mapBlock << ", file " << shape.fileId
+               << (shape.compare == CompareCatKeysCaseIns ? ", folded" : "");
+}
+
+class FindPastOddRecord : public ::testing::TestWithParam<LeafBlocks> {
+protected:
+    static constexpr u32 kNodeSize = 4096;
+    static constexpr u32 kFirst = 5;  // of the records of the second leaf
+    static constexpr u32 kMiddle = kFirst + 2;
+
+    struct Damage {
+        const char* what;
+        u32 dataSize;
+        std::function<void(u32 index)> make;
+    };
+
+    FindPastOddRecord() : bench_(Blocks(GetParam().mapBlock), GetParam().fileId) {}
+    ~FindPastOddRecord() override { bench_->findData.ClearPath(); }
+
+    void Open(u32 dataSize) {
+        bench_->findData.ClearPath();
+        bench_->Dtor();
+        TreeShape shape;
+        shape.fileId = GetParam().fileId;
+        shape.nodeSize = kNodeSize;
+        shape.recordsPerLeaf = 5;
+        bench_.Open(BuildTree(shape, NthRecords(shape.fileId, 15, dataSize)));
+        bench_->compareKeys = GetParam().compare;
+        ASSERT_EQ(Find(kMiddle), kOk);
+        leaf_ = bench_->findData.path[1].node;
+        bench_->isAllOwn = true;
+    }
+    int Find(u32 n) {
+        const HostKey key = NthHostKey(GetParam().fileId, n);
+        return bench_->FindRecord(key.Get(), key.id, nullptr, 0, nullptr, nullptr);
+    }
+    int FindWithoutRoot(u32 n) {
+        u8& height = bench_->findData.path[2].node->bufs[0].data[kDescHeight];
+        const u8 before = std::exchange(height, u8{9});
+        const int status = Find(n);
+        height = before;
+        return status;
+    }
+
+    u8& At(u32 offset) {
+        return leaf_->bufs[offset / GetParam().mapBlock].data[offset % GetParam().mapBlock];
+    }
+    u32 Word(u32 offset) { return u32{At(offset)} << 8 | At(offset + 1); }
+    void SetWord(u32 offset, u32 value) {
+        At(offset) = static_cast<u8>(value >> 8);
+        At(offset + 1) = static_cast<u8>(value);
+    }
+    static u32 Slot(u32 index) { return kNodeSize - 2 * (index + 1); }
+    u32 Start(u32 index) { return Word(Slot(index)); }
+    Bytes Content() {
+        Bytes content;
+        for (u32 at = 0; at < kNodeSize; ++at) {
+            content.push_back(At(at));
+        }
+        return content;
+    }
+    void Restore(const Bytes& content) {
+        for (u32 at = 0; at < kNodeSize; ++at) {
+            At(at) = content[at];
+        }
+    }
+
+    void MakeStartOdd(u32 index) {
+        const u32 start = Start(index);
+        for (u32 at = start + 2 + Word(start); at > start; --at) {
+            At(at) = At(at - 1);
+        }
+        SetWord(Slot(index), start + 1);
+    }
+    std::vector<Damage> Damages() {
+        const auto keyLength = [this](u32 length) {
+            return [this, length](u32 index) { SetWord(Start(index), length); };
+        };
+        std::vector<Damage> damages = {
+            {"a key shorter than its fixed part", 80, keyLength(4)},
+            {"a key as long as its record", 80,
+             [this](u32 index) { SetWord(Start(index), Start(index + 1) - Start(index) - 2); }},
+            {"a record at an odd address", 80, [this](u32 index) { MakeStartOdd(index); }},
+            {"an end outside the node", 80,
+             [this](u32 index) { SetWord(Slot(index + 1), 0xFFF0); }},
+            {"an end before the start", 80,
+             [this](u32 index) { SetWord(Slot(index + 1), Start(index) - 2); }},
+        };
+        if (GetParam().fileId != kExtentsFileId) {
+            const u32 nameAt = GetParam().fileId == kCatalogFileId ? 6 : 12;
+            damages.push_back({"a name longer than its key", 80,
+                               [this, nameAt](u32 index) { SetWord(Start(index) + nameAt, 300); }});
+        }
+        if (GetParam().mapBlock > 512) {
+            damages.push_back({"a key longer than any", 600, keyLength(521)});
+        } else {
+            damages.push_back({"a key in two blocks", 500, keyLength(505)});
+            damages.push_back({"data in three blocks", 500, [this](u32 index) {
+                                   SetWord(Slot(index + 1), Start(index) + 1200);
+                               }});
+        }
+        return damages;
+    }
+
+    Bench bench_;
+    HfsNode* leaf_ = nullptr;
+};
+
+TEST_P(FindPastOddRecord, AsksTheRoot) {
+    for (const Damage& damage : Damages()) {
+        Open(damage.dataSize);
+        const Bytes sound = Content();
+        for (const u32 index : {0u, 2u, 4u}) {
+            SCOPED_TRACE(::testing::Message() << damage.what << ", record " << index);
+            const u32 wanted = index == 2 ? kFirst : kMiddle;
+            ASSERT_EQ(FindWithoutRoot(wanted), kOk);
+            damage.make(index);
+            bench_.capture.Take();
+            EXPECT_EQ(FindWithoutRoot(wanted), kErrCorrupt);
+            EXPECT_EQ(bench_.capture.Take(),
+                      (Events{Reported(kReasonTree, 2916), Reported(kErrCorrupt, 2982),
+                              Reported(kErrCorrupt, 3126)}));
+            Restore(sound);
+            ASSERT_EQ(Find(kMiddle), kOk);
+        }
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Blocks, FindPastOddRecord,
+                         ::testing::Values(LeafBlocks{4096, kCatalogFileId, CompareCatKeysCaseIns},
+                                           LeafBlocks{2048, kCatalogFileId, CompareCatKeysCaseIns},
+                                           LeafBlocks{512, kCatalogFileId, CompareCatKeysCaseIns},
+                                           LeafBlocks{4096, kCatalogFileId, CompareCatKeysCaseBin},
+                                           LeafBlocks{2048, kCatalogFileId, CompareCatKeysCaseBin},
+                                           LeafBlocks{512, kCatalogFileId, CompareCatKeysCaseBin},
+                                           LeafBlocks{4096, kExtentsFileId, CompareExtentKeysPlus},
+                                           LeafBlocks{2048, kExtentsFileId, CompareExtentKeysPlus},
+                                           LeafBlocks{512, kExtentsFileId, CompareExtentKeysPlus},
+                                           LeafBlocks{4096, kAttributesFileId, CompareAttrKeys},
+                                           LeafBlocks{2048, kAttributesFileId, CompareAttrKeys},
+                                           LeafBlocks{512, kAttributesFileId, CompareAttrKeys}));
 
 }  // namespace
 }  // namespace VELK::test

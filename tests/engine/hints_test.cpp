@@ -202,6 +202,24 @@ TEST_F(HintTable, ANodeIsNotItsOwnChild) {
     Expect(parent_);
 }
 
+// A child that says it is hinted at where it is not: what lies behind the table stays as it was.
+TEST_F(HintTable, AChildThatIsNotThereIsNotLookedForBehindIt) {
+    struct {
+        alignas(HfsHintTable) u8 memory[sizeof parent_.memory]{};
+        HfsHint behind{};
+    } room;
+    room.behind = {5, Child(3), Child(3)->bufs[0].data};
+    LooseNode lonely(NodeImage{}.Build(512), 512, 101);
+    lonely->hints = reinterpret_cast<HfsHintTable*>(room.memory);
+    Child(3)->hintedBy = lonely.Get();
+    Child(0)->hintedBy = lonely.Get();
+    Hints(&bench_.tree.tree, lonely.Get()).Leave(Child(0));
+    EXPECT_EQ(room.behind.child, Child(3));
+    EXPECT_EQ(Child(3)->hintedBy, lonely.Get());
+    Child(0)->hintedBy = Child(3)->hintedBy = nullptr;
+    lonely->hints = nullptr;
+}
+
 TEST_F(HintTable, AChildThatLeavesTheCacheIsForgotten) {
     Fill(&parent_, 6);
     bench_->rootHint = Child(1);

@@ -106,6 +106,20 @@ TEST_F(InsertRefusal, RecordWithoutData) {
     EXPECT_EQ(Tree().header.treeDepth, 0);
 }
 
+// A new root that is refused half-way is handed over last, also when its node was modified before.
+TEST_F(InsertRefusal, NewRootAboveAKeyThatCannotBeRead) {
+    TreeImage image = Image(kFit);
+    image.Patch16(1, 14, 0xFF);
+    Open(image);
+    HfsNode* root = nullptr;
+    ASSERT_EQ(Tree().GetINode(3, &root, true), kOk);
+    root->refCount -= 1;
+    EXPECT_EQ(ModifiedNodes(Tree()), std::vector<u32>{3});
+    ExpectInsert(kFit - 1, kErrCorrupt,
+                 Upwards({Reported(kReasonNode, 9006), Reported(kErrCorrupt, 4488)}, kErrCorrupt));
+    EXPECT_EQ(ModifiedNodes(Tree()), (std::vector<u32>{2, 1, 0, 3}));
+}
+
 TEST_F(InsertRefusal, LookupThatFails) {
     TreeImage image = Image(5);
     image.Patch32(0, kHeadRootNode, 0);

@@ -187,6 +187,15 @@ TEST_P(IterateDamage, ARecordThatCannotBeLocatedIsReported) {
     EXPECT_TRUE(path_.valid);
 }
 
+TEST_P(IterateDamage, ARecordThatCannotBeLocatedIsReportedWithoutAKeyBuffer) {
+    image_.Patch16(2, NodeSize() - 4, NodeSize());
+    StandOn(1);
+    u32 size = 77;
+    EXPECT_EQ(bench_->IncPos(1, record_, 8, &size, nullptr, 0, nullptr, &path_), kErrCorrupt);
+    EXPECT_EQ(Reports(), (Events{Reported(kReasonNode, kAnySite), Reported(kErrCorrupt, 3305)}));
+    EXPECT_EQ(size, 77u);
+}
+
 // The map record of the header node has no key, whatever its bytes look like.
 TEST_P(IterateDamage, TheMapRecordOfAHeaderNodeThatCallsItselfALeafHasNoKey) {
     image_.Patch8(0, kDescKind, 0xFF);

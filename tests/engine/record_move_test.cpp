@@ -5,6 +5,7 @@
 #include <algorithm>
 
 #include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/hints.h"
 #include "node_bench.h"
 
 namespace VELK::test {
@@ -130,6 +131,56 @@ TEST_P(MoveRecords, AreRefusedInFrontOfAKeyThatCannotBeRead) {
 }
 
 INSTANTIATE_GEOMETRIES(MoveRecords, ChangeGeometries);
+
+// ---- what is remembered of records
+
+// A node of seven records, with the orders from `first` on.
+struct Remembering {
+    Remembering(const NodeBench& bench, u32 number, u64 first)
+        : node(bench.Node(LeafOf(512, SomeRecords(7, 8, number)), number)) {
+        node->Get()->hints = reinterpret_cast<HfsHintTable*>(memory);
+        node->Get()->bufs[0].dirty = true;
+        for (u32 n = 0; n < 7; ++n) {
+            Hints(&bench.tree, node->Get()).LearnOrder(n, first + n);
+        }
+    }
+    ~Remembering() { node->Get()->hints = nullptr; }
+    std::vector<u64> Orders(const NodeBench& bench) const {
+        std::vector<u64> orders;
+        for (u32 n = 0; n < 12; ++n) {
+            orders.push_back(Hints(&bench.tree, node->Get()).Order(n));
+        }
+        return orders;
+    }
+
+    std::unique_ptr<LooseNode> node;
+    alignas(HfsHintTable) u8 memory[offsetof(HfsHintTable, hints) + 16 * sizeof(HfsHint)]{};
+};
+
+class MoveRemembered : public ::testing::Test {
+protected:
+    MoveRemembered() { bench_.tree.nodeShift = 9; }
+
+    NodeBench bench_{Geometry{512, 512}};
+};
+
+TEST_F(MoveRemembered, GoesLeftWithTheRecords) {
+    Remembering left(bench_, 1, 100);
+    Remembering right(bench_, 20, 200);
+    ASSERT_EQ(MoveRecordsLeft(&bench_.tree, left.node->Get(), right.node->Get(), 3), kOk);
+    EXPECT_EQ(left.Orders(bench_),
+              (std::vector<u64>{100, 101, 102, 103, 104, 105, 106, 200, 201, 202, 0, 0}));
+    EXPECT_EQ(right.Orders(bench_), (std::vector<u64>{203, 204, 205, 206, 0, 0, 0, 0, 0, 0, 0, 0}));
+}
+
+TEST_F(MoveRemembered, GoesRightWithTheRecords) {
+    Remembering left(bench_, 1, 100);
+    Remembering right(bench_, 20, 200);
+    ASSERT_EQ(MoveRecordsRight(&bench_.tree, right.node->Get(), left.node->Get(), 3), kOk);
+    EXPECT_EQ(left.Orders(bench_), (std::vector<u64>{100, 101, 102, 103, 0, 0, 0, 0, 0, 0, 0, 0}));
+    EXPECT_EQ(right.Orders(bench_),
+              (std::vector<u64>{104, 105, 106, 200, 201, 202, 203, 204, 205, 206, 0, 0}));
+}
 
 }  // namespace
 }  // namespace VELK::test

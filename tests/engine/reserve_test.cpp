@@ -127,6 +127,17 @@ TEST_P(Reserve, OpenReservationThatCountsNodesAlreadyPrints) {
     Tree().ReleaseSpace(&reserve_);
 }
 
+// What nobody has reserved is not added to.
+TEST_P(Reserve, NodesCountedWithoutAReservationRefuseNothing) {
+    Open(20, 3);
+    Fork()->clumpSize = NodeSize();
+    Tree().reservedNodes = 0xFFFFFFFF;
+    ASSERT_EQ(Ask(1, 0), kOk);
+    EXPECT_EVENTS(Asserted(3930));
+    EXPECT_EQ(Tree().reservedNodes, 2u);
+    Tree().ReleaseSpace(&reserve_);
+}
+
 TEST_P(Reserve, AllThatIsAvailableNeedsNoGrowth) {
     Open(20, 15);
     ASSERT_EQ(Ask(4, 0), kOk);
@@ -285,11 +296,13 @@ TEST_P(Reserve, FailedGrowthRecordsNothing) {
 
 TEST_P(Reserve, FileWithoutAForkIsRefused) {
     Open(20, 18);
-    Tree().fileId = kBadBlockFileId;
-    EXPECT_EQ(Ask(4, 0), kErrInvalid);
-    EXPECT_EVENTS(Traced("***** velk_assert src/hfs/fshfs, 1090\n"),
-                  Reported(kReasonInvalid, 9430));
-    ExpectRefused(2);
+    for (const u32 fileId : {0u, 2u, kBadBlockFileId, 9u, 0xFFFFFFFFu}) {
+        Tree().fileId = fileId;
+        EXPECT_EQ(Ask(4, 0), kErrInvalid);
+        EXPECT_EVENTS(Traced("***** velk_assert src/hfs/fshfs, 1090\n"),
+                      Reported(kReasonInvalid, 9430));
+        ExpectRefused(2);
+    }
     Tree().fileId = kAttributesFileId;
 }
 
