@@ -129,6 +129,14 @@ TEST_F(DirtyTest, ARangeThatLeavesTheNodeIsAssertedAndRefused) {
     EXPECT_EQ(DirtOf(node_), Dirt(4, false));
 }
 
+TEST_F(DirtyTest, BytesInABlockTheNodeDoesNotHaveAreRefused) {
+    bench_->header.blocksPerNode = 3;
+    EXPECT_EQ(bench_->SetDirty(node_, 2048, 1025), kErrCorrupt);
+    EXPECT_EQ(bench_.capture.Take(), Events{Reported(kReasonNode, 779)});
+    bench_->header.blocksPerNode = 4;
+    EXPECT_EQ(DirtOf(node_), Dirt(4, false));
+}
+
 TEST_F(DirtyTest, TheNodesEndIsInNoBlock) {
     EXPECT_EQ(bench_->SetDirty(node_, 4096, 0), kErrCorrupt);
     EXPECT_EQ(bench_.capture.Take(), Events{Reported(kReasonNode, 779)});

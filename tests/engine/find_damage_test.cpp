@@ -5,6 +5,7 @@
 #include <cstring>
 
 #include "bench.h"
+#include "hfs/treehfs/node_search.h"
 
 namespace VELK::test {
 namespace {
@@ -252,6 +253,19 @@ TEST_P(FindDamage, ARecordAtABlocksLastByteIsReadWithCare) {
     EXPECT_EQ(Find(), kErrCorrupt);
     EXPECT_EQ(bench_.capture.Take(),
               (Events{Asserted(2671), Reported(kReasonNode, 9020), Reported(kErrCorrupt, 3005)}));
+}
+
+// A record that reaches to the node's last byte holds slots where its child would be.
+TEST_P(FindDamage, AnIndexRecordThatEndsWithItsNodeHasNoPlainChild) {
+    const NodeImage image{
+        .kind = kBTIndexNode, .height = 2, .records = {Record(DiskCatKey(7, u"a"), 5u)}};
+    Bytes bytes = image.Build(NodeSize());
+    const LooseNode sound(bytes, MapBlock(), 3);
+    EXPECT_EQ(PlainChild(sound.Hdr(), sound.Get(), 0), 5u);
+    Put16(&bytes, NodeSize() - 4, NodeSize());
+    Put16(&bytes, 14, NodeSize() - 14 - 2 - kChildSize);
+    const LooseNode wide(bytes, MapBlock(), 3);
+    EXPECT_EQ(PlainChild(wide.Hdr(), wide.Get(), 0), 0u);
 }
 
 // Whoever fetched an index node by its number gave it no hints.

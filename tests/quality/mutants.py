@@ -11,7 +11,8 @@ Mutants that behave as the original does may stand in a list (see line_list.py);
 "reversed", "removed" or "any", and may go on with "in FUNCTION": of the copies that the compiler
 made of a line, those put into such a function. FUNCTION is a pattern of the shell, met by a name
 without its namespaces, or by all of them as they are printed, "INNER < OUTER". Such mutants are
-tried all the same; those that survive are left out of the score.
+tried all the same; those that survive are left out of the score. The run fails with an entry that
+no jump of the library is like.
 
 What became of each mutant is noted, so that a run broken off can go on: a mutant that was killed is
 tried again with its killer first, one that survived only after the tests have changed.
@@ -242,12 +243,25 @@ class Excuses:
 
     def find(self, mutant):
         for what, why in self.lines.remarks(pathlib.Path(mutant.file).name, code_of(mutant)):
-            what, _, function = what.partition(" in ")
-            names = [*mutant.functions, chain_of(mutant)]
-            if what in (mutant.what, "any") and (not function or any(
-                    fnmatch.fnmatchcase(name, function) for name in names)):
+            if self.is_meant(mutant, what):
                 return why
         return None
+
+    def idle(self, mutants):
+        """Entries that mean none of these mutants."""
+        for mutant in mutants:
+            name, code = pathlib.Path(mutant.file).name, code_of(mutant)
+            self.lines.used.update((name, code, what)
+                                   for what, _ in self.lines.remarks(name, code)
+                                   if self.is_meant(mutant, what))
+        return self.lines.unused()
+
+    @staticmethod
+    def is_meant(mutant, what):
+        what, _, function = what.partition(" in ")
+        names = [*mutant.functions, chain_of(mutant)]
+        return what in (mutant.what, "any") and (not function or any(
+            fnmatch.fnmatchcase(name, function) for name in names))
 
 
 def code_of(mutant):
@@ -288,6 +302,10 @@ def arguments():
 def main():
     args = arguments()
     mutants = population(args.binary, args.sources)
+    excuses = Excuses(args.equivalent)
+    idle = excuses.idle(mutants)
+    for file, code, what in idle:
+        print(f"listed, but there is no such jump: {file}: {code}: {what}")
     if args.file:
         mutants = [mutant for mutant in mutants if pathlib.Path(mutant.file).name in args.file]
     if not mutants:
@@ -295,7 +313,6 @@ def main():
     print(f"{len(mutants) // 2} conditional jumps, each reversed or removed; seed {args.seed}")
     count = min(args.count, len(mutants)) if args.count else len(mutants)
     sample = random.Random(args.seed).sample(mutants, count)
-    excuses = Excuses(args.equivalent)
     tests = Tests(args.binary, args.tests, args.spare)
     notes = Notes(args.notes, args.binary, tests)
     tests.measure()
@@ -325,7 +342,7 @@ def main():
     print(f"{killed} killed, {survived} survived, {equivalent} equivalent, of {count}: "
           f"{percent:.1f}% killed (wanted {args.least}%), {time.monotonic() - started:.0f} s, "
           f"{children.ru_utime + children.ru_stime:.0f} s of processor time")
-    return 0 if percent >= args.least else 1
+    return 0 if percent >= args.least and not idle else 1
 
 
 if __name__ == "__main__":

@@ -68,6 +68,15 @@ class Mutants(unittest.TestCase):
         self.assertEqual(status, 0, text)
         self.assertIn("2 killed, 0 survived, 2 equivalent, of 4", text)
 
+    def test_an_entry_that_means_no_jump_fails_the_run(self):
+        status, text = self.run_on(TRIED, listed="lib.cpp: if (a > b) {\n"
+                                                 "    any in Sign*: it has moved\n"
+                                                 "    removed: nobody asks\n")
+        self.assertEqual(status, 1, text)
+        self.assertIn("listed, but there is no such jump: lib.cpp: if (a > b) {: any in Sign*\n",
+                      text)
+        self.assertNotIn("no such jump: lib.cpp: if (a > b) {: removed", text)
+
     def test_what_survived_is_tried_again_when_the_tests_have_changed(self):
         self.run_on(TRIED + UNTRIED)
         _, text = self.run_on(TRIED + UNTRIED)
