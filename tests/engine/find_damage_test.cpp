@@ -268,6 +268,25 @@ TEST_P(FindDamage, AnIndexRecordThatEndsWithItsNodeHasNoPlainChild) {
     EXPECT_EQ(PlainChild(wide.Hdr(), wide.Get(), 0), 0u);
 }
 
+// A node that counts more records than it has room for, with a record where its links are.
+TEST_P(FindDamage, LinksAreNoSlots) {
+    bench_.Open(image_);
+    for (const s8 kind : {kBTIndexNode, kBTLeafNode}) {
+        Bytes bytes =
+            NodeImage{.kind = kind, .records = {Record(DiskCatKey(7, u"a"), 5u)}}.Build(NodeSize());
+        Put16(&bytes, 0, 28);  // would be its end, and the next word its start
+        Put16(&bytes, 2, 14);
+        Put16(&bytes, kDescNumRecords, 0xFFFF);
+        const LooseNode node(bytes, MapBlock(), 3);
+        const s32 index = static_cast<s32>(NodeSize() / 2 - 2);
+        EXPECT_EQ(PlainChild(node.Hdr(), node.Get(), index), 0u);
+        NodeKey record;
+        const BTreeKey* key = nullptr;
+        EXPECT_FALSE(
+            DescribePlain(&bench_.tree.tree, node.Get(), static_cast<u32>(index), &record, &key));
+    }
+}
+
 // Whoever fetched an index node by its number gave it no hints.
 TEST_P(FindDamage, AnIndexNodeFetchedByNumberLeadsDownAllTheSame) {
     bench_.Open(image_);

@@ -164,10 +164,15 @@ TEST_P(GetKeyTest, TheDescriptorHoldsNoSlots) {
     Bytes bytes = OneRecordNode(NodeSize(), 6, 8);
     Put16(&bytes, 0, 30);  // would be the end of a record, and the next word its start
     Put16(&bytes, 2, 14);
-    const LooseNode node(bytes, MapBlock());
+    const int index = static_cast<int>(NodeSize() / 2 - 2);
     NodeKey key{};
-    EXPECT_EQ(node->GetKey(node.Hdr(), static_cast<int>(NodeSize() / 2 - 2), &key), kErrCorrupt);
+    const LooseNode node(bytes, MapBlock());
+    EXPECT_EQ(node->GetKey(node.Hdr(), index, &key), kErrCorrupt);
     EXPECT_EQ(capture_.Take(), (Events{Asserted(410), Reported(kReasonNode, kAnySite)}));
+    Put16(&bytes, kDescNumRecords, 0xFFFF);
+    const LooseNode crowded(bytes, MapBlock());
+    EXPECT_EQ(crowded->GetKey(crowded.Hdr(), index, &key), kErrCorrupt);
+    EXPECT_EQ(capture_.Take(), Events{Reported(kReasonNode, kAnySite)});
 }
 
 TEST_P(GetKeyTest, RecordZeroOfANodeWithoutRecordsIsAssertedAndDescribed) {

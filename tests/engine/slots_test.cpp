@@ -68,6 +68,17 @@ TEST_P(OffsetTable, ATableAsLongAsTheNodeIsRefused) {
     EXPECT_FALSE(IsSoundWith(0, 14));
 }
 
+TEST_P(OffsetTable, WordsBelowItAreNoSlots) {
+    Put16(&content_, SlotAt(kRecords + 1), Start(0));
+    Put16(&content_, SlotAt(kRecords + 2), Start(1));
+    const auto node = bench_.Node(content_);
+    RecordSlots slots{};
+    EXPECT_TRUE(LoadRecordSlots(&bench_.tree.header, node->Get(), kRecords - 1, &slots));
+    EXPECT_EQ(slots.start, Start(kRecords - 1));
+    EXPECT_FALSE(LoadRecordSlots(&bench_.tree.header, node->Get(), kRecords, &slots));
+    EXPECT_FALSE(LoadRecordSlots(&bench_.tree.header, node->Get(), kRecords + 1, &slots));
+}
+
 TEST_P(OffsetTable, AnEmptyNodeIsSound) {
     content_ = LeafOf(kNodeSize, {});
     EXPECT_TRUE(IsSoundWith(0, 14));
