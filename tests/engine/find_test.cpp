@@ -292,7 +292,7 @@ class FindDataScratch : public LeafOfTwoBlocks {
 protected:
     FindDataScratch() : LeafOfTwoBlocks(28, 14) {}
 
-    u8 record_[14] = {};
+    u8 record_[20] = {};
     u32 size_ = 0;
 };
 
@@ -324,7 +324,8 @@ TEST_F(FindScratch, NoMemoryForTheKeyOfAStepIsNotReported) {
 TEST_F(FindDataScratch, NoMemoryForItIsReportedByFindRecordOnly) {
     const HostKey key = NthHostKey(4, 14);
     bench_.heap.FailNth(1);
-    EXPECT_EQ(bench_->FindRecord(key.Get(), key.id, record_, 14, &size_, nullptr), kErrNoMemory);
+    EXPECT_EQ(bench_->FindRecord(key.Get(), key.id, record_, 20, &size_, nullptr), kErrNoMemory);
+    EXPECT_EQ(size_, 20u);
     EXPECT_EQ(bench_.capture.Take(), Events{Reported(kErrNoMemory, 3126)});
 }
 

@@ -394,6 +394,16 @@ TEST_P(RootRemembers, WhereItsCachedChildrenLie) {
     EXPECT_EQ(bench_->rootHint, Root());
 }
 
+// A leaf that no parent led to is not taken for the root.
+TEST_P(RootRemembers, WhereItLiesItself) {
+    Open({u"B", u"C", u"D", u"E"}, 1);
+    ASSERT_EQ(Find(u"C"), kOk);
+    HfsFindData path;
+    EXPECT_EQ(bench_->ReadLevel(1, 3, &path), kOk);
+    EXPECT_EQ(bench_->rootHint, Root());
+    path.ClearPath();
+}
+
 TEST_P(RootRemembers, NoChildThatLeftTheCache) {
     Open({u"B", u"C", u"D", u"E"}, 1);
     ASSERT_EQ(Find(u"C"), kOk);
