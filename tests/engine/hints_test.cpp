@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <utility>
 
 #include "bench.h"
 #include "hfs/treehfs/bytes.h"
@@ -402,6 +403,18 @@ TEST_P(RootRemembers, WhereItLiesItself) {
     EXPECT_EQ(bench_->ReadLevel(1, 3, &path), kOk);
     EXPECT_EQ(bench_->rootHint, Root());
     path.ClearPath();
+}
+
+TEST_P(RootRemembers, WhereItLiesWhileAnotherCannotBeRead) {
+    Open({u"B", u"C", u"D", u"E"}, 1);
+    ASSERT_EQ(Find(u"C"), kOk);
+    const HfsNode* root = Root();
+    const u32 rootNode = std::exchange(bench_->header.rootNode, 1u);
+    bench_.faults.Fail(Call::kMap, 1);
+    EXPECT_EQ(Find(u"B"), kFaultStatus);
+    EXPECT_EQ(bench_->rootHint, root);
+    bench_->header.rootNode = rootNode;
+    EXPECT_EQ(Find(u"B"), kOk);
 }
 
 TEST_P(RootRemembers, NoChildThatLeftTheCache) {

@@ -202,6 +202,14 @@ TEST_P(InsertRecord, EnoughFreeNodesDoNotGrowTheFile) {
     EXPECT_TRUE(IsSound(tree.Flushed()));
 }
 
+TEST_P(InsertRecord, ARecordThatFitsGrowsNoFile) {
+    TreeOnVolume tree(Image(NodeSize(), 9, 3, 0, 0), MapBlock());
+    ASSERT_EQ(tree->header.freeNodes, 0u);
+    EXPECT_EQ(tree.InsertNth(4, kData, true), kOk);
+    EXPECT_EQ(tree.Volume().Count(Call::kResize), 0u);
+    EXPECT_EQ(tree.Flushed().records, WithBetween(9, 4));
+}
+
 INSTANTIATE_GEOMETRIES(InsertRecord, ChangeGeometries);
 
 // Trees whose nodes are all full: one insertion splits every level.

@@ -359,6 +359,26 @@ LooseNode NodeOfHalfABlockTooMuch(Bytes bytes) {
     return LooseNode(bytes, 512);
 }
 
+// Two blocks of a node, and two that lie behind its entries in memory.
+TEST(GetKeyBlocks, NamesNoBlockBehindTheNodes) {
+    Bytes bytes = OneRecordNode(2048, 6, 8);
+    bytes.resize(4096);
+    LooseNode node(bytes, 1024);
+    node.header.nodeSize = 2048;
+    node.header.blocksPerNode = 2;
+    for (const bool isFree : {false, true}) {
+        NodeKey key{};
+        EXPECT_EQ(
+            isFree ? node->GetFreeKey(node.Hdr(), 1, &key) : node->GetKey(node.Hdr(), 0, &key),
+            kOk);
+        EXPECT_EQ(key.next1, node->bufs[1].data);
+        EXPECT_EQ(key.next2, nullptr);
+    }
+    NodePtr place{};
+    EXPECT_EQ(node->GetPtr(node.Hdr(), 1024, &place), kOk);
+    EXPECT_EQ(place.next1, nullptr);
+}
+
 TEST(GetKeyBlocks, RefusesASlotInABlockTheNodeDoesNotHave) {
     Capture capture;
     LooseNode node = NodeOfHalfABlockTooMuch(Bytes(512));
