@@ -46,7 +46,9 @@ struct HfsVolumeOps {
     // Fills bufs[0 .. bytes / mapBlockSize) with `bh` and `data` for the tree file's bytes
     // [byteOffset, byteOffset + bytes); `dirty` is left alone. With `noRead` the old content is not
     // wanted: the caller overwrites all of it. All or nothing: on failure nothing is held and no
-    // entry is filled. The engine passes fork null and forkType 0: the tree file itself.
+    // entry is filled. What lies at two offsets of the file is lent as two pieces of memory, also
+    // when damaged extents give both the same block: a change to one node would not be announced
+    // for the other. The engine passes fork null and forkType 0: the tree file itself.
     int (*Map)(void* self, CFileSystemHfs* fs, HfsRuns* runs, HfsFork* fork, u8 forkType,
                u32 fileId, u64 byteOffset, u32 bytes, bool noRead, HfsBcbBuf* bufs);
     // Takes over the present content of a modified block for writing. Bytes changed and never

@@ -231,7 +231,9 @@ public:
     void PutINode(HfsNode* node, bool ignored);
 
     // Announces a change of `length` bytes at node offset `offset`: gets the journal's access for
-    // each clean block they lie in and lists the node as modified. No byte may change before.
+    // each clean block they lie in and lists the node as modified. No byte may change before. A
+    // change behind a search is announced anew, also in a block that is dirty: what searches
+    // remember of the node is void with the announcement.
     int SetDirty(HfsNode* node, unsigned offset, unsigned length);
     // The same for the one block that holds `offset`.
     int SetDirty(HfsNode* node, unsigned offset);
@@ -324,7 +326,8 @@ public:
     // `initialSize` bytes or one clump. The flag is ignored.
     // REQUIRES: `volume`, `fileId`, `runs` set; for a catalog or extents tree also `compareKeys`
     // and the header's `attributes` and `maxKeyLength`. kErrInvalid: a node size out of range or
-    // below the map block, or no comparator. When it cannot be finished the fork is empty again.
+    // below the map block, or no comparator. When it cannot be finished the fork is empty again,
+    // unless all that was refused is memory for the object itself.
     int Create(unsigned nodeShift, unsigned char ignored, const unsigned long long* initialSize);
 
     // One node: opens a gap of `size` bytes at record `index` (-1: behind the last record). `key`
@@ -337,7 +340,7 @@ public:
     // whose bytes are not all written.
     int _InsertKeyRecord(HfsNode* node, int index, const BTreeKey* key, unsigned keyLen,
                          const void* data, unsigned dataSize, HfsConvert* convert, bool* inserted);
-    // The same where it has to fit: kErrTooLarge when it does not.
+    // The same where it has to fit: kErrInvalid when it does not.
     int _InsertKeyRecord(HfsNode* node, int index, const BTreeKey* key, unsigned keyLen,
                          const void* data, unsigned dataSize, HfsConvert* convert);
     // One node: removes record `index` (-1: the last one). Bytes that become free space are not
@@ -362,7 +365,7 @@ public:
                      unsigned* moved, HfsConvert* convert);
 
     // Inserts a record at `index` of `node`, which the path holds at `level`, and carries the
-    // consequences up the path. Also makes the first leaf of an empty tree.
+    // consequences up the path.
     int InsertTree(const BTreeKey* key, const void* data, unsigned dataSize, HfsNode* node,
                    int index, int level, bool replacesSeparator, HfsFindData* path,
                    HfsConvert* convert);
@@ -421,7 +424,9 @@ public:
     bool isDirty = false;          // header or map changed since the last flush
     u64 pathVersion = 1;  // raised when records move so that a stored path may no longer lead right
     HfsNode* rootHint = nullptr;  // the root when that is cached and was met; else null
-    bool isAllOwn = false;        // Create made the tree and no node was read from the volume since
+    // Create made the tree, and since then no node was read from the volume and no record came in
+    // that searches have something to say of.
+    bool isAllOwn = false;
 };
 
 }  // namespace VELK

@@ -1,6 +1,7 @@
 # Changes to trees: insertion, sharing, splits, update, deletion.
 add_executable(change_tests
   balance_test.cpp
+  change_damage_test.cpp
   change_fault_test.cpp
   change_hostile_test.cpp
   churn_test.cpp
@@ -15,6 +16,7 @@ add_executable(change_tests
   record_delete_test.cpp
   record_insert_test.cpp
   record_move_test.cpp
+  shared_buffers_test.cpp
   split_limits_test.cpp
   update_test.cpp
 )

@@ -2,6 +2,7 @@
 // front to the left sibling, _RotateRight from its back to the right one. How many entries go is
 // planned by bytes before the first record moves. Parents and sibling links are left alone.
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/record_move.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/slots.h"
@@ -127,6 +128,7 @@ int LendBack(CBTreeHfs* tree, HfsNode* right, HfsNode* node, u32 count) {
 int CBTreeHfs::_RotateLeft(HfsNode* left, HfsNode* node, int index, const BTreeKey* key,
                            const void* data, unsigned dataSize, int* outIndex, unsigned* outNodeNum,
                            bool* rotated, unsigned* moved, HfsConvert* hook) {
+    NoteChange(this);
     *outIndex = 0;
     *outNodeNum = 0;
     *rotated = false;
@@ -168,6 +170,7 @@ int CBTreeHfs::_RotateLeft(HfsNode* left, HfsNode* node, int index, const BTreeK
 int CBTreeHfs::_RotateRight(HfsNode* node, HfsNode* right, int index, const BTreeKey* key,
                             const void* data, unsigned dataSize, int* outIndex,
                             unsigned* outNodeNum, unsigned* moved, HfsConvert* hook) {
+    NoteChange(this);
     *outIndex = 0;
     *outNodeNum = 0;
     *moved = 0;

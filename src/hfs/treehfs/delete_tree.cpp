@@ -114,7 +114,8 @@ int CheckRoot(CBTreeHfs* tree, HfsFindLevel* entry) {
         return kOk;
     }
     const u32 rootBefore = hdr->rootNode;
-    while (NumRecords(entry->node) == 1 && Kind(entry->node) == kBTIndexNode) {
+    // One without records is damaged: it has no child that could take its place, which is reported.
+    while (NumRecords(entry->node) <= 1 && Kind(entry->node) == kBTIndexNode) {
         const int status = CollapseOnce(tree, entry->node, entry);
         if (status != 0) {
             return status;
@@ -172,6 +173,7 @@ int ReserveForDeletion(CBTreeHfs* tree) {
 }  // namespace
 
 int CBTreeHfs::DeleteTree(int level, HfsFindData* path) {
+    path = path != nullptr ? path : &findData;
     if (!CanDeleteAt(this, path, level)) {
         return Fail(kErrInvalid, kReasonInvalid, 9267);
     }

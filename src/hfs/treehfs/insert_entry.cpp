@@ -12,8 +12,40 @@ namespace VELK {
 
 namespace {
 
+// Whether a name of so many units as the key says ends where the key does, or before.
+bool HoldsName(const u8* key, u32 fixed, u32 nameLengthAt) {
+    const u32 length = GetHost16(key);
+    return length >= fixed && fixed + 2 * GetHost16(key + nameLengthAt) <= length;
+}
+
+// Whether no search that meets the record will find anything to say of it, there and as a
+// separator, and whether its key was looked up by the ID it carries: another one leads it to a
+// place where no lookup expects what is stored. False also for a comparator whose keys are not
+// known.
+bool IsOrdinary(const CBTreeHfs* tree, const void* key, u32 id, u32 dataSize) {
+    const BTHeaderMem& hdr = tree->header;
+    const u8* bytes = static_cast<const u8*>(key);
+    const u32 length = GetHost16(bytes);
+    const bool isIndexSize =
+        (hdr.attributes & kBTVariableIndexKeysMask) != 0 || length == hdr.maxKeyLength;
+    // Data of more than a block can come to lie in three.
+    if (length > kMaxKeyLength || dataSize > hdr.blockSize || !isIndexSize) {
+        return false;
+    }
+    if (tree->compareKeys == CompareCatKeysCaseIns || tree->compareKeys == CompareCatKeysCaseBin) {
+        return HoldsName(bytes, kCatKeyFixed, kCatKeyNameLength) &&
+               GetHost32(bytes + kCatKeyParentId) == id;
+    }
+    if (tree->compareKeys == CompareAttrKeys) {
+        return HoldsName(bytes, kAttrKeyFixed, kAttrKeyNameLength) &&
+               GetHost32(bytes + kAttrKeyFileId) == id;
+    }
+    return tree->compareKeys == CompareExtentKeysPlus && length >= kExtKeyFixed &&
+           GetHost32(bytes + kExtKeyFileId) == id;
+}
+
 // Makes the first leaf, which is also the root, of a record. A failure leaves the leaf allocated.
-int InsertFirst(CBTreeHfs* tree, const BTreeKey* key, const void* data, u32 dataSize) {
+int InsertFirst(CBTreeHfs* tree, const BTreeKey* key, u32 id, const void* data, u32 dataSize) {
     BTHeaderMem* hdr = &tree->header;
     OwnChange change(tree);
     if (hdr->freeNodes == 0) {
@@ -35,6 +67,7 @@ int InsertFirst(CBTreeHfs* tree, const BTreeKey* key, const void* data, u32 data
     hdr->lastLeafNode = leaf->nodeNum;
     tree->isDirty = true;
     change.Done();
+    tree->isAllOwn = tree->isAllOwn && IsOrdinary(tree, key, id, dataSize);
     return kOk;
 }
 
@@ -53,17 +86,6 @@ int ReserveForSplits(CBTreeHfs* tree) {
     }
     HFS_TRY(tree->ExtendBTree(static_cast<u32>(wanted), nullptr, nullptr), 5087);
     return kOk;
-}
-
-// Whether the key was looked up by the ID it carries. Another one leads it to a place where no
-// lookup expects what is stored. False also for a comparator whose keys are not known.
-bool CarriesId(const CBTreeHfs* tree, const void* key, u32 id) {
-    const u8* bytes = static_cast<const u8*>(key);
-    if (tree->compareKeys == CompareCatKeysCaseIns || tree->compareKeys == CompareCatKeysCaseBin) {
-        return GetHost32(bytes + kCatKeyParentId) == id;
-    }
-    return (tree->compareKeys == CompareExtentKeysPlus && GetHost32(bytes + kExtKeyFileId) == id) ||
-           (tree->compareKeys == CompareAttrKeys && GetHost32(bytes + kAttrKeyFileId) == id);
 }
 
 // After records moved and separators were replaced the tree's own path mostly leads where it did:
@@ -87,7 +109,7 @@ int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, 
         return Fail(kErrInvalid, kReasonInvalid, 9253);  // no lookup could read it again
     }
     if (header.treeDepth == 0) {
-        return InsertFirst(this, searchKey, data, dataSize);
+        return InsertFirst(this, searchKey, keyLen, data, dataSize);
     }
 
     bool found = false;
@@ -120,7 +142,7 @@ int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, 
                 5092);
     }
     change.Done();
-    isAllOwn = isAllOwn && CarriesId(this, key, keyLen);
+    isAllOwn = isAllOwn && IsOrdinary(this, key, keyLen, dataSize);
     if (!inserted) {
         RenewPath(this);
     }
@@ -132,6 +154,7 @@ int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, 
 int CBTreeHfs::InsertTree(const BTreeKey* key, const void* data, unsigned dataSize, HfsNode* node,
                           int index, int level, bool replacesSeparator, HfsFindData* path,
                           HfsConvert* hook) {
+    path = path != nullptr ? path : &findData;
     if (level < 1 || static_cast<u32>(level) > kMaxPathDepth || path->path[level].node != node ||
         node == nullptr || !ParentsLeadHere(this, path, static_cast<u32>(level))) {
         return Fail(kErrInvalid, kReasonInvalid, 9255);

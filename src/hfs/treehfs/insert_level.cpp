@@ -78,7 +78,7 @@ bool KeysAreEqual(const BTHeaderMem* hdr, const HfsFindLevel& one, const HfsFind
 // went left would still be led into this node: such a separator has to follow.
 bool SeparatorStayedBehind(const CBTreeHfs* tree, const HfsFindData* path, HfsNode* node,
                            const LevelChange& change, int level) {
-    return change.nodeNum != node->nodeNum && level != tree->header.treeDepth &&
+    return change.nodeNum != node->nodeNum && !change.newRoot && level != tree->header.treeDepth &&
            ParentsLeadHere(tree, path, static_cast<u32>(level)) &&
            !KeysAreEqual(&tree->header, path->path[level + 1], {node, 0});
 }
@@ -164,6 +164,7 @@ int TellParent(CBTreeHfs* tree, HfsFindData* path, HfsNode* node, const LevelCha
 
 int CBTreeHfs::InsertLevel(HfsFindData* path, InsertKey* first, const InsertKey* second,
                            HfsNode* node, int index, int level) {
+    path = path != nullptr ? path : &findData;
     if (level < 1 || static_cast<u32>(level) > kMaxPathDepth) {
         return Fail(kErrCorrupt, kReasonDepth, 9245);
     }

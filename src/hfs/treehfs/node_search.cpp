@@ -37,6 +37,7 @@ public:
     // most two. REQUIRES of both: they lie inside the node.
     static bool IsWhole(u32, u32) { return true; }
     static bool IsShort(u32, u32) { return true; }
+    static bool FitsBlock(u32) { return true; }
 
 private:
     const u8* data_;
@@ -60,6 +61,7 @@ public:
     bool IsShort(u32 start, u32 end) const {
         return ((end - 1) >> shift_) - (start >> shift_) <= 1;
     }
+    bool FitsBlock(u32 size) const { return size <= mask_ + 1; }
 
 private:
     const HfsBcbBuf* bufs_;
@@ -150,6 +152,13 @@ public:
         return true;
     }
 
+    // Whether the data of record `index`, whose key KeyAt gave, fits into one block.
+    bool StaysShort(u32 index, const u8* key) const {
+        const u32 slots = blocks_.SlotPair(index);
+        const u32 padded = PaddedKeySize(GetBe16(key));
+        return blocks_.FitsBlock((slots >> 16) - (slots & 0xFFFF) - padded);
+    }
+
     void Prefetch(u32 index) const {
         const u32 start = blocks_.SlotPair(index) & 0xFFFF;
         if (start < nodeSize_) {
@@ -199,7 +208,8 @@ bool MakeOrder(u32 parent, u32 length, Unit unit, u64* order) {
 class NothingKnown {
 public:
     static bool Decide(u32, const SearchKey&, int*) { return false; }
-    static void Learn(u32, const u8*) {}
+    template <typename Keys>
+    static void Learn(u32, const u8*, const Keys&) {}
 };
 
 // In an index node of folded keys: their order in one number.
@@ -215,7 +225,13 @@ public:
         *order = key.Order() > known ? 1 : -1;
         return true;
     }
-    void Learn(u32 index, const u8* key) const {
+    // Only of a record that can move without coming to lie in three blocks: each search that meets
+    // such data has something to say.
+    template <typename Keys>
+    void Learn(u32 index, const u8* key, const Keys& keys) const {
+        if (HFS_UNLIKELY(!keys.StaysShort(index, key))) {
+            return;
+        }
         const auto unit = [key](u32 at) { return GetBe16(key + kCatKeyName + 2 * at); };
         u64 order = 0;
         if (MakeOrder(GetBe32(key + kCatKeyParentId), GetBe16(key + kCatKeyNameLength), unit,
@@ -339,7 +355,7 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt dou
                 }
                 order = key.CompareAsAsked(nodeKey);
             } else {
-                known.Learn(index, bytes);
+                known.Learn(index, bytes, keys);
                 order = Shape::Compare(key, nodeKey);
             }
             if (order == 0) {

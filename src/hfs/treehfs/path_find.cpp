@@ -75,12 +75,14 @@ int SearchIndex(CBTreeHfs* tree, const SearchKey& key, HfsFindLevel* entry, bool
     entry->index = !result->found && result->index > 0 ? result->index - 1 : result->index;
     *way = WayDown(tree, entry->node, static_cast<u32>(entry->index));
     if (way->node != nullptr) {
-        *child = way->node->nodeNum;
-        if (HFS_LIKELY(PlainChild(&tree->header, entry->node, entry->index) == *child)) {
+        *child = PlainChild(&tree->header, entry->node, entry->index);
+        if (HFS_LIKELY(*child == way->node->nodeNum)) {
             return kOk;
         }
-        ForgetRecords(tree, entry->node);
-        return SearchIndex(tree, key, entry, found, result, child, way);
+        if (*child != 0) {
+            ForgetRecords(tree, entry->node);
+            return SearchIndex(tree, key, entry, found, result, child, way);
+        }
     }
     HFS_TRY(ChildOf(tree, entry->node, entry->index, child), 3095);
     return kOk;

@@ -39,11 +39,7 @@ u8* DataScratch(CBTreeHfs* tree, u32 size) {
     return size <= tree->header.nodeSize / 2 ? tree->scratchHalf : tree->scratch;
 }
 
-int GatherKey(CBTreeHfs* tree, const HfsNode* node, const NodeKey& record, const BTreeKey** key) {
-    if (record.keySize <= record.firstBytes) {
-        *key = reinterpret_cast<const BTreeKey*>(record.ptr);
-        return kOk;
-    }
+int CopyKey(CBTreeHfs* tree, const HfsNode* node, const NodeKey& record, const BTreeKey** key) {
     if (record.keySize > tree->header.nodeSize) {
         return kErrCorrupt;
     }
@@ -51,10 +47,19 @@ int GatherKey(CBTreeHfs* tree, const HfsNode* node, const NodeKey& record, const
     if (status != kOk) {
         return status;
     }
-    HFS_ASSERT(record.next1 != nullptr, 262);
     NodeBytes(&tree->header, node).CopyOut(tree->scratch, record.offset, record.keySize);
     *key = reinterpret_cast<const BTreeKey*>(tree->scratch);
     return kOk;
+}
+
+int GatherKey(CBTreeHfs* tree, const HfsNode* node, const NodeKey& record, const BTreeKey** key) {
+    if (record.keySize <= record.firstBytes) {
+        *key = reinterpret_cast<const BTreeKey*>(record.ptr);
+        return kOk;
+    }
+    const int status = CopyKey(tree, node, record, key);
+    HFS_ASSERT(status != kOk || record.next1 != nullptr, 262);
+    return status;
 }
 
 bool NodeKeyIsSound(const CBTreeHfs* tree, const BTreeKey* key, u32 keySize) {

@@ -7,13 +7,25 @@
 
 namespace VELK {
 
+namespace {
+
+// Nodes of a size that is no power of two follow one another by less than they are long. A volume
+// that lends what two of them share as one piece of memory would have a key that is left in place
+// change, its length with it, while records move in the nodes above.
+bool NodesOverlap(const CBTreeHfs* tree) {
+    return tree->header.nodeSize != 1u << tree->nodeShift;
+}
+
+}  // namespace
+
 int FirstKey(CBTreeHfs* tree, HfsNode* node, const BTreeKey** key) {
     NodeKey record;
     const int status = node->GetKey(&tree->header, 0, &record);
     if (status != 0) {
         return status;
     }
-    return GatherKey(tree, node, record, key);
+    return NodesOverlap(tree) ? CopyKey(tree, node, record, key)
+                              : GatherKey(tree, node, record, key);
 }
 
 int FirstKeyAside(CBTreeHfs* tree, HfsNode* node, const BTreeKey** key, void** heap) {
@@ -23,7 +35,7 @@ int FirstKeyAside(CBTreeHfs* tree, HfsNode* node, const BTreeKey** key, void** h
     if (status != 0) {
         return status;
     }
-    if (record.keySize <= record.firstBytes) {
+    if (record.keySize <= record.firstBytes && !NodesOverlap(tree)) {
         *key = reinterpret_cast<const BTreeKey*>(record.ptr);
         return kOk;
     }

@@ -1,0 +1,286 @@
+// The tree's own path, and what nodes remember of their records, lead past what the way down from
+// the root would look at. Nothing may show of that: status, reports, calls of the comparator.
+#include <gtest/gtest.h>
+
+#include <cstring>
+
+#include "bench.h"
+#include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/hints.h"
+#include "hfs/treehfs/node_desc.h"
+
+namespace VELK::test {
+namespace {
+
+class ShortWay : public ::testing::Test {
+protected:
+    void Make(Bench* bench, u32 nodeShift) {
+        (*bench)->compareKeys = CompareCatKeysCaseIns;
+        (*bench)->header.maxKeyLength = kCatMaxKeyLength;
+        (*bench)->header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
+        const unsigned long long size = u64{64} << nodeShift;
+        ASSERT_EQ((*bench)->Create(nodeShift, 0, &size), kOk);
+    }
+    static int Insert(Bench* bench, const std::u16string& name, u32 dataSize) {
+        const HostKey key = HostCatKey(7, name);
+        return (*bench)->InsertRecord(key.Get(), 7, Pattern(dataSize, 1).data(), dataSize);
+    }
+    // Status and what was said of a lookup, on the tree's own path or on another one.
+    static std::pair<int, Events> Find(Bench* bench, const std::u16string& name,
+                                       HfsFindData* path) {
+        bench->capture.Take();
+        bool found = false;
+        const HostKey key = HostCatKey(7, name);
+        const int status =
+            (*bench)->FindEntry(key, 7, path, &found, nullptr, nullptr, nullptr, nullptr);
+        return {status, bench->capture.Take()};
+    }
+    static std::pair<int, Events> FindPlainly(Bench* bench, const std::u16string& name) {
+        HfsFindData path;
+        auto result = Find(bench, name, &path);
+        path.ClearPath();
+        return result;
+    }
+};
+
+// Sound tree, legal calls: data of three blocks is asserted (505) at each probe.
+TEST_F(ShortWay, BehindAllKeysARecordOfThreeBlocksIsAsserted) {
+    Bench bench(Blocks(512));
+    Make(&bench, 12);
+    for (const char16_t* name : {u"a", u"b", u"c", u"d", u"e"}) {
+        ASSERT_EQ(Insert(&bench, name, 700), kOk);
+    }
+    const auto plain = FindPlainly(&bench, u"z");
+    const auto own = Find(&bench, u"z", nullptr);
+    bench->findData.ClearPath();
+    bench.capture.Take();
+    EXPECT_EQ(plain.second, Events{Asserted(505)});
+    EXPECT_EQ(own.first, plain.first);
+    EXPECT_EQ(own.second, plain.second);
+}
+
+// A stored key longer than 520 is refused wherever it is probed.
+TEST_F(ShortWay, BehindAllKeysAKeyThatIsTooLongIsRefused) {
+    Bench bench(Blocks(4096));
+    Make(&bench, 12);
+    ASSERT_EQ(Insert(&bench, u"a", 20), kOk);
+    ASSERT_EQ(Insert(&bench, u"y", 20), kOk);
+    ASSERT_EQ(Insert(&bench, u"b" + std::u16string(257, u'x'), 20), kOk);
+    EXPECT_EQ(bench.capture.Take(), Events{Asserted(1362)});
+    const auto own = Find(&bench, u"z", nullptr);
+    const auto plain = FindPlainly(&bench, u"z");
+    bench->findData.ClearPath();
+    bench.capture.Take();
+    EXPECT_EQ(plain.first, kErrCorrupt);
+    EXPECT_EQ(own.first, plain.first);
+    EXPECT_EQ(own.second, plain.second);
+}
+
+// The same as a separator.
+TEST_F(ShortWay, ASeparatorThatIsTooLongIsRefused) {
+    Bench bench(Blocks(2048));
+    Make(&bench, 11);
+    for (const char16_t* name : {u"a", u"b", u"q"}) {
+        ASSERT_EQ(Insert(&bench, name, 400), kOk);
+    }
+    ASSERT_EQ(Insert(&bench, u"c" + std::u16string(257, u'x'), 400), kOk);
+    ASSERT_EQ(bench->header.treeDepth, 2);
+    bench.capture.Take();
+    EXPECT_EQ(Find(&bench, u"a", nullptr).first, kOk);
+    const auto own = Find(&bench, u"b", nullptr);
+    const auto plain = FindPlainly(&bench, u"b");
+    bench->findData.ClearPath();
+    bench.capture.Take();
+    EXPECT_EQ(plain.first, kErrCorrupt);
+    EXPECT_EQ(own.first, plain.first);
+    EXPECT_EQ(own.second, plain.second);
+}
+
+// An extents key of 12 bytes in a tree of separators of 10: asserted (1359), inserted, and nothing
+// else is said of an insertion that succeeded.
+TEST_F(ShortWay, AnInsertionThatSucceedsReportsNothing) {
+    Bench bench(Blocks(512), kExtentsFileId);
+    bench->compareKeys = CompareExtentKeysPlus;
+    bench->header.maxKeyLength = kExtMaxKeyLength;
+    bench->header.attributes = kBTBigKeysMask;
+    const unsigned long long size = 64 * 512;
+    ASSERT_EQ(bench->Create(9, 0, &size), kOk);
+    for (u32 n = 10; n < 30; ++n) {
+        ASSERT_EQ(bench->InsertRecord(HostExtKey(0, n, 0).Get(), n, Pattern(64, n).data(), 64),
+                  kOk);
+    }
+    ASSERT_EQ(bench->header.treeDepth, 2);
+    bench.capture.Take();
+    HostKey key = HostExtKey(0, 5, 0);
+    key.bytes[0] = 12;
+    EXPECT_EQ(bench->InsertRecord(key.Get(), 5, Pattern(64, 1).data(), 64), kOk);
+    const Events events = bench.capture.Take();
+    bench->findData.ClearPath();
+    for (const Event& event : events) {
+        EXPECT_NE(event.kind, Event::Kind::kReport) << event;
+    }
+}
+
+// Records moved by hand by a rotation that is refused at its own record.
+TEST_F(ShortWay, RecordsMovedByARotationThatFailed) {
+    Bench bench(Blocks(512));
+    Make(&bench, 9);
+    for (u32 n = 0; n < 40; ++n) {
+        const HostKey key = NthHostKey(4, n);
+        ASSERT_EQ(bench->InsertRecord(key.Get(), key.id, Pattern(24, n).data(), 24), kOk);
+    }
+    const auto find = [&](u32 n, HfsFindData* path) {
+        const HostKey key = NthHostKey(4, n);
+        return bench->FindRecord(key.Get(), key.id, nullptr, 0, nullptr, path);
+    };
+    ASSERT_EQ(find(0, nullptr), kOk);
+    HfsNode* left = bench->findData.path[1].node;
+    const u32 count = NumRecords(left);
+    HfsFindData second;
+    ASSERT_EQ(find(count, &second), kOk);
+    HfsNode* right = second.path[1].node;
+    ASSERT_NE(left, right);
+    for (const u32 n : {1u, 2u, 3u}) {
+        ASSERT_EQ(bench->DeleteRecord(NthHostKey(4, n).Get(), NthHostKey(4, n).id, false), kOk);
+    }
+    ASSERT_EQ(find(0, nullptr), kOk);
+    const u32 before = NumRecords(left);
+    int index = 0;
+    unsigned nodeNum = 0;
+    unsigned moved = 0;
+    bool rotated = false;
+    const HostKey key = NthHostKey(4, count + NumRecords(right) - 1, true);
+    ASSERT_EQ(bench->_RotateLeft(left, right, static_cast<int>(NumRecords(right)), key, "x", 0,
+                                 &index, &nodeNum, &rotated, &moved, &bench->convert),
+              kErrInvalid);
+    ASSERT_GT(NumRecords(left), before);
+    const int own = find(count, nullptr);
+    const int plain = find(count, &second);
+    second.ClearPath();
+    bench->findData.ClearPath();
+    bench.capture.Take();
+    EXPECT_EQ(own, plain);
+}
+
+// The comparator asserts at each probe (70) when the search key is out of line: a lookup asks as
+// often as the one after it, which finds the same tree.
+TEST_F(ShortWay, ANodeIsSearchedOnce) {
+    Bench bench(Blocks(512));
+    Make(&bench, 11);
+    u32 wrong = 0;
+    for (u32 n = 0; n < 60; ++n) {
+        const std::u16string name = std::u16string(1, static_cast<char16_t>(u'A' + n / 10)) +
+                                    std::u16string(1, static_cast<char16_t>(u'0' + n % 10)) +
+                                    std::u16string(20 + n % 7, u'x');
+        ASSERT_EQ(Insert(&bench, name, 300), kOk);
+        const HostKey key = HostCatKey(7, name);
+        alignas(8) u8 room[sizeof key.bytes + 2];
+        std::memcpy(room + 2, key.bytes, sizeof key.bytes);
+        std::size_t asked[2];
+        for (std::size_t& times : asked) {
+            bench.capture.Take();
+            HfsFindData path;
+            bool found = false;
+            ASSERT_EQ(bench->FindEntry(reinterpret_cast<const BTreeKey*>(room + 2), 7, &path,
+                                       &found, nullptr, nullptr, nullptr, nullptr),
+                      kOk);
+            ASSERT_TRUE(found);
+            times = bench.capture.Take().size();
+            path.ClearPath();
+        }
+        EXPECT_EQ(asked[0], asked[1]) << n;
+        wrong += asked[0] != asked[1];
+    }
+    EXPECT_EQ(wrong, 0u);
+    bench->findData.ClearPath();
+    bench.capture.Take();
+}
+
+// An index record of much data, probed and remembered in two blocks, then moved into three.
+TEST_F(ShortWay, ARecordThatMovedIntoThreeBlocksIsAsserted) {
+    Bench bench(Blocks(512));
+    TreeShape shape;
+    shape.nodeSize = 4096;
+    shape.recordsPerLeaf = 2;
+    std::vector<TreeRecord> records;
+    for (const char16_t* name : {u"b", u"c", u"h", u"i", u"n", u"o"}) {
+        records.push_back({DiskCatKey(7, name), Pattern(8, 1)});
+    }
+    bench.Open(BuildTree(shape, records));
+    HfsFindData path;
+    ASSERT_EQ(Find(&bench, u"o", &path).first, kOk);
+    HfsNode* root = path.path[2].node;
+    const Bytes wide = DiskCatKey(7, u"d");
+    const Bytes first = DiskCatKey(7, u"a" + std::u16string(205, u'x'));
+    const Bytes data = Pattern(600, 1);
+    const auto asKey = [](const Bytes& key) {
+        return reinterpret_cast<const BTreeKey*>(key.data());
+    };
+    ASSERT_EQ(bench->_InsertKeyRecord(root, 1, asKey(wide), 0, data.data(), 600, nullptr), kOk);
+    EXPECT_EQ(Find(&bench, u"o", &path).second, Events{});
+    const u8 child[] = {0, 0, 0, 1};
+    ASSERT_EQ(bench->_InsertKeyRecord(root, 0, asKey(first), 0, child, 4, nullptr), kOk);
+    const auto remembered = Find(&bench, u"o", &path);
+    HfsNode* node = nullptr;
+    ASSERT_EQ(bench->GetINode(bench->header.rootNode, &node, false), kOk);
+    node->refCount -= 1;
+    const auto plain = Find(&bench, u"o", &path);
+    path.ClearPath();
+    bench.capture.Take();
+    EXPECT_EQ(plain.second, Events{Asserted(505)});
+    EXPECT_EQ(remembered.second, plain.second);
+}
+
+// Sound tree: node 3 was the root and is a leaf now, its object has room to remember.
+TEST_F(ShortWay, ALeafRecordThatMovedIntoThreeBlocksIsAsserted) {
+    Bench bench(Blocks(512));
+    Make(&bench, 12);
+    const std::u16string letters = u"bdfhjlnp";
+    for (const char16_t letter : letters) {
+        ASSERT_EQ(Insert(&bench, {letter}, 600), kOk);
+    }
+    ASSERT_EQ(bench->header.treeDepth, 2);
+    ASSERT_EQ(bench->header.rootNode, 3u);
+    for (const char16_t letter : letters) {
+        ASSERT_EQ(bench->DeleteRecord(HostCatKey(7, {&letter, 1}).Get(), 7, false), kOk);
+    }
+    ASSERT_EQ(bench->header.treeDepth, 0);
+    ASSERT_EQ(Insert(&bench, u"b", 600), kOk);
+    HfsNode* held = nullptr;
+    ASSERT_EQ(bench->AllocateNode(&held), kOk);
+    ASSERT_EQ(held->nodeNum, 2u);
+    for (const char16_t letter : letters.substr(1)) {
+        ASSERT_EQ(Insert(&bench, {letter}, 600), kOk);
+    }
+    ASSERT_EQ(bench->header.lastLeafNode, 3u);
+    HfsFindData path;
+    const std::u16string inLast = u"lnp";
+    for (const char16_t letter : inLast) {
+        ASSERT_EQ(Find(&bench, {letter}, &path).first, kOk);
+        ASSERT_EQ(path.path[1].node->nodeNum, 3u);
+    }
+    ASSERT_NE(path.path[1].node->hints, nullptr);
+    const s32 last = path.path[1].index;
+    for (u32 grow = 0; grow < 4; ++grow) {
+        const char16_t next[] = {u'j', static_cast<char16_t>(u'a' + grow), 0};
+        ASSERT_EQ(Insert(&bench, next, 100), kOk);
+        for (const char16_t letter : inLast) {
+            const auto remembered = Find(&bench, {letter}, &path);
+            HfsNode* node = nullptr;
+            ASSERT_EQ(bench->GetINode(3, &node, false), kOk);
+            node->refCount -= 1;
+            const auto plain = Find(&bench, {letter}, &path);
+            EXPECT_EQ(remembered.second, plain.second) << grow << " " << u32{letter} << " " << last;
+        }
+        for (const char16_t letter : inLast) {
+            Find(&bench, {letter}, &path);
+        }
+    }
+    path.ClearPath();
+    held->refCount -= 1;
+    bench->findData.ClearPath();
+    bench.capture.Take();
+}
+
+}  // namespace
+}  // namespace VELK::test
