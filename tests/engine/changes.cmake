@@ -12,6 +12,7 @@ add_executable(change_tests
   insert_left_test.cpp
   insert_refusal_test.cpp
   insert_test.cpp
+  lockstep_test.cpp
   own_change_test.cpp
   record_delete_test.cpp
   record_insert_test.cpp
