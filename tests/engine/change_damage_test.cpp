@@ -1,5 +1,6 @@
 // Changes to trees that something is wrong with beside the change: what has to be refused, and what
 // need not even be looked at.
+#include "hfs/treehfs/bytes.h"
 #include "tree_test.h"
 
 namespace VELK::test {
@@ -79,10 +80,21 @@ TEST(ChangeAtPath, ANullPathIsTheTreesOwn) {
     EXPECT_EQ(tree->DeleteTree(1, nullptr), kOk);
     EXPECT_FALSE(stand(2));
     const HostKey key = NthHostKey(kCatalogFileId, 2);
-    const HfsFindLevel at = tree->findData.path[1];
+    HfsFindLevel at = tree->findData.path[1];
     EXPECT_EQ(
         tree->InsertTree(key, "back", 4, at.node, at.index, 1, false, nullptr, &tree->convert),
         kOk);
+    EXPECT_TRUE(stand(2));
+    EXPECT_EQ(tree->DeleteTree(1, nullptr), kOk);
+    EXPECT_FALSE(stand(2));
+    at = tree->findData.path[1];
+    InsertKey entry = {};
+    entry.convert = &tree->convert;
+    entry.key = key;
+    entry.keyLength = GetHost16(key.bytes);
+    entry.data = "more";
+    entry.dataSize = 4;
+    EXPECT_EQ(tree->InsertLevel(nullptr, &entry, nullptr, at.node, at.index, 1), kOk);
     EXPECT_TRUE(stand(2));
 }
 

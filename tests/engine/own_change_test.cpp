@@ -89,5 +89,94 @@ TEST_F(OwnChanges, ANodeGivenBackByHandEndsIt) {
     EXPECT_FALSE(bench_->isAllOwn);
 }
 
+// ---- records that searches have something to say of
+
+struct NewRecord {
+    const char* name;
+    bool isOrdinary;
+    u32 fileId;
+    HostKey key;
+    u32 size = 20;
+    u32 attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
+    CompareKeysFn compare = nullptr;  // null: the usual one of the tree
+};
+
+void PrintTo(const NewRecord& record, std::ostream* out) {
+    *out << record.name;
+}
+
+// With another byte at `at`: of the length field (0) or of the number of units.
+HostKey With(HostKey key, u32 at, u8 value) {
+    key.bytes[at] = value;
+    return key;
+}
+HostKey OfAnother(HostKey key) {
+    key.id += 1;
+    return key;
+}
+int CompareAny(const BTreeKey* one, unsigned id, const BTreeKey* other) {
+    return CompareCatKeysCaseIns(one, id, other);
+}
+
+std::vector<NewRecord> NewRecords() {
+    constexpr u32 kCat = kCatalogFileId;
+    constexpr u32 kExt = kExtentsFileId;
+    constexpr u32 kAttr = kAttributesFileId;
+    const HostKey cat = HostCatKey(7, u"ab");
+    const HostKey ext = HostExtKey(0, 7, 3);
+    const HostKey attr = HostAttrKey(7, 0, u"ab");
+    return {
+        {"catalog", true, kCat, cat},
+        {"catalogBinary", true, kCat, cat, 20, kBTBigKeysMask | kBTVariableIndexKeysMask,
+         CompareCatKeysCaseBin},
+        {"catalogOfAForeignOrder", false, kCat, cat, 20, kBTBigKeysMask | kBTVariableIndexKeysMask,
+         CompareAny},
+        {"catalogUnderAnotherId", false, kCat, OfAnother(cat)},
+        {"catalogKeyWithoutNameLength", false, kCat, With(cat, 0, 4)},
+        {"catalogNameBehindTheKey", false, kCat, With(cat, kCatKeyNameLength, 3)},
+        {"catalogKeyLongerThanAny", false, kCat, HostCatKey(7, std::u16string(258, u'x'))},
+        {"dataOfOneBlock", true, kCat, cat, 512},
+        {"dataOfMore", false, kCat, cat, 514},
+        {"extents", true, kExt, ext},
+        {"extentsUnderAnotherId", false, kExt, OfAnother(ext)},
+        {"extentsKeyThatIsShort", false, kExt, With(ext, 0, 8)},
+        {"extentsOfFixedKeys", true, kExt, ext, 20, kBTBigKeysMask},
+        {"extentsOfFixedKeysLongerThanThat", false, kExt, With(ext, 0, 12), 20, kBTBigKeysMask},
+        {"attributes", true, kAttr, attr},
+        {"attributesUnderAnotherId", false, kAttr, OfAnother(attr)},
+        {"attributesKeyWithoutNameLength", false, kAttr, With(attr, 0, 10)},
+        {"attributesNameBehindTheKey", false, kAttr, With(attr, kAttrKeyNameLength, 3)},
+    };
+}
+
+class NewRecordInOwnTree : public ::testing::TestWithParam<NewRecord> {};
+
+TEST_P(NewRecordInOwnTree, EndsItUnlessItIsOrdinary) {
+    const NewRecord& record = GetParam();
+    for (const bool isFirst : {true, false}) {
+        Bench bench(Blocks(512), record.fileId);
+        PrepareCreate(&bench.tree.tree);
+        bench->header.attributes = record.attributes;
+        const unsigned long long size = 64 * 4096;
+        ASSERT_EQ(bench->Create(12, 0, &size), kOk);
+        if (record.compare != nullptr) {
+            bench->compareKeys = record.compare;
+        }
+        if (!isFirst) {
+            const HostKey other = NthHostKey(record.fileId, 3);
+            ASSERT_EQ(bench->InsertRecord(other.Get(), other.id, "ab", 2), kOk);
+        }
+        const Bytes data = Pattern(record.size, 1);
+        EXPECT_EQ(bench->InsertRecord(record.key.Get(), record.key.id, data.data(), record.size),
+                  kOk);
+        EXPECT_EQ(bench->isAllOwn, record.isOrdinary) << isFirst;
+        bench->findData.ClearPath();
+        bench.capture.Take();
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(All, NewRecordInOwnTree, ::testing::ValuesIn(NewRecords()),
+                         [](const auto& one) { return one.param.name; });
+
 }  // namespace
 }  // namespace VELK::test
