@@ -1,6 +1,7 @@
 // Changes to trees that something is wrong with beside the change: what has to be refused, and what
 // need not even be looked at.
 #include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/node_desc.h"
 #include "tree_test.h"
 
 namespace VELK::test {
@@ -63,6 +64,63 @@ TEST(ChangeOfDamaged, CollapseToAnEmptyIndexNodeIsNoSuccess) {
               (Events{Asserted(410), Reported(kReasonNode, 9005), Reported(kErrCorrupt, 9014),
                       Reported(kErrCorrupt, 4922), Reported(kErrCorrupt, 4993),
                       Reported(kErrCorrupt, 4993), Reported(kErrCorrupt, 5148)}));
+}
+
+// Leaf 2 is full, and leaf 1 has room for one record: that of number 9, which is not there.
+TreeImage RoomForOneOnTheLeft() {
+    TreeShape shape;
+    shape.recordsPerLeaf = 10;
+    const std::vector<TreeRecord> records = NthRecords(kCatalogFileId, 20, 24);
+    TreeImage image = BuildTree(shape, records);
+    NodeImage left;
+    left.fLink = 2;
+    for (u32 n = 0; n < 9; ++n) {
+        left.records.push_back(Record(records[n].key, records[n].data));
+    }
+    image.SetNode(1, left.Build(512));
+    return image;
+}
+
+// A root with a left sibling: the record alone goes there, and no separator above a root is asked
+// for.
+TEST(ChangeOfDamaged, ARootLendsToALeftSiblingThatItShouldNotHave) {
+    TreeImage image = RoomForOneOnTheLeft();
+    image.Patch32(0, kHeadRootNode, 2);
+    image.Patch16(0, kHeadTreeDepth, 1);
+    TreeOnVolume tree(image, 512);
+    ASSERT_EQ(tree.OpenStatus(), kOk);
+    tree.capture.Take();
+    EXPECT_EQ(tree.InsertNth(9, 24), kOk);
+    EXPECT_EQ(tree.capture.Take(), Events{});
+    EXPECT_EQ(tree->findData.path[1].node->nodeNum, 2u);
+    EXPECT_EQ(NumRecords(tree->findData.path[1].node), 10);
+    EXPECT_EQ(tree->header.treeDepth, 1);
+    EXPECT_EQ(tree->header.rootNode, 2u);
+}
+
+// One level by itself, on a path whose parent leads elsewhere: nothing above has to change.
+TEST(ChangeAtPath, ALevelThatKeepsItsFirstKeyNeedsNoParent) {
+    TreeOnVolume tree(RoomForOneOnTheLeft(), 512);
+    ASSERT_EQ(tree.OpenStatus(), kOk);
+    const HostKey first = NthHostKey(kCatalogFileId, 10);
+    bool found = false;
+    ASSERT_EQ(tree->FindEntry(first, first.id, nullptr, &found, nullptr, nullptr, nullptr, nullptr),
+              kOk);
+    tree->findData.path[2].index = 0;
+    tree.capture.Take();
+    const HostKey key = NthHostKey(kCatalogFileId, 9);
+    const Bytes data = Pattern(24, 9);
+    InsertKey entry = {};
+    entry.convert = &tree->convert;
+    entry.key = key;
+    entry.keyLength = GetHost16(key.bytes);
+    entry.data = data.data();
+    entry.dataSize = 24;
+    HfsNode* leaf = tree->findData.path[1].node;
+    EXPECT_EQ(tree->InsertLevel(&tree->findData, &entry, nullptr, leaf, 0, 1), kOk);
+    EXPECT_EQ(tree.capture.Take(), Events{});
+    EXPECT_EQ(leaf->nodeNum, 2u);
+    EXPECT_EQ(NumRecords(leaf), 10);
 }
 
 // A null path is the tree's own, for the steps of an operation too.

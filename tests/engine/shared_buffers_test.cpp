@@ -36,10 +36,50 @@ struct SharedCache {
     static constexpr HfsCacheOps kCache = {Release, Modify, Modify};
 };
 
+class OnSharedCache {
+public:
+    explicit OnSharedCache(SharedCache* cache) {
+        volume_.LoadFile(kCatalogFileId, cache->file);
+        volume_.fs.service = {&SharedCache::kVolume, cache};
+        volume_.fs.cache.ops = &SharedCache::kCache;
+    }
+    ~OnSharedCache() { capture_.Take(); }
+    MemVolume* Get() { return &volume_; }
+
+private:
+    HeapGuard heap_;
+    MemVolume volume_;
+    Capture capture_;
+};
+
 constexpr u32 kSize = 1536;  // three blocks, but the nodes follow one another by 512 bytes
 
 Bytes Separator(u32 parent, const std::u16string& name, u32 child) {
     return Record(DiskCatKey(parent, name), child);
+}
+
+// Node 0 of a tree whose nodes up to `used` are in use.
+void PutHeader(Bytes* file, u16 depth, u32 root, u32 leaf, u32 used) {
+    u8* head = file->data();
+    head[kDescKind] = kBTHeaderNode;
+    PutBe16(head + kDescNumRecords, 3);
+    PutBe16(head + kHeadTreeDepth, depth);
+    PutBe32(head + kHeadRootNode, root);
+    PutBe32(head + kHeadLeafRecords, 40);
+    PutBe32(head + kHeadFirstLeafNode, leaf);
+    PutBe32(head + kHeadLastLeafNode, leaf);
+    PutBe16(head + kHeadNodeSize, kSize);
+    PutBe16(head + kHeadMaxKeyLength, kCatMaxKeyLength);
+    PutBe32(head + kHeadTotalNodes, 30);
+    PutBe32(head + kHeadFreeNodes, 10);
+    PutBe32(head + kHeadAttributes, kBTBigKeysMask | kBTVariableIndexKeysMask);
+    PutBe16(head + kSize - 2, 14);
+    PutBe16(head + kSize - 4, 120);
+    PutBe16(head + kSize - 6, 248);
+    PutBe16(head + kSize - 8, kSize - 8);
+    for (u32 node = 0; node <= used; ++node) {
+        head[248 + node / 8] = static_cast<u8>(head[248 + node / 8] | 0x80u >> node % 8);
+    }
 }
 
 // A leaf (node 9) whose parent (6) is full, and whose first key lies in a block that it shares with
@@ -84,25 +124,43 @@ Bytes TreeFile() {
     PutBe16(leaf + kSize - 2, 912);
     PutBe16(leaf + kSize - 4, 912 + static_cast<u32>(record.size()));
 
-    u8* head = file.data();
-    head[kDescKind] = kBTHeaderNode;
-    PutBe16(head + kDescNumRecords, 3);
-    PutBe16(head + kHeadTreeDepth, 3);
-    PutBe32(head + kHeadRootNode, 3);
-    PutBe32(head + kHeadLeafRecords, 40);
-    PutBe32(head + kHeadFirstLeafNode, 9);
-    PutBe32(head + kHeadLastLeafNode, 9);
-    PutBe16(head + kHeadNodeSize, kSize);
-    PutBe16(head + kHeadMaxKeyLength, kCatMaxKeyLength);
-    PutBe32(head + kHeadTotalNodes, 30);
-    PutBe32(head + kHeadFreeNodes, 10);
-    PutBe32(head + kHeadAttributes, kBTBigKeysMask | kBTVariableIndexKeysMask);
-    PutBe16(head + kSize - 2, 14);
-    PutBe16(head + kSize - 4, 120);
-    PutBe16(head + kSize - 6, 248);
-    PutBe16(head + kSize - 8, kSize - 8);
-
+    PutHeader(&file, 3, 3, 9, 12);
     return file;
+}
+
+// A full leaf (node 6) below a root (3), with nothing between them in the file.
+TEST(SharedBuffers, SeparatorsOfBothHalvesAreCopied) {
+    SharedCache cache;
+    cache.file.resize(32 * 512);
+    const auto put = [&](u32 number, const Bytes& node) {
+        std::copy(node.begin(), node.end(), cache.file.begin() + number * 512);
+    };
+    NodeImage root;
+    root.kind = kBTIndexNode;
+    root.height = 2;
+    root.records = {Separator(20, u"a", 6)};
+    put(3, root.Build(kSize));
+    NodeImage leaf;
+    for (const u32 parent : {20u, 30u, 40u}) {
+        leaf.records.push_back(Record(DiskCatKey(parent, u"a"), Pattern(480, parent)));
+    }
+    put(6, leaf.Build(kSize));
+    PutHeader(&cache.file, 2, 3, 6, 11);
+
+    OnSharedCache volume(&cache);
+    TestTree tree(volume.Get(), kCatalogFileId);
+    ASSERT_EQ((*tree).Init(), kOk);
+    const Bytes data = Pattern(480, 10);
+    const auto key = [](u32 parent) { return HostCatKey(parent, u"a"); };
+    ASSERT_EQ((*tree).InsertRecord(key(10), 10, data.data(), 480), kOk);
+    EXPECT_EQ((*tree).header.lastLeafNode, 12u);
+    for (const u32 parent : {10u, 20u, 30u, 40u}) {
+        u8 record[480];
+        unsigned size = 0;
+        EXPECT_EQ((*tree).FindRecord(key(parent), parent, record, 480, &size, nullptr), kOk);
+        EXPECT_EQ(Bytes(record, record + size), Pattern(480, parent));
+    }
+    (*tree).findData.ClearPath();
 }
 
 // The leaf's separator follows its new first key. While the parent makes room for it, the records
@@ -110,21 +168,14 @@ Bytes TreeFile() {
 TEST(SharedBuffers, SeparatorThatLiesInTheSiblingOfItsParent) {
     SharedCache cache;
     cache.file = TreeFile();
-    HeapGuard heap;
-    MemVolume volume;
-    Capture capture;
-    volume.LoadFile(kCatalogFileId, cache.file);
-    volume.fs.service = {&SharedCache::kVolume, &cache};
-    volume.fs.cache.ops = &SharedCache::kCache;
-    TestTree tree(&volume, kCatalogFileId);
+    OnSharedCache volume(&cache);
+    TestTree tree(volume.Get(), kCatalogFileId);
     ASSERT_EQ((*tree).Init(), kOk);
-    capture.Take();
     const HostKey key = HostCatKey(140, std::u16string(40, u'b'));
     const Bytes data = Pattern(4, 2);
     const int status = (*tree).InsertRecord(key, key.id, data.data(), 4);
     EXPECT_EQ(status, kOk);
     (*tree).findData.ClearPath();
-    capture.Take();
 }
 
 }  // namespace
