@@ -35,7 +35,7 @@ ssize_t FailingWrite(int handle, const void* source, std::size_t bytes, off_t of
 class HostFiles : public testing::Test {
 protected:
     void SetUp() override {
-        folder_ = testing::TempDir() + "treehfs_host_files";
+        folder_ = testing::TempDir() + "treehfs_host_files_" + std::to_string(getpid());
         std::filesystem::remove_all(folder_);
         std::filesystem::create_directories(folder_);
         path_ = folder_ + "/disk.img";

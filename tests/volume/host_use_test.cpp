@@ -3,6 +3,7 @@
 
 #include <gtest/gtest.h>
 #include <sys/sysmacros.h>
+#include <unistd.h>
 
 #include <filesystem>
 #include <fstream>
@@ -13,7 +14,7 @@ namespace {
 class HostUse : public testing::Test {
 protected:
     void SetUp() override {
-        folder_ = testing::TempDir() + "treehfs_host_use";
+        folder_ = testing::TempDir() + "treehfs_host_use_" + std::to_string(getpid());
         std::filesystem::remove_all(folder_);
         std::filesystem::create_directories(folder_ + "/blocks");
         tables_ = {folder_ + "/mounts", folder_ + "/blocks"};
