@@ -7,15 +7,17 @@
 #include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/path_check.h"
 #include "hfs/treehfs/report.h"
+#include "hfs/treehfs/scratch.h"
 
 namespace VELK {
 
 namespace {
 
-// Whether a name of so many units as the key says ends where the key does, or before.
-bool HoldsName(const u8* key, u32 fixed, u32 nameLengthAt) {
+// Whether the name, if such keys have one, ends where the key says it does, or before.
+bool HoldsName(const u8* key, const KeyShape& shape) {
     const u32 length = GetHost16(key);
-    return length >= fixed && fixed + 2 * GetHost16(key + nameLengthAt) <= length;
+    return length >= shape.fixed &&
+           (shape.nameLength == 0 || shape.fixed + 2 * GetHost16(key + shape.nameLength) <= length);
 }
 
 // Whether no search that meets the record will find anything to say of it, there and as a
@@ -32,16 +34,9 @@ bool IsOrdinary(const CBTreeHfs* tree, const void* key, u32 id, u32 dataSize) {
     if (length > kMaxKeyLength || dataSize > hdr.blockSize || !isIndexSize) {
         return false;
     }
-    if (tree->compareKeys == CompareCatKeysCaseIns || tree->compareKeys == CompareCatKeysCaseBin) {
-        return HoldsName(bytes, kCatKeyFixed, kCatKeyNameLength) &&
-               GetHost32(bytes + kCatKeyParentId) == id;
-    }
-    if (tree->compareKeys == CompareAttrKeys) {
-        return HoldsName(bytes, kAttrKeyFixed, kAttrKeyNameLength) &&
-               GetHost32(bytes + kAttrKeyFileId) == id;
-    }
-    return tree->compareKeys == CompareExtentKeysPlus && length >= kExtKeyFixed &&
-           GetHost32(bytes + kExtKeyFileId) == id;
+    KeyShape shape;
+    return ShapeOf(tree->compareKeys, &shape) && HoldsName(bytes, shape) &&
+           GetHost32(bytes + shape.id) == id;
 }
 
 // Makes the first leaf, which is also the root, of a record. A failure leaves the leaf allocated.

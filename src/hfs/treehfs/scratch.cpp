@@ -10,11 +10,11 @@ namespace VELK {
 
 bool ShapeOf(CompareKeysFn compare, KeyShape* shape) {
     if (compare == CompareCatKeysCaseIns || compare == CompareCatKeysCaseBin) {
-        *shape = {kCatKeyFixed, kCatKeyNameLength};
+        *shape = {kCatKeyFixed, kCatKeyParentId, kCatKeyNameLength};
     } else if (compare == CompareExtentKeysPlus) {
-        *shape = {kExtKeyFixed, 0};
+        *shape = {kExtKeyFixed, kExtKeyFileId, 0};
     } else if (compare == CompareAttrKeys) {
-        *shape = {kAttrKeyFixed, kAttrKeyNameLength};
+        *shape = {kAttrKeyFixed, kAttrKeyFileId, kAttrKeyNameLength};
     } else {
         return false;
     }

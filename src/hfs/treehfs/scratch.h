@@ -20,9 +20,11 @@ int CopyKey(CBTreeHfs* tree, const HfsNode* node, const NodeKey& record, const B
 // when there is no scratch buffer, kErrCorrupt (unreported) when the key does not fit it.
 int GatherKey(CBTreeHfs* tree, const HfsNode* node, const NodeKey& record, const BTreeKey** key);
 
-// Fixed part of the keys a comparator reads, and where their name length stands (0: no name).
+// Fixed part of the keys a comparator reads, and where their ID and their name length stand (0: no
+// name).
 struct KeyShape {
     u32 fixed;
+    u32 id;
     u32 nameLength;
 };
 
