@@ -8,9 +8,10 @@
 #include "fuzz.h"
 #include "hfs/check/check.h"
 #include "hfs/volume/image_volume.h"
+#include "hfs/volume/journal_format.h"
 #include "keys.h"
 #include "metered.h"
-#include "mutate.h"
+#include "mutate_journal.h"
 
 namespace {
 
@@ -119,6 +120,51 @@ void Run(fuzz::Input* input) {
     }
 }
 
+// A field of the header, or of its copy.
+void MutateHeader(fuzz::Mutator* mutator, u8* image, u64 size, const VolumeHeader& header) {
+    u8* at = mutator->OneIn(4) ? image + size - kAltHeaderFromEnd : image + kHeaderOffset;
+    mutator->Field(at, test::FieldsOfVolumeHeader(), kHeaderSize, header.totalBlocks);
+}
+
+// The journal the header leads to, whose checksums fit afterwards, or its info block. False: there
+// is none in the image.
+bool MutateJournalOf(fuzz::Mutator* mutator, u8* image, u64 size, const VolumeHeader& header) {
+    const u64 infoAt = u64{header.journalInfoBlock} * header.blockSize;
+    if ((header.attributes & kVolJournaled) == 0 || infoAt >= size ||
+        size - infoAt < kJournalInfoSize) {
+        return false;
+    }
+    if (mutator->OneIn(8)) {
+        mutator->Field(image + infoAt, test::FieldsOfJournalInfo(), kJournalSector, size);
+        return true;
+    }
+    const JournalInfo place = DecodeJournalInfo(image + infoAt);
+    if (place.size < 2 * kJournalSector || place.offset >= size ||
+        place.size > size - place.offset) {
+        return false;
+    }
+    u8* journal = image + place.offset;
+    const bool isLittle = journal[4] == 0x78;  // the mark of the byte order is 0x12345678
+    fuzz::MutateJournal(mutator, journal, place.size, isLittle);
+    const u32 order = isLittle ? fuzz::kLittleEndian : 0;
+    fuzz::FitChecksums(journal, place.size,
+                       static_cast<u8>(fuzz::kFitHeader | fuzz::kFitLists | order));
+    return true;
+}
+
+// One of the three trees, where its file begins. False: it does not lie in the image.
+bool MutateTree(fuzz::Mutator* mutator, u8* image, u64 size, const VolumeHeader& header) {
+    const u32 fileId = kTrees[mutator->Below(3)];
+    const HfsExtent& extent = header.ForkOf(fileId)->extents[0];
+    const u64 start = u64{extent.startBlock} * header.blockSize;
+    const u64 length = u64{extent.blockCount} * header.blockSize;
+    if (start >= size || length > size - start) {
+        return false;
+    }
+    mutator->TreeFile(image + start, static_cast<std::size_t>(length), fileId);
+    return true;
+}
+
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
@@ -126,7 +172,7 @@ extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
     return 0;
 }
 
-// Fields of the volume's header, or of one of the trees it leads to.
+// The volume's header, its journal, or one of its trees.
 extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::size_t most,
                                                unsigned seed) {
     fuzz::Mutator mutator(seed);
@@ -138,17 +184,14 @@ extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::
         LLVMFuzzerMutate(data, kControl, kControl);
     }
     u8* image = data + kControl;
+    const u64 imageSize = size - kControl;
     VolumeHeader header = {};
     DecodeHeader(image + kHeaderOffset, &header);
-    const u32 fileId = kTrees[mutator.Below(3)];
-    const HfsFork& fork = *header.ForkOf(fileId);
-    const u64 start = u64{fork.extents[0].startBlock} * header.blockSize;
-    const u64 length = u64{fork.extents[0].blockCount} * header.blockSize;
-    const u64 imageSize = size - kControl;
-    if (mutator.OneIn(4) || start >= imageSize || length > imageSize - start) {
-        mutator.Field(image + kHeaderOffset, test::FieldsOfVolumeHeader(), 512, header.totalBlocks);
+    if (mutator.OneIn(8) && MutateJournalOf(&mutator, image, imageSize, header)) {
         return size;
     }
-    mutator.TreeFile(image + start, static_cast<std::size_t>(length), fileId);
+    if (mutator.OneIn(4) || !MutateTree(&mutator, image, imageSize, header)) {
+        MutateHeader(&mutator, image, imageSize, header);
+    }
     return size;
 }

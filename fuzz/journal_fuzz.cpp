@@ -2,64 +2,17 @@
 // carried out; then it is empty, the volume has its shape, and mounting once more changes nothing.
 //
 // Input: which checksums are made to fit, then the bytes of the journal from its header on.
-#include <algorithm>
 #include <cstring>
 
 #include "fuzz.h"
 #include "hfs/volume/image_volume.h"
 #include "hfs/volume/journal_format.h"
-#include "hfs/volume/wire.h"
 #include "journal_base.h"
-#include "mutate.h"
+#include "mutate_journal.h"
 
 namespace {
 
 using namespace VELK;
-
-constexpr u32 kMostLists = 64;
-
-u64 Number(const u8* at, u32 width, bool isLittle) {
-    u64 value = 0;
-    for (u32 i = 0; i < width; ++i) {
-        value = value << 8 | at[isLittle ? width - 1 - i : i];
-    }
-    return value;
-}
-
-void StoreChecksum(u8* at, u32 value, bool isLittle) {
-    for (u32 i = 0; i < 4; ++i) {
-        at[isLittle ? i : 3 - i] = static_cast<u8>(value >> (8 * i));
-    }
-}
-
-// Where the block lists begin that a reader of this journal would meet, one after the other.
-std::vector<u64> ListsOf(const u8* journal, u64 size, bool isLittle) {
-    std::vector<u64> lists;
-    u64 at = Number(journal + 8, 8, isLittle);
-    while (lists.size() < kMostLists && at < size && size - at >= 32) {
-        lists.push_back(at);
-        const u64 used = Number(journal + at + 4, 4, isLittle);
-        if (used == 0) {
-            break;
-        }
-        at += used;
-    }
-    return lists;
-}
-
-// Makes the checksums of the header, and of the lists behind each other, fit.
-void FixChecksums(test::Bytes* image, const fuzz::JournalBase& base, u8 how) {
-    u8* journal = image->data() + base.journalOffset;
-    const bool isLittle = (how & 4) != 0;
-    if ((how & 2) != 0) {
-        for (const u64 list : ListsOf(journal, base.journalSize, isLittle)) {
-            StoreChecksum(journal + list + 8, JournalChecksum(journal + list, 32, 8), isLittle);
-        }
-    }
-    if ((how & 1) != 0) {
-        StoreChecksum(journal + 36, JournalChecksum(journal, kJournalHeaderSize, 36), isLittle);
-    }
-}
 
 test::Bytes BytesOf(BlockDevice* device) {
     test::Bytes bytes(static_cast<std::size_t>(device->Size()));
@@ -84,7 +37,7 @@ void Run(fuzz::Input* input) {
     if (!bytes.empty()) {
         std::memcpy(image.data() + base.journalOffset, bytes.data(), bytes.size());
     }
-    FixChecksums(&image, base, how);
+    fuzz::FitChecksums(image.data() + base.journalOffset, base.journalSize, how);
     MemoryDevice device(image.size());
     FUZZ_CHECK(device.Write(0, image.data(), image.size()).Ok());
     Problem problem;
@@ -113,7 +66,7 @@ extern "C" int LLVMFuzzerTestOneInput(const u8* data, std::size_t size) {
     return 0;
 }
 
-// Fields of the header or of one list; their checksums are made to fit by the first byte.
+// The first byte has the checksums made to fit when the input runs.
 extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::size_t most,
                                                unsigned seed) {
     fuzz::Mutator mutator(seed);
@@ -121,17 +74,8 @@ extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::
     if (size < kControl + 2 * kJournalSector || mutator.OneIn(4)) {
         return LLVMFuzzerMutate(data, size, most);
     }
-    u8* journal = data + kControl;
-    const u64 journalSize = size - kControl;
-    data[0] = static_cast<u8>(data[0] | 3);
-    const std::vector<u64> lists = ListsOf(journal, journalSize, (data[0] & 4) != 0);
-    if (lists.empty() || mutator.OneIn(4)) {
-        mutator.Field(journal, test::FieldsOfJournalHeader(), kJournalSector, journalSize);
-        return size;
-    }
-    const u64 list = lists[mutator.Below(static_cast<u32>(lists.size()))];
-    const u32 room = static_cast<u32>((journalSize - list) / 16);
-    const u32 blocks = room > 2 ? std::min(room - 2, 8u) : 0;
-    mutator.Field(journal + list, test::FieldsOfJournalList(blocks), kJournalSector, journalSize);
+    data[0] = static_cast<u8>(data[0] | fuzz::kFitHeader | fuzz::kFitLists);
+    fuzz::MutateJournal(&mutator, data + kControl, size - kControl,
+                        (data[0] & fuzz::kLittleEndian) != 0);
     return size;
 }

@@ -184,6 +184,11 @@ const std::vector<Field>& FieldsOfVolumeHeader() {
     return fields;
 }
 
+const std::vector<Field>& FieldsOfJournalInfo() {
+    static const std::vector<Field> fields = {{0, 4, "flags"}, {36, 8, "offset"}, {44, 8, "size"}};
+    return fields;
+}
+
 const std::vector<Field>& FieldsOfJournalHeader() {
     static const std::vector<Field> fields = {
         {0, 4, "magic"}, {4, 4, "byte order"}, {8, 8, "start"},     {16, 8, "end"},

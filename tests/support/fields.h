@@ -28,7 +28,8 @@ std::vector<Field> FieldsOfNode(const u8* node, u32 nodeSize, u32 fileId);
 std::vector<Field> DataOfNode(const u8* node, u32 nodeSize);
 // The fields of a volume header, from its first byte.
 const std::vector<Field>& FieldsOfVolumeHeader();
-// Those of a journal header and of a block list with `blocks` blocks.
+// Those of a journal's info block and header, and of a block list with `blocks` blocks.
+const std::vector<Field>& FieldsOfJournalInfo();
 const std::vector<Field>& FieldsOfJournalHeader();
 std::vector<Field> FieldsOfJournalList(u32 blocks);
 
