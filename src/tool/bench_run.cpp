@@ -5,7 +5,6 @@
 
 #include <algorithm>
 #include <chrono>
-#include <cstring>
 #include <random>
 
 #include "hfs/records/record_text.h"
@@ -49,7 +48,7 @@ int Find(CBTreeHfs* tree, const SearchKey& key, std::vector<u8>* record) {
 
 BenchTime WalkAll(CBTreeHfs* tree, std::vector<u8>* record) {
     HfsFindData path;
-    const SearchKey least = CatalogSearchKey(0, u"");
+    const SearchKey least = LowestKey(kCatalogFileId, 0);
     u64 count = 0;
     BenchTime time = Timed(1, [&](u64) {
         bool found = false;

@@ -16,15 +16,6 @@ const char* ItemKindName(ItemKind kind);
 // The kind of that name; false: none.
 bool ItemKindByName(const std::string& name, ItemKind* kind);
 
-// A key of the catalog as stored. REQUIRES: a sound key.
-struct CatalogKeyView {
-    const u8* bytes;
-
-    u32 Parent() const { return GetBe32(bytes + kCatKeyParentId); }
-    u32 NameLength() const { return GetBe16(bytes + kCatKeyNameLength); }
-    const u8* Name() const { return bytes + kCatKeyName; }
-};
-
 // A folder or file record as stored; invalid for anything else, or when it is too short. One that
 // is invalid has zeros in all its fields.
 class CatalogItem {

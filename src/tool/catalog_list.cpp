@@ -1,22 +1,13 @@
 // Lists of catalog items.
 #include "tool/catalog_list.h"
 
+#include "hfs/records/key_layout.h"
+#include "hfs/records/thread_view.h"
 #include "hfs/volume/volume_header.h"
 
 namespace VELK::tool {
 
 namespace {
-
-// Whether the record is a folder's thread, with a whole name.
-bool IsFolderThread(const LeafRecord& record) {
-    return record.dataSize >= kThreadFixed && GetBe16(record.data) == kFolderThread &&
-           kThreadFixed + 2 * u64{GetBe16(record.data + 8)} <= record.dataSize;
-}
-
-void EnterFolder(const LeafRecord& record, FolderTable* folders) {
-    folders->EnterThread(CatalogKeyView{record.key}.Parent(), GetBe32(record.data + 4),
-                         record.data + kThreadFixed, GetBe16(record.data + 8));
-}
 
 u64 ListEverything(Session* session, const Invocation& call, const ListScope& scope,
                    const std::function<bool(const ListedItem&)>& visit) {
@@ -30,13 +21,14 @@ u64 ListEverything(Session* session, const Invocation& call, const ListScope& sc
     cursor.SeekFirst();
     while (cursor.Next(&record)) {
         progress.Update(++done);
-        const CatalogKeyView key{record.key};
-        const u32 parent = key.Parent();
+        const KeyView key(kCatalogFileId, record.key);
+        const u32 parent = key.Id();
         if (parent < kRootFolderId) {
             continue;  // the root folder itself
         }
-        if (IsFolderThread(record) && key.NameLength() == 0) {
-            EnterFolder(record, &folders);
+        const ThreadView thread(record.data, record.dataSize);
+        if (thread.IsValid() && thread.IsOfFolder() && key.NameLength() == 0) {
+            folders.EnterThread(parent, thread.Parent(), thread.Name(), thread.NameLength());
             continue;
         }
         const CatalogItem item(record.data, record.dataSize);
@@ -70,25 +62,25 @@ u64 ListFolder(Session* session, const Invocation& call, const ListScope& scope,
     FolderTable::Place place;
     const std::string path = folders.PathOf(scope.folderId, &place);
     LeafRecord record;
-    cursor.Seek(CatalogSearchKey(scope.folderId, u""), nullptr);
+    cursor.Seek(LowestKey(kCatalogFileId, scope.folderId), nullptr);
     Progress progress(call, std::string(call.command.name) + " catalog", "records", 0, 0);
     u64 done = 0;
     while (cursor.Next(&record)) {
         progress.Update(++done);
-        const CatalogKeyView key{record.key};
-        if (key.Parent() != scope.folderId) {
+        const KeyView key(kCatalogFileId, record.key);
+        if (key.Id() != scope.folderId) {
             break;
         }
         const CatalogItem item(record.data, record.dataSize);
         if (!item.IsValid()) {
             continue;
         }
-        const bool isPrivate = IsPrivateFolderName(key.Parent(), key.Name(), key.NameLength());
+        const bool isPrivate = IsPrivateFolderName(key.Id(), key.Name(), key.NameLength());
         if (isPrivate && !scope.all) {
             continue;
         }
-        if (!visit({item, key.Name(), key.NameLength(), key.Parent(), &path, record.node,
-                    record.index, isPrivate, place.isLost})) {
+        if (!visit({item, key.Name(), key.NameLength(), key.Id(), &path, record.node, record.index,
+                    isPrivate, place.isLost})) {
             break;
         }
     }

@@ -7,6 +7,8 @@
 #include <cstring>
 
 #include "hfs/names_text.h"
+#include "hfs/records/key_layout.h"
+#include "hfs/records/thread_view.h"
 #include "tool/errors.h"
 #include "tool/leaf_cursor.h"
 
@@ -15,9 +17,9 @@ namespace VELK::tool {
 namespace {
 
 FoundItem CopyItem(const LeafRecord& record) {
-    const CatalogKeyView key{record.key};
+    const KeyView key(kCatalogFileId, record.key);
     FoundItem item;
-    item.parent = key.Parent();
+    item.parent = key.Id();
     item.name.assign(key.Name(), key.Name() + 2 * std::size_t{key.NameLength()});
     item.data.assign(record.data, record.data + record.dataSize);
     item.node = record.node;
@@ -30,11 +32,11 @@ FoundItem CopyItem(const LeafRecord& record) {
 bool FindByComposedName(Session* session, u32 parent, NameView name, FoundItem* item) {
     const NameUnits wanted = ComposedUnits(name);
     LeafCursor cursor(session, kCatalogFileId, false);
-    cursor.Seek(CatalogSearchKey(parent, u""), nullptr);
+    cursor.Seek(LowestKey(kCatalogFileId, parent), nullptr);
     LeafRecord record;
     while (cursor.Next(&record)) {
-        const CatalogKeyView key{record.key};
-        if (key.Parent() != parent) {
+        const KeyView key(kCatalogFileId, record.key);
+        if (key.Id() != parent) {
             return false;
         }
         if (ComposedUnits(UnitsFromStored(key.Name(), key.NameLength())) == wanted &&
@@ -52,11 +54,12 @@ bool IsAscii(NameView name) {
 
 bool FindChild(Session* session, u32 parent, const std::string& component, FoundItem* item) {
     const NameUnits typed = UnitsFromPath(component);
-    if (typed.size() > 255) {
+    if (typed.size() > kCatalogKeys.longestName) {
         return false;
     }
     const NameUnits decomposed = DecomposedUnits(typed);
-    if (decomposed.size() <= 255 && FindItem(session, CatalogSearchKey(parent, decomposed), item)) {
+    if (decomposed.size() <= kCatalogKeys.longestName &&
+        FindItem(session, CatalogSearchKey(parent, decomposed), item)) {
         return true;
     }
     if (decomposed != typed && FindItem(session, CatalogSearchKey(parent, typed), item)) {
@@ -66,19 +69,6 @@ bool FindChild(Session* session, u32 parent, const std::string& component, Found
 }
 
 }  // namespace
-
-SearchKey CatalogSearchKey(u32 parent, std::u16string_view name) {
-    SearchKey key;
-    const u16 count = static_cast<u16>(std::min<std::size_t>(name.size(), 255));
-    const u16 length = static_cast<u16>(kCatKeyFixed + 2 * count);
-    std::memcpy(key.bytes, &length, sizeof length);
-    std::memcpy(key.bytes + kCatKeyParentId, &parent, sizeof parent);
-    std::memcpy(key.bytes + kCatKeyNameLength, &count, sizeof count);
-    std::memcpy(key.bytes + kCatKeyName, name.data(), 2 * std::size_t{count});
-    key.id = parent;
-    key.size = kKeyLengthSize + length;
-    return key;
-}
 
 bool FindItem(Session* session, const SearchKey& key, FoundItem* item) {
     LeafCursor cursor(session, kCatalogFileId, false);
@@ -93,20 +83,16 @@ bool FindItem(Session* session, const SearchKey& key, FoundItem* item) {
 }
 
 bool FindItemById(Session* session, u32 id, FoundItem* item) {
-    FoundItem thread;
-    if (!FindItem(session, CatalogSearchKey(id, u""), &thread) ||
-        thread.data.size() < kThreadFixed) {
+    FoundItem found;
+    if (!FindItem(session, LowestKey(kCatalogFileId, id), &found)) {
         return false;
     }
-    const u8* data = thread.data.data();
-    const u32 type = GetBe16(data);
-    const u32 count = GetBe16(data + 8);
-    if ((type != kFolderThread && type != kFileThread) || count > 255 ||
-        kThreadFixed + 2 * std::size_t{count} > thread.data.size()) {
+    const ThreadView thread(found.data.data(), static_cast<u32>(found.data.size()));
+    if (!thread.IsValid() || thread.NameLength() > kCatalogKeys.longestName) {
         return false;
     }
-    const NameUnits name = UnitsFromStored(data + kThreadFixed, count);
-    return FindItem(session, CatalogSearchKey(GetBe32(data + 4), name), item) &&
+    const NameUnits name = UnitsFromStored(thread.Name(), thread.NameLength());
+    return FindItem(session, CatalogSearchKey(thread.Parent(), name), item) &&
            item->Item().IsValid();
 }
 
@@ -196,20 +182,18 @@ bool FolderTable::ReadStep(u32 id, Step* step) {
         step->isPrivate = entry->isPrivate;
         return true;
     }
-    FoundItem thread;
-    if (!FindItem(session_, CatalogSearchKey(id, u""), &thread)) {
+    FoundItem found;
+    if (!FindItem(session_, LowestKey(kCatalogFileId, id), &found)) {
         return false;
     }
-    const u8* data = thread.data.data();
-    const std::size_t size = thread.data.size();
-    if (size < kThreadFixed || GetBe16(data) != kFolderThread ||
-        kThreadFixed + 2 * std::size_t{GetBe16(data + 8)} > size) {
+    const ThreadView thread(found.data.data(), static_cast<u32>(found.data.size()));
+    if (!thread.IsValid() || !thread.IsOfFolder()) {
         return false;
     }
-    step->parent = GetBe32(data + 4);
+    step->parent = thread.Parent();
     step->name.clear();
-    AppendName(&step->name, data + kThreadFixed, GetBe16(data + 8), form_);
-    step->isPrivate = IsPrivateFolderName(step->parent, data + kThreadFixed, GetBe16(data + 8));
+    AppendName(&step->name, thread.Name(), thread.NameLength(), form_);
+    step->isPrivate = IsPrivateFolderName(step->parent, thread.Name(), thread.NameLength());
     return true;
 }
 

@@ -30,8 +30,6 @@ struct FoundItem {
     u32 NameLength() const { return static_cast<u32>(name.size() / 2); }
 };
 
-SearchKey CatalogSearchKey(u32 parent, std::u16string_view name);
-
 // The record with exactly this key (by the tree's order). False: absent. Throws ToolError.
 bool FindItem(Session* session, const SearchKey& key, FoundItem* item);
 // The item whose thread is `id`; false: no thread, or it names nothing.

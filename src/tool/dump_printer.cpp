@@ -4,6 +4,7 @@
 #include <algorithm>
 
 #include "hfs/records/json_writer.h"
+#include "hfs/records/key_layout.h"
 #include "hfs/records/key_text.h"
 #include "hfs/records/name_text.h"
 #include "hfs/records/record_fields.h"
@@ -62,22 +63,20 @@ NodeRecord DumpPrinter::Hidden(const NodeRecord& record, bool isLeaf) {
     hidden.key = key_.data();
     hidden.data = data_.data();
     const u32 keyBytes = record.keySize;
-    if (fileId_ == kCatalogFileId && keyBytes >= kCatKeyName) {
-        const u32 own = isLeaf ? RecordId(fileId_, record.data, record.dataSize) : 0;
-        const u32 parent = GetBe32(key_.data() + kCatKeyParentId);
-        const u32 units = GetBe16(key_.data() + kCatKeyNameLength);
-        HideUnits(key_.data() + kCatKeyName, std::min(units, (keyBytes - kCatKeyName) / 2),
-                  own != 0 ? own : parent);
-        const u32 type = record.dataSize >= kThreadFixed ? GetBe16(data_.data()) : 0;
-        if (isLeaf && (type == kFolderThread || type == kFileThread)) {
-            const u32 count = GetBe16(data_.data() + 8);
-            HideUnits(data_.data() + kThreadFixed,
-                      std::min(count, (record.dataSize - kThreadFixed) / 2), parent);
-        }
-    } else if (fileId_ == kAttributesFileId && keyBytes >= kAttrKeyName) {
-        const u32 units = GetBe16(key_.data() + kAttrKeyNameLength);
-        HideUnits(key_.data() + kAttrKeyName, std::min(units, (keyBytes - kAttrKeyName) / 2),
-                  GetBe32(key_.data() + kAttrKeyFileId));
+    const u32 nameAt = kKeyLengthSize + KeyLayoutOf(fileId_).fixed;
+    if (fileId_ == kExtentsFileId || keyBytes < nameAt) {
+        return hidden;
+    }
+    const KeyView key(fileId_, record.key);
+    const u32 own = isLeaf ? RecordId(fileId_, record.data, record.dataSize) : 0;
+    HideUnits(key_.data() + nameAt, std::min(key.NameLength(), (keyBytes - nameAt) / 2),
+              own != 0 ? own : key.Id());
+    const u32 type =
+        fileId_ == kCatalogFileId && record.dataSize >= kThreadFixed ? GetBe16(record.data) : 0;
+    if (isLeaf && (type == kFolderThread || type == kFileThread)) {
+        const u32 count = GetBe16(record.data + 8);
+        HideUnits(data_.data() + kThreadFixed,
+                  std::min(count, (record.dataSize - kThreadFixed) / 2), key.Id());
     }
     return hidden;
 }

@@ -5,6 +5,7 @@
 #include <cstring>
 
 #include "hfs/names_text.h"
+#include "hfs/records/key_layout.h"
 #include "hfs/records/record_view.h"
 #include "hfs/records/text_format.h"
 
@@ -16,28 +17,6 @@ constexpr u32 kForkTotalBlocks = 12;
 constexpr u32 kForkExtents = 16;
 constexpr u32 kTypeWidth = 8;
 constexpr u32 kSizeWidth = 10;
-
-SearchKey ExtentsSearchKey(u32 fileId, u8 forkType, u32 startBlock) {
-    SearchKey key;
-    const u16 length = kExtKeyFixed;
-    std::memcpy(key.bytes, &length, sizeof length);
-    key.bytes[kExtKeyForkType] = forkType;
-    std::memcpy(key.bytes + kExtKeyFileId, &fileId, sizeof fileId);
-    std::memcpy(key.bytes + kExtKeyStartBlock, &startBlock, sizeof startBlock);
-    key.id = fileId;
-    key.size = kExtKeySize;
-    return key;
-}
-
-SearchKey AttributesSearchKey(u32 fileId) {
-    SearchKey key;
-    const u16 length = kAttrKeyFixed;
-    std::memcpy(key.bytes, &length, sizeof length);
-    std::memcpy(key.bytes + kAttrKeyFileId, &fileId, sizeof fileId);
-    key.id = fileId;
-    key.size = kKeyLengthSize + kAttrKeyFixed;
-    return key;
-}
 
 u64 AppendRuns(const u8* extents, std::vector<HfsExtent>* runs) {
     u64 blocks = 0;
@@ -78,7 +57,7 @@ std::vector<HfsExtent> ForkRuns(Session* session, u32 fileId, u8 forkType, const
     cursor.Seek(ExtentsSearchKey(fileId, forkType, static_cast<u32>(blocks)), nullptr);
     LeafRecord record;
     while (blocks < wanted && cursor.Next(&record) && record.dataSize >= kExtentRecordSize &&
-           GetBe32(record.key + kExtKeyFileId) == fileId &&
+           KeyView(kExtentsFileId, record.key).Id() == fileId &&
            record.key[kExtKeyForkType] == forkType) {
         blocks += AppendRuns(record.data, &runs);
     }
@@ -189,12 +168,14 @@ void ItemPrinter::PrintAttributes(const CatalogItem& item) {
         return;
     }
     LeafCursor cursor(session_, kAttributesFileId, false);
-    cursor.Seek(AttributesSearchKey(item.Id()), nullptr);
+    cursor.Seek(LowestKey(kAttributesFileId, item.Id()), nullptr);
     LeafRecord record;
-    while (cursor.Next(&record) && GetBe32(record.key + kAttrKeyFileId) == item.Id()) {
-        const std::string name =
-            NameText(record.key + kAttrKeyName, GetBe16(record.key + kAttrKeyNameLength));
-        out_->Print("    {}  {}\n", name,
+    while (cursor.Next(&record)) {
+        const KeyView key(kAttributesFileId, record.key);
+        if (key.Id() != item.Id()) {
+            break;
+        }
+        out_->Print("    {}  {}\n", NameText(key.Name(), key.NameLength()),
                     EscapedText(RecordSummary(kAttributesFileId, record.data, record.dataSize)));
     }
 }
@@ -242,9 +223,9 @@ void ItemPrinter::PrintJson(const ListedItem& listed) {
         json.Key("attributes");
         json.BeginArray();
         LeafCursor cursor(session_, kAttributesFileId, false);
-        cursor.Seek(AttributesSearchKey(item.Id()), nullptr);
+        cursor.Seek(LowestKey(kAttributesFileId, item.Id()), nullptr);
         LeafRecord record;
-        while (cursor.Next(&record) && GetBe32(record.key + kAttrKeyFileId) == item.Id()) {
+        while (cursor.Next(&record) && KeyView(kAttributesFileId, record.key).Id() == item.Id()) {
             json.BeginObject();
             KeyMembers(kAttributesFileId, record.key, record.keySize, &json);
             RecordMembers(kAttributesFileId, record.data, record.dataSize, &json);

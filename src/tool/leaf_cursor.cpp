@@ -3,8 +3,6 @@
 
 #include <fmt/format.h>
 
-#include <cstring>
-
 #include "hfs/treehfs/bytes.h"
 #include "tool/errors.h"
 
@@ -64,14 +62,7 @@ void LeafCursor::SeekFrom(const std::optional<SearchKey>& from) {
 }
 
 void LeafCursor::SeekFirst() {
-    SearchKey least;
-    if (fileId_ == kExtentsFileId) {
-        least.bytes[0] = kExtKeyFixed;
-    } else {
-        least.bytes[0] = static_cast<u8>(fileId_ == kCatalogFileId ? kCatKeyFixed : kAttrKeyFixed);
-    }
-    least.size = kKeyLengthSize + least.bytes[0];
-    Seek(least, nullptr);
+    Seek(LowestKey(fileId_, 0), nullptr);
 }
 
 void LeafCursor::Seek(const SearchKey& key, bool* found) {

@@ -5,6 +5,8 @@
 #include <cstring>
 
 #include "hfs/names_text.h"
+#include "hfs/records/key_layout.h"
+#include "hfs/records/thread_view.h"
 #include "hfs/volume/volume_header.h"
 #include "tool/catalog_paths.h"
 #include "tool/errors.h"
@@ -31,6 +33,11 @@ bool IsLinkName(const NameUnits& name) {
         }
     }
     return false;
+}
+
+// Whether a thread names an item by a name that a key can hold.
+bool IsNamed(const ThreadView& thread) {
+    return thread.IsValid() && thread.NameLength() <= kCatalogKeys.longestName;
 }
 
 // Clears the bits from `bits` on.
@@ -142,21 +149,18 @@ void MetaDump::AddNames(u32 fileId, const NodeRecord& record, bool isLeaf) {
     if (!SearchKeyFromStored(fileId, record.key, record.keySize, &key)) {
         return;
     }
+    const KeyView view(fileId, record.key);
     if (fileId == kAttributesFileId) {
-        attributeNames_.Add(key.id, record.key + kAttrKeyName,
-                            GetBe16(record.key + kAttrKeyNameLength), false);
+        attributeNames_.Add(key.id, view.Name(), view.NameLength(), false);
         return;
     }
     const auto add = [&](u32 parent, const u8* units, u32 count) {
         catalogNames_.Add(parent, units, count, StaysAsItIs(parent, units, count));
     };
-    add(key.id, record.key + kCatKeyName, GetBe16(record.key + kCatKeyNameLength));
-    const u32 type = isLeaf && record.dataSize >= kThreadFixed ? GetBe16(record.data) : 0;
-    if (type == kFolderThread || type == kFileThread) {
-        const u32 count = GetBe16(record.data + 8);
-        if (count <= NameMask::kLongestName && kThreadFixed + 2 * count <= record.dataSize) {
-            add(GetBe32(record.data + 4), record.data + kThreadFixed, count);
-        }
+    add(key.id, view.Name(), view.NameLength());
+    const ThreadView thread(record.data, record.dataSize);
+    if (isLeaf && IsNamed(thread)) {
+        add(thread.Parent(), thread.Name(), thread.NameLength());
     }
 }
 
@@ -179,20 +183,15 @@ void MetaDump::CollectNames(u32 fileId, const std::vector<bool>& used) {
     }
 }
 
-void MetaDump::CleanThread(u8* data, u32 size) {
-    const u32 count = GetBe16(data + 8);
-    const u32 end = kThreadFixed + 2 * count;
-    if (count > NameMask::kLongestName || end > size) {
-        std::memset(data + kThreadFixed, 0, size - kThreadFixed);
+// Keeps what the kind of record says and takes out the rest: values of attributes, bytes of kinds
+// nobody knows. The name of a thread is masked.
+void MetaDump::CleanData(u32 fileId, u8* data, u32 size) {
+    const ThreadView thread(data, size);
+    if (fileId == kCatalogFileId && IsNamed(thread)) {
+        catalogNames_.Replace(thread.Parent(), data + kThreadFixed, thread.NameLength());
+        std::memset(data + thread.Size(), 0, size - thread.Size());
         return;
     }
-    catalogNames_.Replace(GetBe32(data + 4), data + kThreadFixed, count);
-    std::memset(data + end, 0, size - end);
-}
-
-// Keeps what the kind of record says and takes out the rest: values of attributes, bytes of kinds
-// nobody knows.
-void MetaDump::CleanData(u32 fileId, u8* data, u32 size) {
     const RecordKind* kind = KindOfRecord(fileId, data, size);
     const u32 kept = kind != nullptr ? kind->size : fileId == kCatalogFileId ? 2u : 4u;
     if (kept < size) {
@@ -203,31 +202,19 @@ void MetaDump::CleanData(u32 fileId, u8* data, u32 size) {
 void MetaDump::CleanRecord(u32 fileId, bool isLeaf, const NodeRecord& record, u8* bytes) {
     u8* key = bytes + record.offset;
     u8* data = key + record.size - record.dataSize;
-    u32 keyEnd = kExtKeySize;
-    if (fileId == kCatalogFileId) {
-        const u32 count = GetBe16(key + kCatKeyNameLength);
-        catalogNames_.Replace(GetBe32(key + kCatKeyParentId), key + kCatKeyName, count);
-        keyEnd = kCatKeyName + 2 * count;
-    } else if (fileId == kAttributesFileId) {
-        const u32 count = GetBe16(key + kAttrKeyNameLength);
-        attributeNames_.Replace(GetBe32(key + kAttrKeyFileId), key + kAttrKeyName, count);
-        keyEnd = kAttrKeyName + 2 * count;
+    const KeyView view(fileId, key);
+    const u32 keyEnd = view.Size();
+    if (fileId != kExtentsFileId) {
+        u8* name = key + keyEnd - 2 * view.NameLength();
+        MaskOf(fileId)->Replace(view.Id(), name, view.NameLength());
     }
     if (key + keyEnd < data) {
         std::memset(key + keyEnd, 0, static_cast<std::size_t>(data - key) - keyEnd);
     }
-    if (!isLeaf) {
-        if (record.dataSize > kChildSize) {
-            std::memset(data + kChildSize, 0, record.dataSize - kChildSize);
-        }
-        return;
-    }
-    const u32 type =
-        fileId == kCatalogFileId && record.dataSize >= kThreadFixed ? GetBe16(data) : 0;
-    if (type == kFolderThread || type == kFileThread) {
-        CleanThread(data, record.dataSize);
-    } else {
+    if (isLeaf) {
         CleanData(fileId, data, record.dataSize);
+    } else if (record.dataSize > kChildSize) {
+        std::memset(data + kChildSize, 0, record.dataSize - kChildSize);
     }
 }
 

@@ -34,8 +34,7 @@ private:
     void WriteTree(u32 fileId, const std::vector<bool>& used);
     void CleanNode(u32 fileId, const HeldNode& node, u8* bytes);
     void CleanRecord(u32 fileId, bool isLeaf, const NodeRecord& record, u8* bytes);
-    static void CleanData(u32 fileId, u8* data, u32 size);
-    void CleanThread(u8* data, u32 size);
+    void CleanData(u32 fileId, u8* data, u32 size);
     void WriteFork(u32 fileId, u64 forkOffset, const u8* bytes, u32 size);
     void WriteBitmap();
     void WriteHeaders();

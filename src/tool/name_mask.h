@@ -28,8 +28,6 @@ public:
     // How many names were added, the empty ones of thread records left out.
     u64 Names() const;
 
-    static constexpr u32 kLongestName = 255;
-
 private:
     struct Name {
         u32 group;

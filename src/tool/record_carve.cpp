@@ -3,16 +3,14 @@
 
 #include <algorithm>
 
-#include "hfs/format.h"
-#include "hfs/records/key_text.h"
-#include "hfs/records/record_fields.h"
-#include "hfs/treehfs/bytes.h"
+#include "hfs/records/key_layout.h"
+#include "hfs/records/search_key.h"
+#include "hfs/records/thread_view.h"
 
 namespace VELK::tool {
 
 namespace {
 
-constexpr u32 kMostNameUnits = 255;
 constexpr u32 kSlot = 2;  // bytes of an entry of the offset table
 
 // The key's length counts its fields and nothing else.
@@ -21,18 +19,15 @@ bool IsWholeKey(u32 fileId, const u8* key, u32 keySize) {
     if (!SearchKeyFromStored(fileId, key, keySize, &ignored)) {
         return false;
     }
+    const KeyView view(fileId, key);
+    if (keySize != view.Size() || view.Id() == 0) {
+        return false;
+    }
     if (fileId == kExtentsFileId) {
         const u8 fork = key[kExtKeyForkType];
-        return keySize == kExtKeySize && (fork == kForkData || fork == kForkResource) &&
-               key[kExtKeyForkType + 1] == 0 && GetBe32(key + kExtKeyFileId) != 0;
+        return (fork == kForkData || fork == kForkResource) && key[kExtKeyPad] == 0;
     }
-    if (fileId == kCatalogFileId) {
-        return keySize == kCatKeyName + 2 * GetBe16(key + kCatKeyNameLength) &&
-               GetBe32(key + kCatKeyParentId) != 0;
-    }
-    const u32 units = GetBe16(key + kAttrKeyNameLength);
-    return units != 0 && keySize == kAttrKeyName + 2 * units && GetBe16(key + 2) == 0 &&
-           GetBe32(key + kAttrKeyFileId) != 0;
+    return fileId == kCatalogFileId || (view.NameLength() != 0 && GetBe16(key + kAttrKeyPad) == 0);
 }
 
 // Runs packed from the front, at least one.
@@ -63,15 +58,15 @@ u32 DataSizeOf(u32 fileId, const u8* key, const u8* data, u32 room) {
         const u64 size = kind->type == kInlineAttribute ? (inlineSize + 1) & ~u64{1} : kind->size;
         return size <= room ? static_cast<u32>(size) : 0;
     }
-    const u32 keyUnits = GetBe16(key + kCatKeyNameLength);
+    const u32 keyUnits = KeyView(fileId, key).NameLength();
     if (kind->type == kFolderRecord || kind->type == kFileRecord) {
         return keyUnits != 0 && GetBe32(data + 8) >= 2 ? kind->size : 0;
     }
-    const u32 units = GetBe16(data + 8);
-    const u32 size = kThreadFixed + 2 * units;
-    const bool isThread = keyUnits == 0 && units != 0 && units <= kMostNameUnits &&
-                          GetBe16(data + 2) == 0 && GetBe32(data + 4) != 0;
-    return isThread && size <= room ? size : 0;
+    const ThreadView thread(data, room);
+    const bool isWhole = thread.IsValid() && keyUnits == 0 && thread.NameLength() != 0 &&
+                         thread.NameLength() <= kCatalogKeys.longestName &&
+                         GetBe16(data + 2) == 0 && thread.Parent() != 0;
+    return isWhole ? thread.Size() : 0;
 }
 
 }  // namespace

@@ -3,8 +3,9 @@
 
 #include <algorithm>
 
-#include "hfs/records/key_text.h"
+#include "hfs/records/key_layout.h"
 #include "hfs/records/record_view.h"
+#include "hfs/records/search_key.h"
 #include "hfs/records/text_format.h"
 #include "tool/errors.h"
 #include "tool/options.h"
@@ -152,8 +153,7 @@ bool RecordFilter::NumberOf(const Condition& condition, const NodeRecord& record
         return true;
     }
     if (hasKey && fileId_ != kCatalogFileId && (field == "file" || field == "block")) {
-        const u32 at = fileId_ == kExtentsFileId ? kExtKeyStartBlock : kAttrKeyStartBlock;
-        *value = field == "file" ? key.id : GetBe32(record.key + at);
+        *value = field == "file" ? key.id : KeyView(fileId_, record.key).StartBlock();
         return true;
     }
     const RecordKind* kind = isLeaf ? KindOfRecord(fileId_, record.data, record.dataSize) : nullptr;
@@ -179,11 +179,8 @@ bool RecordFilter::Holds(const Condition& condition, const NodeRecord& record, b
             const bool isData = record.key[kExtKeyForkType] == kForkData;
             return (condition.text == (isData ? "data" : "rsrc")) == wantsEqual;
         }
-        const bool isCatalog = fileId_ == kCatalogFileId;
-        const u8* name = record.key + (isCatalog ? kCatKeyName : kAttrKeyName);
-        const u32 length =
-            GetBe16(record.key + (isCatalog ? kCatKeyNameLength : kAttrKeyNameLength));
-        return condition.globs[0].Matches(name, length) == wantsEqual;
+        const KeyView view(fileId_, record.key);
+        return condition.globs[0].Matches(view.Name(), view.NameLength()) == wantsEqual;
     }
     u64 value = 0;
     if (!NumberOf(condition, record, isLeaf, &value)) {

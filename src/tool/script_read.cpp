@@ -17,19 +17,13 @@ std::string AtField(const HfsFindData& path) {
                                 : fmt::format(" at={}/{}", leaf.node->nodeNum, leaf.index);
 }
 
-// A key below every key of any tree, and one above.
-SearchKey LeastKey(u32 fileId) {
-    SearchKey key;
-    ParseKey(fileId == kExtentsFileId ? "0:data:0" : "0:\"\"", fileId, &key);
-    return key;
-}
+// A key above every key of any tree.
 SearchKey GreatestKey(u32 fileId) {
-    SearchKey key;
-    ParseKey(fileId == kExtentsFileId      ? "4294967295:rsrc:4294967295"
-             : fileId == kAttributesFileId ? "4294967295:\"\\uffff\\uffff\":4294967295"
-                                           : "4294967295:\"\\uffff\\uffff\"",
-             fileId, &key);
-    return key;
+    constexpr u32 kMost = 0xFFFFFFFF;
+    constexpr NameView kName = u"\uffff\uffff";
+    return fileId == kExtentsFileId      ? ExtentsSearchKey(kMost, kForkResource, kMost)
+           : fileId == kAttributesFileId ? AttributesSearchKey(kMost, kName, kMost)
+                                         : CatalogSearchKey(kMost, kName);
 }
 
 }  // namespace
@@ -111,7 +105,7 @@ ScriptRunner::Outcome ScriptRunner::Seek(const std::string_view* words) {
     if (isLast) {
         key = GreatestKey(fileId_);
     } else if (words[0] == "first") {
-        key = LeastKey(fileId_);
+        key = LowestKey(fileId_, 0);
     } else {
         outcome.status = TakeKey(words[0], &key);
     }
@@ -180,7 +174,7 @@ ScriptRunner::Outcome ScriptRunner::Walk(const std::string_view* words, u32 coun
     HfsFindData& path = tree->findData;
     Outcome outcome;
     if (!path.valid || path.level != 1 || path.path[1].node == nullptr) {
-        const SearchKey key = LeastKey(fileId_);
+        const SearchKey key = LowestKey(fileId_, 0);
         bool found = false;
         outcome.status =
             tree->FindEntry(key.Key(), key.id, &path, &found, nullptr, nullptr, nullptr, nullptr);

@@ -4,7 +4,9 @@
 #include <algorithm>
 
 #include "hfs/records/json_writer.h"
+#include "hfs/records/key_layout.h"
 #include "hfs/records/record_fields.h"
+#include "hfs/records/thread_view.h"
 #include "hfs/treehfs/bytes.h"
 #include "tool/command.h"
 #include "tool/errors.h"
@@ -58,21 +60,13 @@ bool NeedsRoom(ScriptOp op) {
 }
 
 // The key of the item that a stored thread record names.
-bool KeyOfThread(const std::vector<u8>& thread, SearchKey* key) {
-    const RecordKind* kind =
-        KindOfRecord(kCatalogFileId, thread.data(), static_cast<u32>(thread.size()));
-    if (kind == nullptr || kind->size != kThreadFixed) {
+bool KeyOfThread(const std::vector<u8>& stored, SearchKey* key) {
+    const ThreadView thread(stored.data(), static_cast<u32>(stored.size()));
+    if (!thread.IsValid() || thread.NameLength() > kCatalogKeys.longestName) {
         return false;
     }
-    const u32 nameBytes = 2u * GetBe16(thread.data() + 8);
-    if (kThreadFixed + nameBytes > thread.size()) {
-        return false;
-    }
-    std::vector<u8> stored(kCatKeyName + nameBytes);
-    PutBe16(stored.data(), kCatKeyFixed + nameBytes);
-    std::copy_n(thread.data() + 4, 4, stored.data() + kCatKeyParentId);
-    std::copy_n(thread.data() + 8, 2 + nameBytes, stored.data() + kCatKeyNameLength);
-    return SearchKeyFromStored(kCatalogFileId, stored.data(), static_cast<u32>(stored.size()), key);
+    *key = CatalogSearchKey(thread.Parent(), UnitsFromStored(thread.Name(), thread.NameLength()));
+    return true;
 }
 
 void FieldsToJson(const std::string& fields, JsonWriter* json) {
@@ -160,7 +154,7 @@ int ScriptRunner::TakeKey(std::string_view word, SearchKey* key) {
         return ParseKey(word, fileId_, key) ? kErrInvalid : kOk;
     }
     CBTreeHfs* tree = Tree();
-    ParseKey(std::to_string(id) + ":\"\"", kCatalogFileId, key);
+    *key = LowestKey(kCatalogFileId, id);
     HfsFindData path;
     unsigned size = 0;
     const int status = tree->FindRecord(key->Key(), key->id, record_.data(),

@@ -5,23 +5,12 @@
 
 #include <string>
 #include <string_view>
-#include <vector>
 
-#include "hfs/format.h"
 #include "hfs/records/quoted.h"
+#include "hfs/records/search_key.h"
 #include "hfs/volume/problem.h"
 
 namespace VELK {
-
-// A key as the engine's operations take it: host order, length field first.
-struct SearchKey {
-    alignas(8) u8 bytes[kKeyLengthSize + kMaxKeyLength + 6] = {};  // the key, and slack behind it
-    u32 id = 0;    // parent or file ID, which the operations want besides
-    u32 size = 0;  // bytes, length field included
-
-    // The key as the engine takes it.
-    const BTreeKey* Key() const { return reinterpret_cast<const BTreeKey*>(bytes); }
-};
 
 // Reads a key of tree `fileId`. The problem says what is wrong with `text`; its advice for a key of
 // another tree is "add -t TREE". `id:N` is not known here.
@@ -33,13 +22,5 @@ bool ParseIdKey(std::string_view text, u32* id);
 // The readable form of a key as stored in a node, or its hex: form when the readable one would not
 // say it all. Reads no byte beyond `size`.
 std::string KeyText(u32 fileId, const u8* stored, u32 size, Blanks blanks);
-
-// Between the two forms. The first fails for bytes that are no key the tree could hold: they are
-// too short for the fields of its kind, too long for any, or disagree with their length field.
-bool SearchKeyFromStored(u32 fileId, const u8* stored, u32 size, SearchKey* key);
-// The stored form, length field included.
-std::vector<u8> StoredKey(u32 fileId, const SearchKey& key);
-// A key as iteration delivers it: in host order, save in the extents tree.
-std::vector<u8> StoredFromDelivered(u32 fileId, const u8* delivered, u32 size);
 
 }  // namespace VELK

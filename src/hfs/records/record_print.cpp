@@ -2,6 +2,7 @@
 #include "hfs/records/record_fields.h"
 #include "hfs/records/record_text.h"
 #include "hfs/records/text_format.h"
+#include "hfs/records/thread_view.h"
 #include "hfs/treehfs/bytes.h"
 
 namespace VELK {
@@ -89,13 +90,13 @@ std::string Readable(const RecordKind& kind, const u8* stored, u32 size, Blanks 
         }
     }
     if (kind.size == kThreadFixed) {
-        const u32 units = GetBe16(stored + 8);
-        if (kThreadFixed + 2 * units > size) {
+        const ThreadView thread(stored, size);
+        if (!thread.IsValid()) {
             return "";
         }
-        text +=
-            std::string(text.back() == '{' ? "" : ",") + "name:" +
-            QuotedUnits(UnitsFromStored(stored + kThreadFixed, units), Typed::kDecomposed, blanks);
+        text += std::string(text.back() == '{' ? "" : ",") + "name:" +
+                QuotedUnits(UnitsFromStored(thread.Name(), thread.NameLength()), Typed::kDecomposed,
+                            blanks);
     }
     return text + "}";
 }

@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <memory>
 
+#include "hfs/records/key_layout.h"
 #include "hfs/records/key_text.h"
 #include "hfs/records/nearest_word.h"
 #include "hfs/records/record_fields.h"
@@ -12,8 +13,6 @@
 
 namespace VELK {
 namespace {
-
-constexpr u32 kMostThreadUnits = 255;
 
 Problem DataProblem(std::string_view text, const std::string& what) {
     const std::string shown =
@@ -314,9 +313,9 @@ private:
             }
             units = DecomposedUnits(units);
         }
-        if (units.size() > kMostThreadUnits) {
+        if (units.size() > kCatalogKeys.longestName) {
             return Fault("the name has " + std::to_string(units.size()) +
-                         " units, the longest has 255");
+                         " units, the longest has " + std::to_string(kCatalogKeys.longestName));
         }
         PutBe16(record_.data() + 8, static_cast<u32>(units.size()));
         threadName_.clear();

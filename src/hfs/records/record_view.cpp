@@ -1,10 +1,12 @@
 // Summaries and JSON of records, from the field tables.
 #include "hfs/records/record_view.h"
 
+#include "hfs/records/key_layout.h"
 #include "hfs/records/key_text.h"
 #include "hfs/records/record_fields.h"
 #include "hfs/records/record_text.h"
 #include "hfs/records/text_format.h"
+#include "hfs/records/thread_view.h"
 #include "hfs/treehfs/bytes.h"
 
 namespace VELK {
@@ -49,13 +51,14 @@ std::string ForkDetails(const RecordKind& kind, const u8* stored, const char* se
 
 // The item a thread names, as a key.
 std::string ThreadTarget(const u8* stored, u32 size) {
-    const u32 units = GetBe16(stored + 8);
-    if (kThreadFixed + 2 * units > size) {
-        return std::to_string(GetBe32(stored + 4)) + ": name of " + std::to_string(units) +
-               " units in " + std::to_string(size) + " bytes";
+    const ThreadView thread(stored, size);
+    const std::string parent = std::to_string(thread.Parent());
+    if (!thread.IsValid()) {
+        return parent + ": name of " + std::to_string(thread.NameLength()) + " units in " +
+               std::to_string(size) + " bytes";
     }
-    return std::to_string(GetBe32(stored + 4)) + ":" +
-           QuotedUnits(UnitsFromStored(stored + kThreadFixed, units), Typed::kDecomposed,
+    return parent + ":" +
+           QuotedUnits(UnitsFromStored(thread.Name(), thread.NameLength()), Typed::kDecomposed,
                        Blanks::kPlain);
 }
 
@@ -221,11 +224,9 @@ void RecordMembers(u32 fileId, const u8* stored, u32 size, JsonWriter* json) {
         const Field* field = kind->fields + i;
         FieldMember(stored, *field, i == 0 || field == sizeField || field == valenceField, json);
     }
-    if (kind->size == kThreadFixed) {
-        const u32 units = GetBe16(stored + 8);
-        if (kThreadFixed + 2 * units <= size) {
-            UnitsMember("name", stored + kThreadFixed, units, json);
-        }
+    const ThreadView thread(stored, size);
+    if (fileId == kCatalogFileId && thread.IsValid()) {
+        UnitsMember("name", thread.Name(), thread.NameLength(), json);
     }
 }
 
@@ -246,12 +247,11 @@ void KeyMembers(u32 fileId, const u8* stored, u32 size, JsonWriter* json) {
         json->Member("block", GetBe32(stored + kExtKeyStartBlock));
         return;
     }
-    const bool isCatalog = fileId == kCatalogFileId;
-    json->Member(isCatalog ? "parent" : "file", key.id);
-    UnitsMember("name", stored + (isCatalog ? kCatKeyName : kAttrKeyName),
-                GetBe16(stored + (isCatalog ? kCatKeyNameLength : kAttrKeyNameLength)), json);
-    if (!isCatalog && GetBe32(stored + kAttrKeyStartBlock) != 0) {
-        json->Member("block", GetBe32(stored + kAttrKeyStartBlock));
+    json->Member(fileId == kCatalogFileId ? "parent" : "file", key.id);
+    const KeyView view(fileId, stored);
+    UnitsMember("name", view.Name(), view.NameLength(), json);
+    if (view.StartBlock() != 0) {
+        json->Member("block", view.StartBlock());
     }
 }
 

@@ -1,8 +1,6 @@
 // Reading, changing and walking records in their stored form.
 #include "hfs/records/stored_records.h"
 
-#include <cstring>
-
 #include "hfs/treehfs/bytes.h"
 
 namespace VELK {
@@ -69,18 +67,6 @@ int Replace(ImageVolume* volume, CBTreeHfs* tree, const SearchKey& key,
         return back == kOk ? status : back;
     }
     return status;
-}
-
-// A key that sorts before every key of a tree: all its fields are 0.
-SearchKey LowestKey(u32 fileId) {
-    const u32 length = fileId == kCatalogFileId   ? kCatKeyFixed
-                       : fileId == kExtentsFileId ? kExtKeyFixed
-                                                  : kAttrKeyFixed;
-    std::vector<u8> stored(kKeyLengthSize + length);
-    PutBe16(stored.data(), length);
-    SearchKey key;
-    SearchKeyFromStored(fileId, stored.data(), static_cast<u32>(stored.size()), &key);
-    return key;
 }
 
 }  // namespace
@@ -220,7 +206,7 @@ int RecordCursor::Stand() {
     }
     room_.resize(std::size_t{tree_->header.nodeSize} + tree_->convert.minDataBuffer);
     if (!isSought_) {
-        Seek(LowestKey(fileId_));
+        Seek(LowestKey(fileId_, 0));
     }
     bool found = false;
     const int status =
