@@ -1,9 +1,10 @@
 // Completion: fixed words from tables, keys and paths from the tree itself.
 #include "tool/shell_complete.h"
 
-#include "hfs/records/key_text.h"
-#include "hfs/records/record_fields.h"
-#include "hfs/treehfs/bytes.h"
+#include "hfs/records/key_layout.h"
+#include "hfs/records/stored_records.h"
+#include "hfs/volume/volume_header.h"
+#include "tool/catalog_item.h"
 #include "tool/script.h"
 
 namespace VELK::tool {
@@ -34,42 +35,8 @@ bool StartsWithFolding(std::string_view text, std::string_view start) {
     return true;
 }
 
-struct StoredRecord {
-    std::vector<u8> key;
-    std::vector<u8> data;  // as stored
-};
-
-// Calls `take` for the records from `key` on until it returns false.
-template <typename Take>
-void ForRecordsFrom(CBTreeHfs* tree, u32 fileId, const SearchKey& key, Take take) {
-    HfsFindData path;
-    bool found = false;
-    int status =
-        tree->FindEntry(key.Key(), key.id, &path, &found, nullptr, nullptr, nullptr, nullptr);
-    std::vector<u8> record(65536);
-    alignas(8) u8 bytes[kKeyLengthSize + kMaxKeyLength + 6] = {};
-    for (int step = 0; status == kOk; step = 1) {
-        unsigned recordSize = 0;
-        unsigned keySize = 0;
-        status = tree->IncPos(step, record.data(), static_cast<unsigned>(record.size()),
-                              &recordSize, bytes, sizeof bytes, &keySize, &path);
-        if (status != kOk) {
-            break;
-        }
-        StoredRecord stored{StoredFromDelivered(fileId, bytes, keySize),
-                            std::vector<u8>(recordSize)};
-        tree->convert.DataToDisk(stored.data.data(), record.data(), recordSize);
-        if (!take(stored)) {
-            break;
-        }
-    }
-    path.ClearPath();
-}
-
 // A key as a word without quotes where that can be typed, else in its full form.
-std::string KeyWord(u32 fileId, const std::vector<u8>& key) {
-    const std::string text =
-        KeyText(fileId, key.data(), static_cast<u32>(key.size()), Blanks::kPlain);
+std::string KeyWord(const std::string& text) {
     const std::size_t quote = text.find('"');
     const std::size_t end = text.rfind('"');
     if (quote == std::string::npos || end <= quote + 1) {
@@ -81,7 +48,7 @@ std::string KeyWord(u32 fileId, const std::vector<u8>& key) {
 }
 
 // Keys PARENT:NAME or FILE:NAME whose name begins as typed.
-std::vector<std::string> KeyCandidates(CBTreeHfs* tree, u32 fileId, std::string_view word) {
+std::vector<std::string> KeyCandidates(ImageVolume* volume, u32 fileId, std::string_view word) {
     std::vector<std::string> matches;
     const std::size_t colon = word.find(':');
     u64 id = 0;
@@ -90,86 +57,63 @@ std::vector<std::string> KeyCandidates(CBTreeHfs* tree, u32 fileId, std::string_
         return matches;
     }
     const bool isQuoted = word.size() > colon + 1 && word[colon + 1] == '"';
-    SearchKey key;
-    if (ParseKey(std::to_string(id) + ":\"\"", fileId, &key)) {
-        return matches;
-    }
-    ForRecordsFrom(tree, fileId, key, [&](const StoredRecord& record) {
-        SearchKey here;
-        if (!SearchKeyFromStored(fileId, record.key.data(), static_cast<u32>(record.key.size()),
-                                 &here) ||
-            here.id != id) {
-            return false;
-        }
-        const std::string text = isQuoted
-                                     ? KeyText(fileId, record.key.data(),
-                                               static_cast<u32>(record.key.size()), Blanks::kPlain)
-                                     : KeyWord(fileId, record.key);
+    RecordCursor cursor(volume, fileId);
+    cursor.Seek(LowestKey(fileId, static_cast<u32>(id)));
+    StoredRecord record;
+    while (matches.size() < kMostCandidates && cursor.Next(&record) == kOk && record.id == id) {
+        const std::string full = KeyText(fileId, record);
+        const std::string text = isQuoted ? full : KeyWord(full);
         if (StartsWithFolding(text, word)) {
             matches.push_back(text);
         }
-        return matches.size() < kMostCandidates;
-    });
+    }
     return matches;
 }
 
 // The folder a path names; 0 when it names none. Names are compared by the tree.
-u32 FolderOf(CBTreeHfs* catalog, std::string_view path) {
-    u32 folder = 2;
+u32 FolderOf(ImageVolume* volume, std::string_view path) {
+    u32 folder = kRootFolderId;
     for (std::size_t at = 1; at < path.size();) {
         const std::size_t end = std::min(path.find('/', at), path.size());
         NameUnits units;
         if (!VELK::UnitsFromUtf8(path.substr(at, end - at), &units)) {
             return 0;
         }
-        const std::string text = std::to_string(folder) + ":" +
-                                 QuotedUnits(DecomposedUnits(NameUnitsFromPosix(units)),
-                                             Typed::kDecomposed, Blanks::kPlain);
-        SearchKey key;
-        u32 next = 0;
-        if (!ParseKey(text, kCatalogFileId, &key)) {
-            ForRecordsFrom(catalog, kCatalogFileId, key, [&](const StoredRecord& record) {
-                const bool isThere =
-                    catalog->compareKeys(key.Key(), key.id,
-                                         reinterpret_cast<const BTreeKey*>(record.key.data())) == 0;
-                if (isThere && record.data.size() >= kFolderSize &&
-                    GetBe16(record.data.data()) == kFolderRecord) {
-                    next = GetBe32(record.data.data() + 8);
-                }
-                return false;
-            });
-        }
-        if (next == 0) {
+        units = DecomposedUnits(NameUnitsFromPosix(units));
+        StoredRecord record;
+        if (units.size() > kCatalogKeys.longestName ||
+            FindStored(volume, kCatalogFileId, CatalogSearchKey(folder, units), &record) != kOk) {
             return 0;
         }
-        folder = next;
+        const CatalogItem item(record.data.data(), static_cast<u32>(record.data.size()));
+        if (!item.IsValid() || !item.IsFolder()) {
+            return 0;
+        }
+        folder = item.Id();
         at = end + 1;
     }
     return folder;
 }
 
-std::vector<std::string> PathCandidates(CBTreeHfs* catalog, std::string_view word) {
+std::vector<std::string> PathCandidates(ImageVolume* volume, std::string_view word) {
     std::vector<std::string> matches;
     const std::size_t slash = word.rfind('/');
-    const u32 folder = FolderOf(catalog, word.substr(0, slash));
-    SearchKey key;
-    if (folder == 0 || ParseKey(std::to_string(folder) + ":\"\"", kCatalogFileId, &key)) {
+    const u32 folder = FolderOf(volume, word.substr(0, slash));
+    if (folder == 0) {
         return matches;
     }
-    ForRecordsFrom(catalog, kCatalogFileId, key, [&](const StoredRecord& record) {
-        if (record.key.size() < kCatKeyName ||
-            GetBe32(record.key.data() + kCatKeyParentId) != folder) {
-            return false;
-        }
-        const u32 units = static_cast<u32>(record.key.size() - kCatKeyName) / 2;
-        const std::string name = Utf8FromUnits(
-            PosixUnitsFromName(UnitsFromStored(record.key.data() + kCatKeyName, units)));
+    RecordCursor cursor(volume, kCatalogFileId);
+    cursor.Seek(LowestKey(kCatalogFileId, folder));
+    StoredRecord record;
+    while (matches.size() < kMostCandidates && cursor.Next(&record) == kOk && record.id == folder) {
+        const KeyView key(kCatalogFileId, record.key.data());
+        const std::string name =
+            Utf8FromUnits(PosixUnitsFromName(UnitsFromStored(key.Name(), key.NameLength())));
         const std::string path = std::string(word.substr(0, slash + 1)) + name;
-        if (units != 0 && StartsWithFolding(path, word)) {
+        if (key.NameLength() != 0 && StartsWithFolding(path, word)) {
             matches.push_back(path);
         }
-        return matches.size() < kMostCandidates;
-    });
+    }
     return matches;
 }
 
@@ -202,11 +146,9 @@ std::vector<std::string> ShellCandidates(ImageVolume* volume, u32 fileId, std::s
         return Matching(ScriptOpNames(), word);
     }
     if (word.starts_with("/")) {
-        CBTreeHfs* catalog = volume->Tree(kCatalogFileId, nullptr);
-        return catalog == nullptr ? std::vector<std::string>() : PathCandidates(catalog, word);
+        return PathCandidates(volume, word);
     }
-    CBTreeHfs* tree = volume->Tree(fileId, nullptr);
-    return tree == nullptr ? std::vector<std::string>() : KeyCandidates(tree, fileId, word);
+    return KeyCandidates(volume, fileId, word);
 }
 
 }  // namespace VELK::tool
