@@ -1,8 +1,12 @@
-// A whole image of any bytes: checked; found, mounted, its trees opened and walked, changed in an
-// overlay. Whatever it holds there is an answer or a problem in words; the checker asks for no byte
-// that is not there; nothing leaks and everything ends.
+// A whole image of any bytes: checked; found, mounted, asked for everything, its trees opened,
+// walked and changed. Whatever it holds there is an answer or a problem in words; the checker asks
+// for no byte that is not there; nothing leaks and everything ends. No byte changes unless it was
+// mounted for writing; a volume that took changes can be mounted again.
 //
-// Input: how to open it, what to do, then the image.
+// Input: how to open it (bits: 1 changes stay in memory, 2 by the copy of the header, 4 small
+// blocks, 16 and 32 the partition, 64 replay, 128 write), what to do (the pattern of changes; bit
+// 128: write past what stands against it), then the image.
+#include <algorithm>
 #include <cstring>
 
 #include "fuzz.h"
@@ -20,6 +24,8 @@ using namespace VELK;
 constexpr std::size_t kMostBytes = 1u << 20;
 constexpr u32 kSteps = 300;
 constexpr u32 kTrees[] = {kExtentsFileId, kCatalogFileId, kAttributesFileId};
+constexpr u32 kSpecialFiles[] = {kExtentsFileId, kCatalogFileId, kAllocationFileId, kStartupFileId,
+                                 kAttributesFileId};
 
 struct alignas(8) Buffers {
     u8 record[32768];
@@ -83,6 +89,60 @@ void Check(test::Bytes bytes, u8 how) {
     FUZZ_CHECK(summary.stageCount <= kCheckStages);
 }
 
+constexpr u8 kWrite = 128;
+constexpr u8 kForce = 128;
+
+OpenOptions OptionsOf(u8 how, u8 what) {
+    OpenOptions options;
+    options.access = (how & kWrite) != 0 ? Access::kWrite
+                     : (how & 1) != 0    ? Access::kOverlay
+                                         : Access::kReadOnly;
+    options.backupHeader = (how & 2) != 0;
+    options.partition = how >> 4 & 3;
+    options.replay = (how & 0x40) != 0;
+    options.mapBlockSize = (how & 4) != 0 ? 512 : 0;
+    options.cacheBudget = 1u << 14;
+    options.force = (what & kForce) != 0;
+    return options;
+}
+
+std::unique_ptr<ImageVolume> Mount(MemoryDevice* device, const OpenOptions& options) {
+    VolumeScan scan;
+    Problem problem;
+    auto volume = ImageVolume::Open(std::make_unique<SliceDevice>(device, 0, device->Size()),
+                                    options, &scan, &problem);
+    FUZZ_CHECK(volume != nullptr || !problem.Text().empty());
+    return volume;
+}
+
+test::Bytes BytesOf(MemoryDevice* device) {
+    test::Bytes bytes(static_cast<std::size_t>(device->Size()));
+    FUZZ_CHECK(device->Read(0, bytes.data(), bytes.size()).Ok());
+    return bytes;
+}
+
+// What the volume says of itself and of its special files.
+void Ask(ImageVolume* volume) {
+    for (const Problem& note : volume->Notes()) {
+        FUZZ_CHECK(!note.Text().empty());
+    }
+    u64 copyAt = 0;
+    volume->AlternateHeader(&copyAt);
+    u8 bytes[kHeaderSize];
+    volume->ReadVolume(kHeaderOffset, bytes, sizeof bytes);
+    for (const u32 fileId : kSpecialFiles) {
+        const u64 size = volume->ForkBytes(fileId);
+        u64 mapped = 0;
+        for (const HfsExtent& extent : volume->ForkExtents(fileId)) {
+            mapped += u64{extent.blockCount} * volume->Header().blockSize;
+        }
+        FUZZ_CHECK(size <= mapped);
+        const u64 last = size - std::min<u64>(size, sizeof bytes);
+        FUZZ_CHECK(size == 0 || volume->ImageOffset(fileId, size - 1).has_value());
+        volume->ReadFork(fileId, last, bytes, static_cast<u32>(size - last));
+    }
+}
+
 void Run(fuzz::Input* input) {
     const u8 how = input->U8();
     const u8 what = input->U8();
@@ -90,33 +150,32 @@ void Run(fuzz::Input* input) {
     if (!bytes.empty()) {
         Check(bytes, how);
     }
-    auto device = std::make_unique<MemoryDevice>(bytes.size());
-    FUZZ_CHECK(device->Write(0, bytes.data(), bytes.size()).Ok());
-    OpenOptions options;
-    options.access = (how & 1) != 0 ? Access::kOverlay : Access::kReadOnly;
-    options.backupHeader = (how & 2) != 0;
-    options.partition = how >> 4 & 3;
-    options.replay = (how & 0x40) != 0;
-    options.mapBlockSize = (how & 4) != 0 ? 512 : 0;
-    options.cacheBudget = 1u << 14;
-    VolumeScan scan;
-    Problem problem;
-    const std::unique_ptr<ImageVolume> volume =
-        ImageVolume::Open(std::move(device), options, &scan, &problem);
-    FUZZ_CHECK(volume != nullptr || !problem.Text().empty());
+    MemoryDevice device(bytes.size());
+    FUZZ_CHECK(device.Write(0, bytes.data(), bytes.size()).Ok());
+    OpenOptions options = OptionsOf(how, what);
+    std::unique_ptr<ImageVolume> volume = Mount(&device, options);
     if (volume == nullptr) {
         return;
     }
+    Ask(volume.get());
     for (const u32 fileId : kTrees) {
         Problem trouble;
         CBTreeHfs* tree = volume->Tree(fileId, &trouble);
         FUZZ_CHECK(tree != nullptr || !trouble.Text().empty());
         if (tree != nullptr) {
             Walk(volume.get(), test::Metered(tree));
-            if ((how & 1) != 0 && fileId != kExtentsFileId) {
+            if (options.access != Access::kReadOnly && fileId != kExtentsFileId) {
                 Change(volume.get(), test::Metered(tree), what);
             }
         }
+    }
+    volume->Close();
+    volume.reset();
+    if (options.access == Access::kWrite) {
+        options.access = Access::kReadOnly;
+        FUZZ_CHECK(Mount(&device, options) != nullptr);
+    } else {
+        FUZZ_CHECK(BytesOf(&device) == bytes);
     }
 }
 

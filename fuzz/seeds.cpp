@@ -118,6 +118,8 @@ void Operations() {
 void Image(const std::string& name, const Bytes& image) {
     Write("image", name + "-read", {0, 0}, image);
     Write("image", name + "-change", {1, 1}, image);
+    Write("image", name + "-write", {0x80, 1}, image);
+    Write("image", name + "-force", {0x80, 0x81}, image);
     Write("image", name + "-full", {8, 0}, image);
 }
 
@@ -151,6 +153,7 @@ void Images() {
     const fuzz::JournalBase base = fuzz::MakeJournalBase();
     Image("journal", base.image);
     Write("image", "journal-replay", {0x41, 1}, base.image);
+    Write("image", "journal-replay-write", {0xC0, 1}, base.image);
 }
 
 // Header and first transaction; the seed's first byte says which checksums are mended.
