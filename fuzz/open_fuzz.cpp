@@ -1,10 +1,12 @@
-// A whole tree file of any bytes: opened, walked both ways, searched, changed. Nothing may be read
-// or written outside it, every walk ends, nothing leaks, no service is used against its contract,
-// and after a change that failed the restored tree is the one before it.
+// A whole tree file of any bytes: opened, walked both ways, searched, changed, while a call of the
+// volume or the heap may fail. Nothing may be read or written outside it, every walk ends, nothing
+// leaks, no service is used against its contract, and after a change that failed the restored tree
+// is the one before it.
 //
-// Input: tree kind, geometry, what to do (bits: 1 change, 2 keys between those there are, 4 every
-// call there is, as the sweep makes them, 8 grow the file by more nodes than one map node covers),
-// then the tree file.
+// Input: tree kind, geometry and fault, what to do (bits: 1 change, 2 keys between those there are,
+// 4 every call there is, as the sweep makes them, 8 grow the file by more nodes than one map node
+// covers), then the tree file.
+#include "fault_service.h"
 #include "fuzz.h"
 #include "keys.h"
 #include "mem_volume.h"
@@ -86,8 +88,27 @@ bool Change(test::Metered tree, test::MemVolume* volume, u8 pattern) {
         Restore(tree, volume, before);
         return false;
     }
-    tree->Flush(0);
+    if (tree->Flush(0) != kOk) {
+        Restore(tree, volume, before);
+        return false;
+    }
     return true;
+}
+
+// Which call fails: bits 4 to 6 of the geometry with, unless these count a trial's calls, the upper
+// half of the pattern; bit 7 of the geometry: one of the heap, else one of the volume. 0: none.
+void SetFault(test::FaultService* faults, u8 geometry, u8 pattern) {
+    const u32 low = (pattern & 4) != 0 ? 0 : pattern >> 4;
+    const u32 number = (geometry >> 4 & 7u) * 16 + low;
+    const u32 nth = number * (number + 7) / 8;  // 1, 2, 3, 5, ... 2127
+    if (nth == 0) {
+        return;
+    }
+    if ((geometry & 0x80) != 0) {
+        test::HeapGuard::Current()->FailNth(nth);
+    } else {
+        faults->FailAny(nth);
+    }
 }
 
 void Run(fuzz::Input* input) {
@@ -107,6 +128,8 @@ void Run(fuzz::Input* input) {
     }
     test::MemVolume volume(options);
     volume.LoadFile(fileId, file);
+    test::FaultService faults(&volume.fs);
+    SetFault(&faults, geometry, pattern);
     {
         test::TestTree owner(&volume, fileId);
         const test::Metered tree(&owner.tree);
@@ -124,6 +147,10 @@ void Run(fuzz::Input* input) {
         }
     }
     FUZZ_CHECK(volume.Lent() == 0);
+    // A node is emptied for its new owner even when the journal refuses.
+    if (faults.HasFailed() && faults.FailedCall() == test::Call::kWriteAccess) {
+        volume.breaches.clear();
+    }
     for (const std::string& breach : volume.breaches) {
         std::fprintf(stderr, "%s\n", breach.c_str());
     }
@@ -146,6 +173,10 @@ extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::
     }
     if (mutator.OneIn(8)) {
         LLVMFuzzerMutate(data, kControl, kControl);
+    } else if (mutator.OneIn(4)) {
+        for (u8* control : {data + 1, data + 2}) {  // another fault
+            *control = static_cast<u8>((*control & 15) | mutator.Below(16) << 4);
+        }
     }
     mutator.TreeFile(data + kControl, size - kControl, kFiles[data[0] % 3]);
     return size;
