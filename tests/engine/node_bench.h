@@ -76,6 +76,20 @@ private:
     u32 refuseIn_ = 0;
 };
 
+// Nodes of eight blocks. The slots of 300 records of 6 bytes reach over a block end.
+class ManyBlocksTest : public ::testing::Test {
+protected:
+    static std::vector<Bytes> Tiny(u32 count) {
+        std::vector<Bytes> records;
+        for (u32 n = 0; n < count; ++n) {
+            records.push_back({0, 2, static_cast<u8>(n >> 8), static_cast<u8>(n), 0xD0, 0x0D});
+        }
+        return records;
+    }
+
+    NodeBench bench_{Geometry{4096, 512}};
+};
+
 // Numbers of the blocks marked dirty.
 inline std::vector<u32> DirtyBlocks(const LooseNode& node) {
     std::vector<u32> blocks;

@@ -126,18 +126,7 @@ TEST_P(RecordDelete, FirstRefusedAccessIsReported) {
 
 INSTANTIATE_GEOMETRIES(RecordDelete, ChangeGeometries);
 
-class ManyBlocksDelete : public ::testing::Test {
-protected:
-    static std::vector<Bytes> Tiny(u32 count) {
-        std::vector<Bytes> records;
-        for (u32 n = 0; n < count; ++n) {
-            records.push_back({0, 2, static_cast<u8>(n >> 8), static_cast<u8>(n), 0xD0, 0x0D});
-        }
-        return records;
-    }
-
-    NodeBench bench_{Geometry{4096, 512}};
-};
+class ManyBlocksDelete : public ManyBlocksTest {};
 
 TEST_F(ManyBlocksDelete, SlotsShiftInBothBlocks) {
     for (const u32 index : {0u, 1u, 253u, 254u, 255u, 256u, 298u, 299u}) {

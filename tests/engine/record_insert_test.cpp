@@ -408,21 +408,9 @@ std::vector<Geometry> LargeGeometries() {
 }
 INSTANTIATE_GEOMETRIES(StraddlingInsert, LargeGeometries);
 
-// Nodes of eight blocks. The slots of 300 records of 6 bytes reach over a block end.
-class ManyBlocks : public ::testing::Test {
-protected:
-    static std::vector<Bytes> Tiny(u32 count) {
-        std::vector<Bytes> records;
-        for (u32 n = 0; n < count; ++n) {
-            records.push_back({0, 2, static_cast<u8>(n >> 8), static_cast<u8>(n), 0xD0, 0x0D});
-        }
-        return records;
-    }
+class ManyBlocksInsert : public ManyBlocksTest {};
 
-    NodeBench bench_{Geometry{4096, 512}};
-};
-
-TEST_F(ManyBlocks, InsertionShiftsSlotsInBothBlocks) {
+TEST_F(ManyBlocksInsert, InsertionShiftsSlotsInBothBlocks) {
     for (const u32 index : {0u, 1u, 253u, 254u, 255u, 256u, 299u, 300u}) {
         const auto node = bench_.Node(LeafOf(4096, Tiny(300)));
         const Bytes key = {0, 4, 9, 9, 9, 9};
@@ -438,7 +426,7 @@ TEST_F(ManyBlocks, InsertionShiftsSlotsInBothBlocks) {
     EXPECT_TRUE(bench_.capture.All().empty());
 }
 
-TEST_F(ManyBlocks, BlocksWithoutAChangedSlotStayClean) {
+TEST_F(ManyBlocksInsert, BlocksWithoutAChangedSlotStayClean) {
     const auto node = bench_.Node(LeafOf(4096, Tiny(300)));
     NodeKey key{};
     ASSERT_EQ(bench_.tree._InsertRecord(node->Get(), 256, 8, &key, nullptr), kOk);
@@ -446,7 +434,7 @@ TEST_F(ManyBlocks, BlocksWithoutAChangedSlotStayClean) {
     EXPECT_TRUE((*node)->bufs[6].dirty);
 }
 
-TEST_F(ManyBlocks, RefusedAccessToTheNextBlockOfSlotsIsReported) {
+TEST_F(ManyBlocksInsert, RefusedAccessToTheNextBlockOfSlotsIsReported) {
     const auto node = bench_.Node(LeafOf(4096, Tiny(300)));
     bench_.RefuseAccess(6);  // four blocks of records, one of slots, then this one
     NodeKey key{};
@@ -455,7 +443,7 @@ TEST_F(ManyBlocks, RefusedAccessToTheNextBlockOfSlotsIsReported) {
               (Events{Reported(kRefused, kAnySite), Reported(kRefused, 1284)}));
 }
 
-TEST_F(ManyBlocks, RefusedAccessToTheSlotsOrTheDescriptorIsReported) {
+TEST_F(ManyBlocksInsert, RefusedAccessToTheSlotsOrTheDescriptorIsReported) {
     for (const auto& [nth, site] : {std::pair{2u, 1268}, std::pair{3u, 1295}}) {
         const auto node = bench_.Node(LeafOf(4096, SomeRecords(2, 512)));
         bench_.RefuseAccess(nth);
@@ -466,7 +454,7 @@ TEST_F(ManyBlocks, RefusedAccessToTheSlotsOrTheDescriptorIsReported) {
     }
 }
 
-TEST_F(ManyBlocks, NoScratchBufferNoConversion) {
+TEST_F(ManyBlocksInsert, NoScratchBufferNoConversion) {
     const Bytes leaf = LeafOf(4096, SomeRecords(3, 16));
     const auto node = bench_.Node(leaf);
     bench_.heap.FailNth(1);
