@@ -86,6 +86,22 @@ protected:
                       isHinted);
         }
     }
+    // `change` changes table and model alike, in tables filled to every degree, at each index and
+    // behind them all.
+    template <typename Change>
+    void ExpectAtAnyPlace(const Change& change) {
+        for (const u32 count : {1u, 3u, kRoom + 4}) {
+            for (u32 filled = 0; filled <= kRoom; ++filled) {
+                for (u32 index = 0; index <= kRoom + 1; ++index) {
+                    Fill(&parent_, filled);
+                    change(index, count);
+                    parent_.model.resize(kRoom);
+                    Expect(parent_);
+                }
+            }
+        }
+    }
+
     static constexpr u32 kChildren = 40;
     Bench bench_;
     std::vector<std::unique_ptr<LooseNode>> children_;
@@ -94,38 +110,23 @@ protected:
 };
 
 TEST_F(HintTable, RecordsComeInAtAnyPlace) {
-    for (const u32 count : {1u, 3u, kRoom + 4}) {
-        for (u32 filled = 0; filled <= kRoom; ++filled) {
-            for (u32 index = 0; index <= kRoom + 1; ++index) {
-                Fill(&parent_, filled);
-                Table(parent_).Insert(index, count);
-                std::vector<Known>& model = parent_.model;
-                if (index < kRoom) {
-                    model.insert(model.begin() + index, count, Known{});
-                    model.resize(kRoom);
-                }
-                Expect(parent_);
-            }
+    ExpectAtAnyPlace([&](u32 index, u32 count) {
+        Table(parent_).Insert(index, count);
+        std::vector<Known>& model = parent_.model;
+        if (index < kRoom) {
+            model.insert(model.begin() + index, count, Known{});
         }
-    }
+    });
 }
 
 TEST_F(HintTable, RecordsLeaveAnyPlace) {
-    for (const u32 count : {1u, 3u, kRoom + 4}) {
-        for (u32 filled = 0; filled <= kRoom; ++filled) {
-            for (u32 index = 0; index <= kRoom + 1; ++index) {
-                Fill(&parent_, filled);
-                Table(parent_).Remove(index, count);
-                std::vector<Known>& model = parent_.model;
-                if (index < kRoom) {
-                    model.erase(model.begin() + index,
-                                model.begin() + std::min(index + count, kRoom));
-                    model.resize(kRoom);
-                }
-                Expect(parent_);
-            }
+    ExpectAtAnyPlace([&](u32 index, u32 count) {
+        Table(parent_).Remove(index, count);
+        std::vector<Known>& model = parent_.model;
+        if (index < kRoom) {
+            model.erase(model.begin() + index, model.begin() + std::min(index + count, kRoom));
         }
-    }
+    });
 }
 
 TEST_F(HintTable, RecordsGoToAnotherNode) {
@@ -260,6 +261,13 @@ protected:
         bench_.Open(BuildTree(shape, records));
         ASSERT_EQ(bench_->header.treeDepth, 2);
     }
+    // Four leaves of one record each.
+    void OpenFour() { Open({u"B", u"C", u"D", u"E"}, 1); }
+    void FindFour() {
+        for (const char16_t* name : {u"B", u"C", u"D", u"E"}) {
+            ASSERT_EQ(Find(name), kOk);
+        }
+    }
     int Find(const std::u16string& name) {
         return bench_->FindRecord(HostCatKey(7, name), 7, nullptr, 0, nullptr, nullptr);
     }
@@ -308,10 +316,8 @@ TEST_P(RootRemembers, KeysThatDifferInOneUnitAreToldApart) {
 // Somebody who holds the root writes another key and another child into a record, and says nothing.
 // The child tells, and the root is searched as it is now.
 TEST_P(RootRemembers, ARecordExchangedUnannouncedIsSearchedAgain) {
-    Open({u"B", u"C", u"D", u"E"}, 1);
-    for (const char16_t* name : {u"B", u"C", u"D", u"E"}) {
-        ASSERT_EQ(Find(name), kOk);
-    }
+    OpenFour();
+    FindFour();
     ASSERT_EQ(Remembered().Child(1)->nodeNum, 2u);
     NodeKey second;
     ASSERT_EQ(Root()->GetKey(&bench_->header, 1, &second), kOk);
@@ -325,7 +331,7 @@ TEST_P(RootRemembers, ARecordExchangedUnannouncedIsSearchedAgain) {
 
 // A child of no number: no hint leads there.
 TEST_P(RootRemembers, NoChildOfARecordThatLeadsNowhere) {
-    Open({u"B", u"C", u"D", u"E"}, 1);
+    OpenFour();
     ASSERT_EQ(Find(u"E"), kOk);
     ForgetRecords(&bench_.tree.tree, Root());
     NodeKey second;
@@ -344,10 +350,8 @@ TEST_P(RootRemembers, NoChildOfARecordThatLeadsNowhere) {
 
 // Somebody who announces a change finds it searched, whatever was known before.
 TEST_P(RootRemembers, NothingOfARecordAnnouncedAsChanged) {
-    Open({u"B", u"C", u"D", u"E"}, 1);
-    for (const char16_t* name : {u"B", u"C", u"D", u"E"}) {
-        ASSERT_EQ(Find(name), kOk);
-    }
+    OpenFour();
+    FindFour();
     ASSERT_EQ(bench_->SetDirty(Root(), 0), kOk);
     for (u32 n = 0; n < 4; ++n) {
         EXPECT_EQ(Remembered().Order(n), 0u);
@@ -386,7 +390,7 @@ TEST_P(RootRemembers, OnlyTheFirstOfManyRecords) {
 // ---- children that are cached
 
 TEST_P(RootRemembers, WhereItsCachedChildrenLie) {
-    Open({u"B", u"C", u"D", u"E"}, 1);
+    OpenFour();
     ASSERT_EQ(Find(u"C"), kOk);
     const HfsNode* leaf = bench_->findData.path[1].node;
     EXPECT_EQ(Remembered().Child(1), leaf);
@@ -397,7 +401,7 @@ TEST_P(RootRemembers, WhereItsCachedChildrenLie) {
 
 // A leaf that no parent led to is not taken for the root.
 TEST_P(RootRemembers, WhereItLiesItself) {
-    Open({u"B", u"C", u"D", u"E"}, 1);
+    OpenFour();
     ASSERT_EQ(Find(u"C"), kOk);
     HfsFindData path;
     EXPECT_EQ(bench_->ReadLevel(1, 3, &path), kOk);
@@ -406,7 +410,7 @@ TEST_P(RootRemembers, WhereItLiesItself) {
 }
 
 TEST_P(RootRemembers, WhereItLiesWhileAnotherCannotBeRead) {
-    Open({u"B", u"C", u"D", u"E"}, 1);
+    OpenFour();
     ASSERT_EQ(Find(u"C"), kOk);
     const HfsNode* root = Root();
     const u32 rootNode = std::exchange(bench_->header.rootNode, 1u);
@@ -418,7 +422,7 @@ TEST_P(RootRemembers, WhereItLiesWhileAnotherCannotBeRead) {
 }
 
 TEST_P(RootRemembers, NoChildThatLeftTheCache) {
-    Open({u"B", u"C", u"D", u"E"}, 1);
+    OpenFour();
     ASSERT_EQ(Find(u"C"), kOk);
     HfsNode* leaf = bench_->findData.path[1].node;
     ASSERT_EQ(Find(u"D"), kOk);
@@ -431,7 +435,7 @@ TEST_P(RootRemembers, NoChildThatLeftTheCache) {
 
 // A walk along the leaves tells the parent of each that it meets, and only of its own.
 TEST_P(RootRemembers, NeighboursMetOnAWalk) {
-    Open({u"B", u"C", u"D", u"E"}, 1);
+    OpenFour();
     ASSERT_EQ(Find(u"B"), kOk);
     HfsNode* root = Root();
     const Hints hints(&bench_.tree.tree, root);
