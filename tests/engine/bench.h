@@ -29,6 +29,14 @@ struct Bench {
         ASSERT_EQ(tree->Init(), kOk);
         Forget();
     }
+    // A tree of the engine's own: 64 nodes, no records, keys of names in the order of `compare`.
+    void Create(u32 nodeShift, CompareKeysFn compare) {
+        tree->compareKeys = compare;
+        tree->header.maxKeyLength = kCatMaxKeyLength;
+        tree->header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
+        const unsigned long long size = u64{64} << nodeShift;
+        ASSERT_EQ(tree->Create(nodeShift, 0, &size), kOk);
+    }
     void Forget() {
         capture.Take();
         volume.TakeCalls();

@@ -26,11 +26,7 @@ int CompareForeign(const BTreeKey* searchKey, unsigned id, const BTreeKey* nodeK
 class FindInOrder : public ::testing::TestWithParam<Order> {
 protected:
     FindInOrder() : bench_(Blocks(512), GetParam().fileId) {
-        bench_->compareKeys = GetParam().compare;
-        bench_->header.maxKeyLength = kCatMaxKeyLength;
-        bench_->header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
-        const unsigned long long size = 64 * 512;
-        EXPECT_EQ(bench_->Create(9, 0, &size), kOk);
+        bench_.Create(9, GetParam().compare);
         for (u32 n = 0; n < 40; ++n) {
             const HostKey key = Key(n);
             const Bytes data = Pattern(24, n);

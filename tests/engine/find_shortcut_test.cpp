@@ -27,11 +27,7 @@ std::ostream& operator<<(std::ostream& out, const ShortcutShape& shape) {
 class FindShortcut : public ::testing::TestWithParam<ShortcutShape> {
 protected:
     FindShortcut() : bench_(Blocks(512), GetParam().fileId) {
-        bench_->compareKeys = GetParam().compare;
-        bench_->header.maxKeyLength = kMaxKeyLength;
-        bench_->header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
-        const unsigned long long size = 64 * GetParam().nodeSize;
-        EXPECT_EQ(bench_->Create(GetParam().nodeSize == 512 ? 9 : 10, 0, &size), kOk);
+        bench_.Create(GetParam().nodeSize == 512 ? 9 : 10, GetParam().compare);
     }
     ~FindShortcut() override {
         bench_->findData.ClearPath();

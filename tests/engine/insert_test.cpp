@@ -301,11 +301,7 @@ TEST(InsertGrowth, NodesBeyondTheMapBringAMapNode) {
 // parent, where the next split of the leaf has to be entered.
 TEST(InsertOnOneLeaf, ASplitOfItsParentIsFollowed) {
     Bench bench(Blocks(512));
-    bench->compareKeys = CompareCatKeysCaseIns;
-    bench->header.maxKeyLength = kCatMaxKeyLength;
-    bench->header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
-    const unsigned long long size = 128 * 512;
-    ASSERT_EQ(bench->Create(9, 0, &size), kOk);
+    bench.Create(9, CompareCatKeysCaseIns);
     const Bytes data = Pattern(100, 1);
     const auto insert = [&](u32 parent, const std::u16string& name) {
         return bench->InsertRecord(HostCatKey(parent, name), parent, data.data(), 100);

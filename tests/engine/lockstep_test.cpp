@@ -38,11 +38,7 @@ class Player {
 public:
     explicit Player(const Game& game)
         : game_(game), random_(game.seed), bench_(Blocks(game.mapBlock, true)) {
-        bench_->compareKeys = CompareCatKeysCaseIns;
-        bench_->header.maxKeyLength = kCatMaxKeyLength;
-        bench_->header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
-        const unsigned long long size = u64{64} << game.nodeShift;
-        EXPECT_EQ(bench_->Create(game.nodeShift, 0, &size), kOk);
+        bench_.Create(game.nodeShift, CompareCatKeysCaseIns);
     }
     ~Player() {
         ClearPaths();

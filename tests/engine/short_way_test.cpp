@@ -14,13 +14,6 @@ namespace {
 
 class ShortWay : public ::testing::Test {
 protected:
-    void Make(Bench* bench, u32 nodeShift) {
-        (*bench)->compareKeys = CompareCatKeysCaseIns;
-        (*bench)->header.maxKeyLength = kCatMaxKeyLength;
-        (*bench)->header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
-        const unsigned long long size = u64{64} << nodeShift;
-        ASSERT_EQ((*bench)->Create(nodeShift, 0, &size), kOk);
-    }
     static int Insert(Bench* bench, const std::u16string& name, u32 dataSize) {
         const HostKey key = HostCatKey(7, name);
         return (*bench)->InsertRecord(key.Get(), 7, Pattern(dataSize, 1).data(), dataSize);
@@ -35,51 +28,47 @@ protected:
             (*bench)->FindEntry(key, 7, path, &found, nullptr, nullptr, nullptr, nullptr);
         return {status, bench->capture.Take()};
     }
-    static std::pair<int, Events> FindPlainly(Bench* bench, const std::u16string& name) {
+    // A lookup on the tree's own path ends as the one on a new path does, with `status`; what both
+    // say.
+    static Events ExpectAsPlainly(Bench* bench, const std::u16string& name, int status) {
         HfsFindData path;
-        auto result = Find(bench, name, &path);
+        const auto own = Find(bench, name, nullptr);
+        const auto plain = Find(bench, name, &path);
         path.ClearPath();
-        return result;
+        (*bench)->findData.ClearPath();
+        bench->capture.Take();
+        EXPECT_EQ(plain.first, status);
+        EXPECT_EQ(own.first, plain.first);
+        EXPECT_EQ(own.second, plain.second);
+        return plain.second;
     }
 };
 
 // Sound tree, legal calls: data of three blocks is asserted (505) at each probe.
 TEST_F(ShortWay, BehindAllKeysARecordOfThreeBlocksIsAsserted) {
     Bench bench(Blocks(512));
-    Make(&bench, 12);
+    bench.Create(12, CompareCatKeysCaseIns);
     for (const char16_t* name : {u"a", u"b", u"c", u"d", u"e"}) {
         ASSERT_EQ(Insert(&bench, name, 700), kOk);
     }
-    const auto plain = FindPlainly(&bench, u"z");
-    const auto own = Find(&bench, u"z", nullptr);
-    bench->findData.ClearPath();
-    bench.capture.Take();
-    EXPECT_EQ(plain.second, Events{Asserted(505)});
-    EXPECT_EQ(own.first, plain.first);
-    EXPECT_EQ(own.second, plain.second);
+    EXPECT_EQ(ExpectAsPlainly(&bench, u"z", kOk), Events{Asserted(505)});
 }
 
 // A stored key longer than 520 is refused wherever it is probed.
 TEST_F(ShortWay, BehindAllKeysAKeyThatIsTooLongIsRefused) {
     Bench bench(Blocks(4096));
-    Make(&bench, 12);
+    bench.Create(12, CompareCatKeysCaseIns);
     ASSERT_EQ(Insert(&bench, u"a", 20), kOk);
     ASSERT_EQ(Insert(&bench, u"y", 20), kOk);
     ASSERT_EQ(Insert(&bench, u"b" + std::u16string(257, u'x'), 20), kOk);
     EXPECT_EQ(bench.capture.Take(), Events{Asserted(1362)});
-    const auto own = Find(&bench, u"z", nullptr);
-    const auto plain = FindPlainly(&bench, u"z");
-    bench->findData.ClearPath();
-    bench.capture.Take();
-    EXPECT_EQ(plain.first, kErrCorrupt);
-    EXPECT_EQ(own.first, plain.first);
-    EXPECT_EQ(own.second, plain.second);
+    ExpectAsPlainly(&bench, u"z", kErrCorrupt);
 }
 
 // The same as a separator.
 TEST_F(ShortWay, ASeparatorThatIsTooLongIsRefused) {
     Bench bench(Blocks(2048));
-    Make(&bench, 11);
+    bench.Create(11, CompareCatKeysCaseIns);
     for (const char16_t* name : {u"a", u"b", u"q"}) {
         ASSERT_EQ(Insert(&bench, name, 400), kOk);
     }
@@ -87,13 +76,7 @@ TEST_F(ShortWay, ASeparatorThatIsTooLongIsRefused) {
     ASSERT_EQ(bench->header.treeDepth, 2);
     bench.capture.Take();
     EXPECT_EQ(Find(&bench, u"a", nullptr).first, kOk);
-    const auto own = Find(&bench, u"b", nullptr);
-    const auto plain = FindPlainly(&bench, u"b");
-    bench->findData.ClearPath();
-    bench.capture.Take();
-    EXPECT_EQ(plain.first, kErrCorrupt);
-    EXPECT_EQ(own.first, plain.first);
-    EXPECT_EQ(own.second, plain.second);
+    ExpectAsPlainly(&bench, u"b", kErrCorrupt);
 }
 
 // An extents key of 12 bytes in a tree of separators of 10: asserted (1359), inserted, and nothing
@@ -124,7 +107,7 @@ TEST_F(ShortWay, AnInsertionThatSucceedsReportsNothing) {
 // Records moved by hand by a rotation that is refused at its own record.
 TEST_F(ShortWay, RecordsMovedByARotationThatFailed) {
     Bench bench(Blocks(512));
-    Make(&bench, 9);
+    bench.Create(9, CompareCatKeysCaseIns);
     for (u32 n = 0; n < 40; ++n) {
         const HostKey key = NthHostKey(4, n);
         ASSERT_EQ(bench->InsertRecord(key.Get(), key.id, Pattern(24, n).data(), 24), kOk);
@@ -166,8 +149,7 @@ TEST_F(ShortWay, RecordsMovedByARotationThatFailed) {
 // often as the one after it, which finds the same tree.
 TEST_F(ShortWay, ANodeIsSearchedOnce) {
     Bench bench(Blocks(512));
-    Make(&bench, 11);
-    u32 wrong = 0;
+    bench.Create(11, CompareCatKeysCaseIns);
     for (u32 n = 0; n < 60; ++n) {
         const std::u16string name = std::u16string(1, static_cast<char16_t>(u'A' + n / 10)) +
                                     std::u16string(1, static_cast<char16_t>(u'0' + n % 10)) +
@@ -189,9 +171,7 @@ TEST_F(ShortWay, ANodeIsSearchedOnce) {
             path.ClearPath();
         }
         EXPECT_EQ(asked[0], asked[1]) << n;
-        wrong += asked[0] != asked[1];
     }
-    EXPECT_EQ(wrong, 0u);
     bench->findData.ClearPath();
     bench.capture.Take();
 }
@@ -234,7 +214,7 @@ TEST_F(ShortWay, ARecordThatMovedIntoThreeBlocksIsAsserted) {
 // Sound tree: node 3 was the root and is a leaf now, its object has room to remember.
 TEST_F(ShortWay, ALeafRecordThatMovedIntoThreeBlocksIsAsserted) {
     Bench bench(Blocks(512));
-    Make(&bench, 12);
+    bench.Create(12, CompareCatKeysCaseIns);
     const std::u16string letters = u"bdfhjlnp";
     for (const char16_t letter : letters) {
         ASSERT_EQ(Insert(&bench, {letter}, 600), kOk);
