@@ -2,6 +2,7 @@
 #include <cstdio>
 
 #include "hfs/records/json_writer.h"
+#include "hfs/records/name_text.h"
 #include "tool/command.h"
 #include "tool/errors.h"
 #include "tool/script_run.h"
@@ -22,7 +23,7 @@ int ReportMistake(const ScriptProblem& problem, bool json) {
         error.exitCode = kExitUsage;
         PrintError(error, true);
     } else {
-        std::fprintf(stderr, "%s\n", problem.Text().c_str());
+        std::fprintf(stderr, "%s\n", EscapedText(problem.Text()).c_str());
     }
     return kExitUsage;
 }

@@ -28,6 +28,11 @@ struct FindOptions {
     bool collisions = false;
     std::optional<std::string> format;
     PrintStyle style;
+
+    // Whether something is asked of the items of a list.
+    bool ChoosesItems() const {
+        return path || name || iname || id || type || larger || newer || orphans || collisions;
+    }
 };
 
 // The conditions an item must meet, ready for use.
@@ -205,6 +210,10 @@ int RunFind(Invocation* call) {
     if ((find.key && find.nearest) || (byKey && find.block)) {
         ThrowUsage("find", "--key, --nearest and --block exclude each other", "");
     }
+    if ((byKey || find.block) && find.ChoosesItems()) {
+        ThrowUsage("find",
+                   "--key, --nearest and --block stand alone: other conditions are for lists", "");
+    }
     if (!byKey && (call->treesGiven && call->trees[0] != kCatalogFileId)) {
         ThrowUsage("find", "only --key and --nearest look into other trees than the catalog", "");
     }
@@ -236,8 +245,9 @@ const Command kFindCommand = {
     "find",
     "IMAGE [PATH]",
     "search by name, ID, kind, size, date or block; or by exact key",
-    "Conditions are combined: all must hold. Exit code 1 when nothing matches. The fields of\n"
-    "--format: path name id parent type size rsize modified created mode flags node record.",
+    "Conditions are combined: all must hold; --key, --nearest and --block stand alone. Exit code 1 "
+    "when nothing matches. The fields of --format: path name id parent type size rsize modified "
+    "created mode flags node record.",
     {"find disk.img --name 'file_1?.txt' --limit 2", "find disk.img --type file --larger 64K -l",
      "find disk.img --key '2:file_1.txt' --trace-path"},
     RunFind,

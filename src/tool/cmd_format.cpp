@@ -22,7 +22,7 @@ struct FormatArguments {
     std::optional<u64> clump;
     std::optional<u64> journal;
     std::string nodeSizes;
-    std::string name;
+    std::optional<std::string> name;
     std::string date;
     std::string uuid;
     std::string wrap = "none";
@@ -74,8 +74,8 @@ FormatOptions OptionsOf(const FormatArguments& arguments) {
     ReadNodeSizes(arguments.nodeSizes, &options);
     options.date = arguments.date.empty() ? HfsNow() : ReadDate(arguments.date);
     options.uuid = arguments.uuid.empty() ? RandomUuid() : ReadUuid(arguments.uuid);
-    if (!arguments.name.empty()) {
-        options.name = StoredName(arguments.name);
+    if (arguments.name) {
+        options.name = StoredName(*arguments.name);
     }
     return options;
 }
@@ -96,10 +96,13 @@ bool IsBlockDevice(const std::string& path) {
     return stat(path.c_str(), &info) == 0 && S_ISBLK(info.st_mode);
 }
 
-// Opens the device, or makes the file.
+// Opens the device, or makes the file: one that is there loses what it holds only for a volume that
+// can be made.
 std::unique_ptr<FileDevice> OpenPlace(const Invocation& call, WrapScheme scheme,
-                                      const std::optional<u64>& size) {
+                                      const std::optional<u64>& size,
+                                      const FormatOptions& options) {
     Problem problem;
+    const bool exists = access(call.image.c_str(), F_OK) == 0;
     if (!IsBlockDevice(call.image) && !size) {
         ThrowUsage("format", "how large is the volume to be?", "give --size, for example 64M");
     }
@@ -107,9 +110,16 @@ std::unique_ptr<FileDevice> OpenPlace(const Invocation& call, WrapScheme scheme,
         ThrowUsage("format", fmt::format("--size {} is too small", Grouped(*size)),
                    "a volume takes 64K at least");
     }
+    problem = size ? CheckFormat(*size, options) : Problem{};
+    if (problem) {
+        ThrowProblem(call.image, problem);
+    }
     std::unique_ptr<FileDevice> device = FileDevice::Open(
         call.image, FileDevice::Mode::kCreate, size ? WrappedSize(scheme, *size) : 0, &problem);
     if (!device) {
+        if (!exists) {
+            std::remove(call.image.c_str());
+        }
         ThrowProblem(call.image, problem);
     }
     if (size && device->Size() != WrappedSize(scheme, *size)) {
@@ -142,7 +152,7 @@ int RunFormat(Invocation* call) {
         ThrowUsage("format", "--wrap makes a map in a file, not on a device",
                    "name a partition of the device");
     }
-    std::unique_ptr<BlockDevice> device = OpenPlace(*call, scheme, arguments.size);
+    std::unique_ptr<BlockDevice> device = OpenPlace(*call, scheme, arguments.size, options);
     if (!isDevice) {
         const IoResult mapped =
             WriteMap(scheme, device.get(), {*arguments.size, options.caseSensitive, options.uuid});

@@ -13,8 +13,8 @@ namespace {
 void PrintOverview(Output* out) {
     out->Write(
         "treehfs COMMAND [options] IMAGE [arguments]\n"
-        "Looks into the B-trees of HFS+ and HFSX volumes. Nothing is written to an image unless\n"
-        "an option says so.\n\nCommands:\n");
+        "Looks into the B-trees of HFS+ and HFSX volumes. Nothing is written to an image\n"
+        "unless an option says so.\n\nCommands:\n");
     for (const Command* const* command = kCommands; *command != nullptr; ++command) {
         out->Print("  {:<14}{}\n", (*command)->name, (*command)->summary);
     }

@@ -2,8 +2,10 @@
 #include <algorithm>
 #include <cstdio>
 
+#include "hfs/records/name_text.h"
 #include "tool/command.h"
 #include "tool/errors.h"
+#include "tool/progress.h"
 #include "tool/script_lex.h"
 #include "tool/script_run.h"
 #include "tool/script_volume.h"
@@ -14,8 +16,8 @@
 namespace VELK::tool {
 namespace {
 
-constexpr char kRed[] = "\033[31m";
-constexpr char kPlain[] = "\033[0m";
+constexpr char kRed[] = "\001\033[31m\001";  // between ShellInput::kHidden
+constexpr char kPlain[] = "\001\033[0m\001";
 
 class Shell {
 public:
@@ -38,9 +40,17 @@ public:
 
     int Run() {
         std::string line;
-        while (!isDone_ && input_.Next(Prompt(), &line)) {
+        for (auto typed = ShellInput::Typed::kLine; !isDone_;) {
+            typed = input_.Next(Prompt(), &line);
+            if (typed == ShellInput::Typed::kEnd) {
+                break;
+            }
+            if (typed == ShellInput::Typed::kInterrupt) {
+                Forget();
+                continue;
+            }
             ++number_;
-            Handle(line);
+            HandleInterruptibly(line);
             call_->out.Flush();
         }
         if (!open_.empty()) {
@@ -56,9 +66,30 @@ private:
         if (!open_.empty()) {
             return "...> ";
         }
-        std::string prompt =
-            std::string(ForkName(runner_.FileId())) + (isWriting_ ? "(WRITE)> " : "(memory)> ");
-        return isWriting_ && call_->color ? kRed + prompt + kPlain : prompt;
+        const std::string prompt =
+            std::string(ForkName(runner_.FileId())) + (isWriting_ ? "(WRITE)>" : "(memory)>");
+        // The line editor drops an escape sequence that nothing visible follows.
+        return (isWriting_ && call_->color ? kRed + prompt + kPlain : prompt) + " ";
+    }
+
+    // Gives up the lines of a repetition that has not ended.
+    void Forget() {
+        open_.clear();
+        depth_ = 0;
+    }
+
+    // Ctrl-C stops what runs, not the shell: what was changed so far would be gone with it.
+    void HandleInterruptibly(const std::string& line) {
+        try {
+            Handle(line);
+        } catch (const Interrupted&) {
+            LendVolume(nullptr);
+            if (!input_.IsTerminal() || !TakeInterrupt()) {
+                throw;
+            }
+            call_->out.Flush();
+            std::fputs("treehfs: interrupted\n", stderr);
+        }
     }
 
     void Handle(const std::string& line) {
@@ -105,7 +136,7 @@ private:
         const ScriptProblem problem = ParseScript("shell", text, &context_, &script);
         if (problem) {
             call_->out.Flush();
-            std::fprintf(stderr, "%s\n", problem.Text().c_str());
+            std::fprintf(stderr, "%s\n", EscapedText(problem.Text()).c_str());
             return;
         }
         runner_.Run(script);

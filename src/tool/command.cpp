@@ -1,10 +1,12 @@
 // One call of a command: the options that several commands share, and what they mean.
 #include "tool/command.h"
 
+#include <fcntl.h>
 #include <fmt/format.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <cstdlib>
 
 #include "hfs/format.h"
 #include "tool/errors.h"
@@ -15,6 +17,21 @@ namespace {
 
 bool WordIsOn(const std::string& word, int fd) {
     return word == "always" || (word == "auto" && isatty(fd) != 0);
+}
+
+// A terminal that knows no colours says so, or the person in front of it does.
+bool WantsNoColor() {
+    const char* term = std::getenv("TERM");
+    const char* noColor = std::getenv("NO_COLOR");
+    return (term != nullptr && std::string(term) == "dumb") ||
+           (noColor != nullptr && *noColor != 0);
+}
+
+// Whether the caller has handed over this file descriptor. Those of our own files, the image's
+// among them, are closed when a program is started.
+bool IsHandedOver(int fd) {
+    const int flags = fcntl(fd, F_GETFD);
+    return flags >= 0 && (flags & FD_CLOEXEC) == 0;
 }
 
 u32 NarrowOption(const Invocation& call, const char* name, const std::optional<u64>& value,
@@ -78,7 +95,8 @@ void Invocation::DeclareJson() {
 }
 
 void Invocation::DeclareOutputFile() {
-    options.Text("-o,--output", &outputFile, "FILE", "write to FILE, only if all goes well");
+    options.Text("-o,--output", &outputFile, "FILE",
+                 "write to FILE, only if all goes well; - is standard output");
     options.Flag("--force", &force, "replace FILE if it exists");
 }
 
@@ -122,6 +140,10 @@ void Invocation::ChooseTrees() {
 }
 
 void Invocation::ChooseGeneral() {
+    if (partitionNumber_ && offset) {
+        ThrowUsage(command.name, "--partition and --offset both say where the volume starts",
+                   "give one of them");
+    }
     partition = NarrowOption(*this, "--partition", partitionNumber_, 1, 0xFFFFFFFF);
     mapBlockSize = NarrowOption(*this, "--map", mapNumber_, 512, 32768);
     if ((mapBlockSize & (mapBlockSize - 1)) != 0) {
@@ -130,10 +152,18 @@ void Invocation::ChooseGeneral() {
     if (progressFdNumber_) {
         progressFd =
             static_cast<int>(NarrowOption(*this, "--progress-fd", progressFdNumber_, 1, 65535));
+        if (!IsHandedOver(progressFd)) {
+            ThrowUsage(command.name,
+                       fmt::format("--progress-fd: descriptor {} is not open", progressFd), "");
+        }
+    }
+    if (outputFile == "-") {
+        outputFile.clear();
     }
     limit = limitNumber_.value_or(~u64{0});
     skipRecords = skipNumber_.value_or(0);
-    color = WordIsOn(colorWord_, outputFile.empty() ? STDOUT_FILENO : -1);
+    color = WordIsOn(colorWord_, outputFile.empty() ? STDOUT_FILENO : -1) &&
+            (colorWord_ == "always" || !WantsNoColor());
     showProgress = WordIsOn(progressWord_, STDERR_FILENO) && !quiet;
 }
 

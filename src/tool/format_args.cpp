@@ -30,12 +30,19 @@ u32 ReadNodeSize(const std::string& text) {
 }  // namespace
 
 void ReadNodeSizes(const std::string& text, FormatOptions* options) {
+    std::string seen;  // trees that have been given a size
     std::size_t at = 0;
     while (at < text.size()) {
         const std::size_t end = std::min(text.find(',', at), text.size());
         const std::string item = text.substr(at, end - at);
         at = end + 1;
-        if (item.size() < 2 || item[1] != '=') {
+        const bool isForOne = item.size() >= 2 && item[1] == '=';
+        if (seen.find(isForOne ? item[0] : '*') != std::string::npos) {
+            ThrowUsage("", fmt::format("--node-size: '{}' gives a tree a second size", item),
+                       "give each tree one");
+        }
+        seen += isForOne ? item[0] : '*';
+        if (!isForOne) {
             const u32 size = ReadNodeSize(item);
             options->catalogNodeSize = size;
             options->extentsNodeSize = size;

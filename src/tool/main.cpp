@@ -1,4 +1,6 @@
 // The program: the table of commands, dispatch, and the exit code of every way a command can end.
+#include <fcntl.h>
+
 #include <csignal>
 #include <cstdio>
 #include <exception>
@@ -108,6 +110,19 @@ const Command& ChooseCommand(std::vector<std::string>* arguments) {
     return *command;
 }
 
+// Takes the numbers 0 to 2 where the caller has closed them: a file opened later would get one of
+// them, and be written what is meant for the terminal. The wrong way round, so that using them
+// fails as it would have.
+bool HoldStandardNumbers() {
+    for (int number = 0; number <= 2; ++number) {
+        if (fcntl(number, F_GETFD) < 0 &&
+            open("/dev/null", number == 0 ? O_WRONLY : O_RDONLY) != number) {
+            return false;
+        }
+    }
+    return true;
+}
+
 int RunCommand(std::vector<std::string> arguments) {
     const Command& command = ChooseCommand(&arguments);
     Invocation call(command, std::move(arguments));
@@ -144,6 +159,9 @@ int RunGuarded(const std::vector<std::string>& arguments, bool json) {
 
 int main(int argc, char** argv) {
     using namespace VELK::tool;
+    if (!HoldStandardNumbers()) {
+        return kExitFailed;
+    }
     std::signal(SIGPIPE, SIG_IGN);
     InstallInterruptHandler();
     SilenceEngine();

@@ -53,7 +53,7 @@ std::string ShownNames(const Entry& entry) {
 // The words of `text` in lines of a help text, of which all but the first begin with `indent`
 // blanks.
 std::string Filled(const std::string& text, std::size_t indent) {
-    constexpr std::size_t kWidth = 94;
+    constexpr std::size_t kWidth = 80;
     std::string filled;
     std::size_t column = indent;
     for (std::size_t at = 0; at < text.size();) {
@@ -265,8 +265,9 @@ std::vector<std::string> OptionSet::Names() const {
 }
 
 void OptionSet::ShowHelp() {
-    const std::string text = impl_->Help();
-    std::fwrite(text.data(), 1, text.size(), stdout);
+    Output out;
+    out.Write(impl_->Help());
+    out.Commit();
     throw HelpShown{};
 }
 
@@ -312,7 +313,10 @@ void OptionSet::Impl::Distribute(const std::vector<std::string>& extras) {
         }
         if (!optionsEnded && word.size() > 1 && word[0] == '-') {
             const std::string name = word.substr(0, word.find('='));
-            ThrowUsage(command.name, "unknown option " + name + DidYouMean(name, Names()), "");
+            // Of one letter all others are as near.
+            const bool isLetter = name.size() == 2;
+            ThrowUsage(command.name,
+                       "unknown option " + name + (isLetter ? "" : DidYouMean(name, Names())), "");
         }
         while (entry != entries.end() && isFull()) {
             ++entry;
@@ -327,8 +331,10 @@ void OptionSet::Impl::Distribute(const std::vector<std::string>& extras) {
 
 void OptionSet::Impl::CheckAndApply() {
     for (const auto& entry : entries) {
-        if (entry->isRequired && entry->values.empty()) {
-            ThrowUsage(command.name, entry->names + " is missing",
+        // An empty word is what a shell makes of a variable that is not set.
+        if (entry->isRequired && (entry->values.empty() || entry->values[0].empty())) {
+            ThrowUsage(command.name,
+                       entry->names + (entry->values.empty() ? " is missing" : " is empty"),
                        fmt::format("treehfs {} {}", command.name, command.arguments));
         }
         if (entry->isFlag || entry->values.empty()) {

@@ -25,7 +25,7 @@ void DrawHistogram(SvgPicture* picture, double top, u32 level, const u64 (&count
     picture->Text(SvgPicture::kMargin, top, "ink label",
                   fmt::format("level {}{}: {}", level, level == 1 ? " (leaves)" : "",
                               Counted(sum, "node", "nodes")));
-    const double base = top + 14 + kHeight;
+    const double base = top + 20 + kHeight;
     for (u32 step = 0; step < 10; ++step) {
         const double height =
             kHeight * static_cast<double>(counts[step]) / static_cast<double>(most);
@@ -76,16 +76,18 @@ std::string PlotKeys(const TreeSurvey& survey) {
     const std::size_t count = survey.leaves.size();
     const std::size_t step = count / kMostDots + 1;
     const double nodes = std::max<double>(1, static_cast<double>(survey.nodes.size()));
+    // A leaf is as wide as its part of the key order, so that the last one ends at the last key.
+    const double share = kPlotWidth / std::max<double>(1, static_cast<double>(count));
     for (std::size_t i = 0; i < count; i += step) {
-        const double x = left + kPlotWidth * static_cast<double>(i) / static_cast<double>(count);
+        const double x = left + share * static_cast<double>(i);
         const double y = top + kHeight * (1 - survey.leaves[i] / nodes);
-        picture.Box(x, y - 1.5, 3, 3, "dot",
+        picture.Box(x, y - 1.5, std::max(3.0, share), 3, "dot",
                     fmt::format("leaf {} of {}: node {}", Grouped(i + 1), Grouped(count),
                                 Grouped(survey.leaves[i])));
     }
     picture.Text(left, top + kHeight + 18, "soft small", "first key");
     picture.Text(left + kPlotWidth - 44, top + kHeight + 18, "soft small", "last key");
-    picture.Text(SvgPicture::kMargin, top + 10, "soft small", Grouped(survey.nodes.size()));
+    picture.Text(SvgPicture::kMargin, top - 6, "soft small", Grouped(survey.nodes.size()));
     picture.Text(SvgPicture::kMargin + 18, top + kHeight, "soft small", "0");
     if (step > 1) {
         picture.Text(left, top + kHeight + 34, "soft small",

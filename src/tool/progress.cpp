@@ -20,7 +20,7 @@ namespace VELK::tool {
 
 namespace {
 
-std::atomic<bool> g_interrupted{false};
+std::atomic<int> g_signal{0};  // the one that came last, or 0
 
 // A line for a program. False: the reader went away.
 bool Report(int fd, const std::string& what, u64 done, u64 total) {
@@ -52,8 +52,8 @@ std::size_t LineWidth() {
     return (isKnown ? size.ws_col : kUsual) - 1;
 }
 
-void OnInterrupt(int) {
-    g_interrupted.store(true, std::memory_order_relaxed);
+void OnInterrupt(int signal) {
+    g_signal.store(signal, std::memory_order_relaxed);
 }
 
 }  // namespace
@@ -68,9 +68,18 @@ void InstallInterruptHandler() {
 }
 
 void ThrowIfInterrupted() {
-    if (g_interrupted.load(std::memory_order_relaxed)) {
+    if (g_signal.load(std::memory_order_relaxed) != 0) {
         throw Interrupted{};
     }
+}
+
+bool TakeInterrupt() {
+    int expected = SIGINT;
+    if (!g_signal.compare_exchange_strong(expected, 0)) {
+        return false;
+    }
+    InstallInterruptHandler();
+    return true;
 }
 
 Progress::Progress(const Invocation& call, std::string what, std::string unit, u64 total,

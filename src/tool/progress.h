@@ -59,5 +59,8 @@ private:
 // Set by the handler of SIGINT and SIGTERM.
 void InstallInterruptHandler();
 void ThrowIfInterrupted();
+// True after Ctrl-C, which is forgotten with it: what goes on can be interrupted again. A signal
+// that asks the program to end is not forgotten.
+bool TakeInterrupt();
 
 }  // namespace VELK::tool

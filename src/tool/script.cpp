@@ -2,7 +2,9 @@
 // checked.
 #include "tool/script.h"
 
+#include <cerrno>
 #include <cstdio>
+#include <cstring>
 
 #include "hfs/records/quoted.h"
 #include "platform/error.h"
@@ -25,14 +27,20 @@ bool ReadAll(std::FILE* file, std::string* text) {
     return std::ferror(file) == 0;
 }
 
-bool ReadPath(const std::string& path, std::string* text) {
+// False with the reason in `*why`.
+bool ReadPath(const std::string& path, std::string* text, std::string* why) {
     std::FILE* file = path == "-" ? stdin : std::fopen(path.c_str(), "rb");
-    if (file == nullptr) {
-        return false;
+    const bool isRead = file != nullptr && ReadAll(file, text);
+    if (!isRead) {
+        *why = errno == ENOENT ? "no such file" : std::strerror(errno);
     }
-    const bool isRead = ReadAll(file, text);
-    if (file != stdin) {
+    if (file != nullptr && file != stdin) {
         std::fclose(file);
+    }
+    // Some editors mark UTF-8 so.
+    constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
+    if (isRead && text->starts_with(kByteOrderMark)) {
+        text->erase(0, kByteOrderMark.size());
     }
     return isRead;
 }
@@ -190,8 +198,9 @@ private:
             full = from.substr(0, slash + 1) + path;
         }
         std::string text;
-        if (path == "-" || !ReadPath(full, &text)) {
-            return "include: cannot read '" + path + "'";
+        std::string why = "it is standard input";
+        if (path == "-" || !ReadPath(full, &text, &why)) {
+            return "include: cannot read '" + path + "': " + why;
         }
         inner_ = ParseText(full, std::move(text), depth + 1);
         return {};
@@ -272,8 +281,9 @@ ScriptProblem ParseScript(const std::string& name, std::string text, ScriptConte
 
 ScriptProblem ReadScript(const std::string& path, ScriptContext* context, Script* script) {
     std::string text;
-    if (!ReadPath(path, &text)) {
-        return {path, 0, "cannot read the script"};
+    std::string why;
+    if (!ReadPath(path, &text, &why)) {
+        return {path, 0, "cannot read the script: " + why};
     }
     context->inputIsScript = context->inputIsScript || path == "-";
     return ParseScript(path == "-" ? "stdin" : path, std::move(text), context, script);

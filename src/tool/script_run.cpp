@@ -96,9 +96,17 @@ ScriptRunner::ScriptRunner(ImageVolume* volume, const ScriptRunOptions& options,
     log_.Keep(options.trace);
 }
 
-CBTreeHfs* ScriptRunner::Tree() {
+CBTreeHfs* ScriptRunner::Tree(Problem* problem) {
     CBTreeHfs* tree = volume_->OpenTree(fileId_);
-    return tree != nullptr ? tree : volume_->Tree(fileId_, nullptr);
+    return tree != nullptr ? tree : volume_->Tree(fileId_, problem);
+}
+
+ScriptRunner::Outcome ScriptRunner::NoTree(const Problem& problem) {
+    if (!volume_->HasTree(fileId_)) {
+        return {kErrInvalid, " absent=yes"};
+    }
+    Remark(problem.Text());
+    return {problem.status != kOk ? problem.status : kErrCorrupt, ""};
 }
 
 std::string ScriptRunner::StateFields(CBTreeHfs* tree) const {
@@ -201,8 +209,8 @@ ScriptRunner::Outcome ScriptRunner::Execute(ScriptOp op, const std::string_view*
         default:
             break;
     }
-    return Tree() == nullptr ? Outcome{kErrInvalid, " absent=yes"}
-                             : ExecuteOnTree(op, words, count);
+    Problem problem;
+    return Tree(&problem) == nullptr ? NoTree(problem) : ExecuteOnTree(op, words, count);
 }
 
 // REQUIRES: the tree in use is there and open.
@@ -429,6 +437,7 @@ bool ScriptRunner::RunLine(const Script& script, const ScriptLine& line) {
 
 bool ScriptRunner::Run(const Script& script) {
     std::vector<u64> limits;
+    counters_.clear();  // an interrupted run has left its own
     for (u32 i = 0; i < script.lines.size(); ++i) {
         const ScriptLine& line = script.lines[i];
         if (line.op == ScriptOp::kRepeat) {
@@ -451,7 +460,6 @@ bool ScriptRunner::Run(const Script& script) {
                 counters_.erase(counters_.begin());
             }
         } else if (!RunLine(script, line)) {
-            counters_.clear();
             return false;
         }
     }

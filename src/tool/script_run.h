@@ -74,7 +74,10 @@ private:
     bool StopsAt(int status) const;
     void Remark(const std::string& text);
 
-    CBTreeHfs* Tree();
+    // The tree in use, opened when it is not yet; null where that fails.
+    CBTreeHfs* Tree(Problem* problem = nullptr);
+    // What an operation says that finds no tree to work on.
+    Outcome NoTree(const Problem& problem);
     std::string StateFields(CBTreeHfs* tree) const;
     // After a changing operation: takes the volume back if `status` says so.
     void Settle(Outcome* outcome);

@@ -10,17 +10,12 @@ namespace VELK::tool {
 
 ScriptRunner::Outcome ScriptRunner::Use(const std::string_view* words) {
     fileId_ = TreeIdFromText(std::string(words[0]));
-    Outcome outcome{kOk, " tree=" + std::string(words[0])};
+    const std::string fields = " tree=" + std::string(words[0]);
     if (!volume_->HasTree(fileId_)) {
-        outcome.fields += " absent=yes";
-        return outcome;
+        return {kOk, fields + " absent=yes"};
     }
     Problem problem;
-    if (volume_->Tree(fileId_, &problem) == nullptr) {
-        outcome.status = problem.status != kOk ? problem.status : kErrCorrupt;
-        Remark(problem.Text());
-    }
-    return outcome;
+    return {Tree(&problem) == nullptr ? NoTree(problem).status : kOk, fields};
 }
 
 ScriptRunner::Outcome ScriptRunner::Reserve(const std::string_view* words, u32 count) {

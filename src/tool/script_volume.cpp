@@ -44,8 +44,11 @@ void ApplyItem(const std::string& item, FormatOptions* options) {
     const std::size_t equal = item.find('=');
     for (const NamedNumber& number : numbers) {
         u64 value = 0;
-        if (item.substr(0, equal) != number.name || equal == std::string::npos) {
+        if (item.substr(0, equal) != number.name) {
             continue;
+        }
+        if (equal == std::string::npos) {
+            ThrowNewVolume(item, "needs a value");
         }
         if (!ParseSize(item.substr(equal + 1), &value) || value == 0 || value > 0xFFFFFFFF) {
             ThrowNewVolume(item, "is no size in bytes");
@@ -84,10 +87,15 @@ std::unique_ptr<ImageVolume> OpenNew(const TargetOptions& target) {
     return volume;
 }
 
-void Save(const TargetOptions& options, ImageVolume* volume) {
-    if (!options.force && access(options.saveFile.c_str(), F_OK) == 0) {
-        ThrowFailed("", options.saveFile + " exists", "--force replaces it");
+// REQUIRES of a file that is to be written: it is not there, or --force replaces it.
+void CheckReplaces(const TargetOptions& options, const std::string& file) {
+    if (!options.force && !file.empty() && access(file.c_str(), F_OK) == 0) {
+        ThrowFailed("", file + " exists", "--force replaces it");
     }
+}
+
+void Save(const TargetOptions& options, ImageVolume* volume) {
+    CheckReplaces(options, options.saveFile);
     const std::string part = options.saveFile + ".part";
     std::FILE* file = std::fopen(part.c_str(), "wb");
     if (file == nullptr) {
@@ -160,13 +168,7 @@ namespace {
 
 std::unique_ptr<ImageVolume> OpenWithUndo(const Invocation& call, const TargetOptions& target,
                                           const OpenOptions& options, Problem* problem) {
-    if (!target.write) {
-        ThrowUsage(call.command.name, "--undo is for --write: without it the image stays as it is",
-                   "");
-    }
-    if (!target.force && access(target.undoFile.c_str(), F_OK) == 0) {
-        ThrowFailed("", target.undoFile + " exists", "--force replaces it");
-    }
+    CheckReplaces(target, target.undoFile);
     std::unique_ptr<BlockDevice> device =
         FileDevice::Open(call.image, FileDevice::Mode::kReadWrite, 0, problem);
     if (device != nullptr) {
@@ -179,6 +181,11 @@ std::unique_ptr<ImageVolume> OpenWithUndo(const Invocation& call, const TargetOp
 }  // namespace
 
 std::unique_ptr<ImageVolume> OpenTarget(const Invocation& call, const TargetOptions& options) {
+    if (!options.undoFile.empty() && !options.write) {
+        ThrowUsage(call.command.name, "--undo is for --write: without it the image stays as it is",
+                   "");
+    }
+    CheckReplaces(options, options.saveFile);  // now, not when all the work is done
     if (!options.newVolume.empty()) {
         if (options.write) {
             ThrowUsage(call.command.name, "--new and --write do not go together",

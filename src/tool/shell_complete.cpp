@@ -6,6 +6,7 @@
 #include "hfs/volume/volume_header.h"
 #include "tool/catalog_item.h"
 #include "tool/script.h"
+#include "tool/script_words.h"
 
 namespace VELK::tool {
 namespace {
@@ -138,9 +139,7 @@ std::vector<std::string> ShellCandidates(ImageVolume* volume, u32 fileId, std::s
         return Matching({"catalog", "extents", "attributes"}, word);
     }
     if (op == "expect") {
-        return Matching({"ok", "invalid", "bad-record", "no-memory", "not-found", "exists",
-                         "too-large", "corrupt", "no-space"},
-                        word);
+        return Matching(StatusNames(), word);
     }
     if (op == "help") {
         return Matching(ScriptOpNames(), word);

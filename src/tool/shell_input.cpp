@@ -8,6 +8,8 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "tool/progress.h"
+
 #ifdef TREEHFS_EDITLINE
 #include <editline/readline.h>
 #endif
@@ -74,10 +76,7 @@ bool ShellInput::NextPlain(std::string* line) {
     return character != EOF || !line->empty();
 }
 
-bool ShellInput::Next(const std::string& prompt, std::string* line) {
-    if (!isTerminal_) {
-        return NextPlain(line);
-    }
+bool ShellInput::NextTyped(const std::string& prompt, std::string* line) {
 #ifdef TREEHFS_EDITLINE
     char* text = readline(prompt.c_str());
     if (text == nullptr) {
@@ -90,10 +89,26 @@ bool ShellInput::Next(const std::string& prompt, std::string* line) {
     std::free(text);
     return true;
 #else
-    std::fputs(prompt.c_str(), stdout);
+    std::string shown = prompt;
+    std::erase(shown, kHidden);
+    std::fputs(shown.c_str(), stdout);
     std::fflush(stdout);
     return NextPlain(line);
 #endif
+}
+
+ShellInput::Typed ShellInput::Next(const std::string& prompt, std::string* line) {
+    const bool isLine = isTerminal_ ? NextTyped(prompt, line) : NextPlain(line);
+    if (isTerminal_ && !isLine) {
+        std::fputc('\n', stdout);  // what comes next begins a line
+        std::fflush(stdout);
+    }
+    if (isTerminal_ && TakeInterrupt()) {
+        std::clearerr(stdin);
+        return Typed::kInterrupt;
+    }
+    ThrowIfInterrupted();
+    return isLine ? Typed::kLine : Typed::kEnd;
 }
 
 bool ShellInput::Ask(const std::string& question) {

@@ -22,13 +22,17 @@ public:
     ~ShellInput();
 
     bool IsTerminal() const { return isTerminal_; }
-    // False at the end of the input. The prompt is shown on a terminal only.
-    bool Next(const std::string& prompt, std::string* line);
+    enum class Typed { kLine, kInterrupt, kEnd };
+    // The prompt is shown on a terminal only, and only there Ctrl-C gives up no more than the line;
+    // elsewhere it throws Interrupted. Escape sequences of a prompt stand between kHidden.
+    Typed Next(const std::string& prompt, std::string* line);
+    static constexpr char kHidden = '\001';
     // A question to a person; false for anything but yes, and where nobody is there to ask.
     bool Ask(const std::string& question);
 
 private:
     bool NextPlain(std::string* line);
+    bool NextTyped(const std::string& prompt, std::string* line);
 
     std::string historyFile_;
     bool isTerminal_;

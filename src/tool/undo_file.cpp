@@ -87,7 +87,7 @@ bool ReadEntry(std::FILE* file, u64 imageSize, UndoLog* log) {
 }  // namespace
 
 Problem ReadUndoLog(const std::string& path, UndoLog* log) {
-    std::FILE* file = std::fopen(path.c_str(), "rb");
+    std::FILE* file = std::fopen(path.c_str(), "rbe");
     if (file == nullptr) {
         return Failure(path + ": cannot open: " + IoErrorText(errno), "");
     }
@@ -116,7 +116,7 @@ IoResult SumOfStretches(BlockDevice* image, const UndoLog& log, u64* sum) {
 
 std::unique_ptr<UndoDevice> UndoDevice::Open(std::unique_ptr<BlockDevice> base,
                                              const std::string& path, Problem* problem) {
-    std::FILE* file = std::fopen(path.c_str(), "wb");
+    std::FILE* file = std::fopen(path.c_str(), "wbe");
     u8 head[sizeof kMagic + 8];
     std::memcpy(head, kMagic, sizeof kMagic);
     PutBe64(head + sizeof kMagic, base->Size());

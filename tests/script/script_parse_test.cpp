@@ -117,7 +117,8 @@ TEST(ScriptInclude, MistakesNameTheInnerFile) {
     EXPECT_EQ(Mistake("include " + inner + "\n"),
               inner + ":2: unknown operation 'flus' (did you mean flush?)");
     std::remove(inner.c_str());
-    EXPECT_EQ(Mistake("include nowhere.tr\n"), "split.tr:1: include: cannot read 'nowhere.tr'");
+    EXPECT_EQ(Mistake("include nowhere.tr\n"),
+              "split.tr:1: include: cannot read 'nowhere.tr': no such file");
 }
 
 TEST(ScriptInclude, RepetitionsDoNotCrossFiles) {
@@ -143,7 +144,14 @@ TEST(ScriptParsed, NothingRunsWhenALineIsWrong) {
 TEST(ScriptParsed, MissingScriptIsNoMistakeOfForm) {
     const Transcript result = RunTool("apply", {"--new", "1M", "/nowhere/x.tr"});
     EXPECT_EQ(result.exitCode, 8);
-    EXPECT_EQ(result.err, "treehfs: /nowhere/x.tr: cannot read the script\n");
+    EXPECT_EQ(result.err, "treehfs: /nowhere/x.tr: cannot read the script: no such file\n");
+}
+
+TEST(ScriptParsed, MarkOfUtf8AtTheStartIsPassedOver) {
+    const std::string path = TempFile("marked.tr", "\xEF\xBB\xBF#!treehfs apply\nstate\n");
+    EXPECT_EQ(RunTool("apply", {"--new", "1M", path}).err, "");
+    EXPECT_EQ(RunTool("apply", {"--new", "1M", path}).exitCode, 0);
+    std::remove(path.c_str());
 }
 
 TEST(ScriptHandbook, NamesEveryOperationAndField) {

@@ -138,6 +138,26 @@ TEST(ScriptFault, EachServiceFailsWhenTold) {
               "19 check  00000000 ok errors=0 warnings=0 nodes=2\n");
 }
 
+TEST(ScriptFault, TreeThatCannotBeOpenedIsNotCalledAbsent) {
+    const std::string image = TempPath("fault.img");
+    Apply("1M,node=512", "", {"--save", image, "--force"});
+    const std::string script = TempFile("fault.tr",
+                                        "fail read\n"
+                                        "find 2:a\n"
+                                        "use attributes\n"
+                                        "fail read\n"
+                                        "use extents\n");
+    EXPECT_EQ(RunTool("apply", {image, script}).out,
+              "1 fail   00000000 ok fail=read after=0 times=1\n"
+              "2 find   A0000301 status\n"
+              "3 use    00000000 ok tree=attributes\n"
+              "4 fail   00000000 ok fail=read after=0 times=1\n"
+              "5 use    A0000301 status tree=extents\n" +
+                  script + ": 5 operations, 3 ok, 2 A0000301, 2 unexpected\n");
+    std::remove(image.c_str());
+    std::remove(script.c_str());
+}
+
 TEST(ScriptFault, OnlyOnVolumesInMemory) {
     const std::string image = TempPath("fault.img");
     Apply("1M", "state\n", {"--save", image});

@@ -119,7 +119,9 @@ TEST_F(Completion, OperationsFirst) {
 
 TEST_F(Completion, TreesAndStatuses) {
     EXPECT_EQ(Candidates("use ", "c"), Words{"catalog"});
-    EXPECT_EQ(Candidates("expect ", "no"), (Words{"no-memory", "not-found", "no-space"}));
+    EXPECT_EQ(Candidates("expect ", "no"),
+              (Words{"no-memory", "not-found", "no-space", "no-tree"}));
+    EXPECT_EQ(Candidates("expect ", "j"), Words{"journal-full"});
 }
 
 TEST_F(Completion, KeysOfTheTreeInUse) {

@@ -4,6 +4,7 @@ code that belongs to it."""
 import json
 import os
 import struct
+import subprocess
 
 import harness
 import volume_bytes as vb
@@ -154,6 +155,38 @@ expect(["node", good, "roof"], 16,
 expect(["ls", good, "--color", "blue"], 16,
        "treehfs ls: --color: 'blue' is none of auto|always|never")
 expect(["ls", good, "--map", "700"], 16, "treehfs ls: --map: 700 is not a power of two")
+expect(["node", good, "-1"], 16, "treehfs node: unknown option -1")
+expect(["info", ""], 16, "treehfs info: IMAGE is empty: treehfs info IMAGE")
+expect(["ls", "two.img", "--partition", "1", "--offset", "8s"], 16,
+       "treehfs ls: --partition and --offset both say where the volume starts: give one of them")
+expect(["find", good, "--key", "2:alpha", "--name", "beta"], 16,
+       "treehfs find: --key, --nearest and --block stand alone: other conditions are for lists")
+expect(["find", good, "--block", "2", "/beta"], 16,
+       "treehfs find: --key, --nearest and --block stand alone: other conditions are for lists")
+expect(["ls", good, "--progress-fd", "99"], 16,
+       "treehfs ls: --progress-fd: descriptor 99 is not open")
+expect(["apply", "--new", "1M,node", "nope.tr"], 8,
+       "treehfs: nope.tr: cannot read the script: no such file")
+write("look.tr", b"state\n")
+expect(["apply", "--new", "1M,node", "look.tr"], 16,
+       "treehfs: --new: 'node' needs a value: "
+       "SIZE[,block=N][,map=N][,node=N][,clump=N][,case][,empty]")
+expect(["apply", "--new", "999T", "look.tr"], 16,
+       "treehfs: --new: 1,098,412,116,148,224 bytes are too many blocks of 4,096: "
+       "choose a larger block size")
+expect(["apply", "--new", "1M", "look.tr", "--undo", "x.undo"], 16,
+       "treehfs apply: --undo is for --write: without it the image stays as it is")
+expect(["format", "new.img", "--size", "1M", "--name", ""], 16,
+       "treehfs: a name of 0 UTF-16 units cannot be stored: 1 to 255 can")
+expect(["format", "new.img", "--size", "1M", "--node-size", "c=4096,c=8192"], 16,
+       "treehfs: --node-size: 'c=8192' gives a tree a second size: give each tree one")
+expect(["format", "new.img", "--size", "99999T"], 16,
+       "treehfs: new.img: 109,950,063,265,972,224 bytes are too many blocks of 4,096: "
+       "choose a larger block size")
+checks.check(not (folder / "new.img").exists(), "what format refuses leaves no file")
+write("strange.tr", b"inser\x1b]0;x\x07 2:a\n")
+expect(["apply", "--new", "1M", "strange.tr"], 16,
+       "strange.tr:1: unknown operation 'inser\\x1b]0;x\\x07'")
 expect(["--vers"], 16, "treehfs: unknown option --vers (did you mean --version?)")
 expect([], 16, "treehfs: no command given: treehfs help lists them")
 
@@ -165,18 +198,25 @@ expect(["ls", good, "-o", good, "--force"], 8,
 code, out, err = harness.text("ls", good, "-o", "there.txt", "--force", cwd=folder)
 checks.equal((code, out, (folder / "there.txt").read_text()), (0, "", "alpha\nbeta\ngamma\nlink\n"),
              "-o FILE --force")
+code, out, err = harness.text("ls", good, "-o", "-", cwd=folder)
+checks.equal((code, out, (folder / "-").exists()), (0, "alpha\nbeta\ngamma\nlink\n", False),
+             "-o - is standard output")
+# Refused before the work, not behind it.
+expect(["apply", "--new", "1M", "look.tr", "--save", "there.txt"], 8,
+       "treehfs: there.txt exists: --force replaces it")
+checks.equal(harness.run("apply", "--new", "1M", "look.tr", "--save", "there.txt", cwd=folder)[1],
+             b"", "--save: nothing has run")
 expect(["ls", good, "/nope", "-o", "never.txt"], 1,
        "treehfs: good.img: /nope: not found; / has 4 entries")
 checks.check(not (folder / "never.txt").exists() and not (folder / "never.txt.part").exists(),
              "a command that failed leaves no file")
 if os.path.exists("/dev/full"):
-    with open("/dev/full", "wb") as full:
-        import subprocess
-        done = subprocess.run([harness.tool(), "ls", folder / good], stdout=full,
-                              stderr=subprocess.PIPE)
-    checks.equal((done.returncode, done.stderr.decode()),
-                 (8, "treehfs: standard output: cannot write: no space left on the disk\n"),
-                 "full disk")
+    for words in (["ls", folder / good], ["help"], ["help", "ls"], ["ls", "--help"]):
+        with open("/dev/full", "wb") as full:
+            done = subprocess.run([harness.tool(), *words], stdout=full, stderr=subprocess.PIPE)
+        checks.equal((done.returncode, done.stderr.decode()),
+                     (8, "treehfs: standard output: cannot write: no space left on the disk\n"),
+                     "full disk: %s" % words)
 
 # --- errors for programs ---------------------------------------------------------------------
 code, out, err = harness.text("ls", "--json", good, "/nope", cwd=folder)

@@ -21,11 +21,12 @@ fallen[0][2], fallen[0][4] = fallen[0][4], fallen[0][2]
 (folder / "good.img").write_bytes(vb.volume())
 
 
-def on_terminal(*arguments):
+def on_terminal(*arguments, **environment):
     """Everything the program writes when it runs on a terminal."""
     main, other = pty.openpty()
+    usual = {name: value for name, value in os.environ.items() if name != "NO_COLOR"}
     process = subprocess.Popen([harness.tool(), *arguments], cwd=folder, stdin=other, stdout=other,
-                               stderr=other)
+                               stderr=other, env={**usual, "TERM": "xterm", **environment})
     os.close(other)
     shown = b""
     while True:
@@ -50,6 +51,14 @@ steady = re.compile(rb"\d+\.\d\d s")
 checks.equal(steady.sub(b"", without), steady.sub(b"", plain[1]), "but for colours it is the same")
 checks.check(b"\x1b" not in on_terminal("check", "--color", "never", "order.img")[1],
              "--color never on a terminal")
+for name, value in (("NO_COLOR", "1"), ("TERM", "dumb")):
+    checks.check(b"\x1b" not in on_terminal("check", "order.img", **{name: value})[1],
+                 "no colours with %s=%s" % (name, value))
+    checks.check(b"\x1b[31m" in on_terminal("check", "--color", "always", "order.img",
+                                            **{name: value})[1],
+                 "--color always with %s=%s" % (name, value))
+checks.check(b"\x1b[31m" in on_terminal("check", "order.img", NO_COLOR="")[1],
+             "an empty NO_COLOR is none")
 checks.check(b"\x1b[31m" in harness.run("check", "--color", "always", "order.img", cwd=folder)[1],
              "--color always in a pipe")
 code, shown = on_terminal("check", "order.img", "--json")

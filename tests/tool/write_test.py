@@ -345,4 +345,23 @@ else:
                 break
             time.sleep(0.1)
 
+# --- numbers of files that the caller has closed -------------------------------------------------
+# The image would get one of them, and what is meant for the terminal.
+volume("closed.img")
+script("look.tr", "find 2:a\nstate\n")
+before = (folder / "closed.img").read_bytes()
+for closed in ((0,), (1,), (2,), (0, 1, 2)):
+    def close_them(numbers=closed):
+        for number in numbers:
+            os.close(number)
+    done = subprocess.run([harness.tool(), "apply", "closed.img", "look.tr", "--write"], cwd=folder,
+                          capture_output=True, preexec_fn=close_them)
+    checks.equal(done.returncode, 8 if 1 in closed else 0, "closed: %s" % (closed,))
+    checks.check((folder / "closed.img").read_bytes() == before,
+                 "closed: %s: the image has changed" % (closed,))
+
+# --- a volume that cannot be made replaces nothing -----------------------------------------------
+refused("treehfs: closed.img: block size 3,000 is not a power of two from 512 to 65,536",
+        "format", "closed.img", "--size", "1M", "--force", "--block-size", "3000", code=16)
+
 checks.finish()

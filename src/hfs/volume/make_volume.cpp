@@ -358,13 +358,24 @@ Problem Fill(BlockDevice* device, const FormatOptions& options, const Plan& plan
 
 }  // namespace
 
+namespace {
+
+Problem PlanVolume(u64 size, const FormatOptions& options, Plan* plan) {
+    const Problem problem = CheckOptions(size, options);
+    return problem ? problem : MakePlan(size, options, plan);
+}
+
+}  // namespace
+
+Problem CheckFormat(u64 size, const FormatOptions& options) {
+    Plan plan;
+    return PlanVolume(size, options, &plan);
+}
+
 std::unique_ptr<ImageVolume> MakeVolume(std::unique_ptr<BlockDevice> device,
                                         const FormatOptions& options, Problem* problem) {
     Plan plan;
-    *problem = CheckOptions(device->Size(), options);
-    if (!*problem) {
-        *problem = MakePlan(device->Size(), options, &plan);
-    }
+    *problem = PlanVolume(device->Size(), options, &plan);
     if (!*problem) {
         *problem = WriteProblem(WritePlan(device.get(), plan));
     }
@@ -388,6 +399,10 @@ std::unique_ptr<ImageVolume> MakeVolume(std::unique_ptr<BlockDevice> device,
 
 std::unique_ptr<ImageVolume> MakeMemoryVolume(u64 size, const FormatOptions& options,
                                               Problem* problem) {
+    *problem = CheckFormat(size, options);
+    if (*problem) {
+        return nullptr;  // a device of that size may be more than the memory has pages for
+    }
     FormatOptions zeroed = options;
     zeroed.deviceIsZero = true;
     return MakeVolume(std::make_unique<MemoryDevice>(size), zeroed, problem);

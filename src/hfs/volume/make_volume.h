@@ -40,6 +40,9 @@ struct FormatOptions {
     u32 mapBlockSize = 0;               // of the mounted volume; 0: the smallest node size
 };
 
+// Whether a volume of `size` bytes can be made so: what MakeVolume would refuse before it writes.
+Problem CheckFormat(u64 size, const FormatOptions& options);
+
 // Formats `device` and mounts it with Access::kWrite. Null with `*problem` set.
 std::unique_ptr<ImageVolume> MakeVolume(std::unique_ptr<BlockDevice> device,
                                         const FormatOptions& options, Problem* problem);
