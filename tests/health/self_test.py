@@ -189,6 +189,12 @@ class Symbols(unittest.TestCase):
         for name in ("malloc", "_Znwm", "__cxa_throw", "_ZTVN10__cxxabiv1E", "printf", "memchr"):
             self.assertEqual(symbols.judge({name}, set()), [f"undefined symbol {name}"])
 
+    def test_what_a_driver_supplies_is_named(self):
+        needed = {"memcpy", "_ZN4VELK11FoldHfsUnitEt", "__ubsan_handle_x"}
+        self.assertEqual(symbols.unnamed(needed, "`memcpy` and `FoldHfsUnit`"), [])
+        self.assertEqual(symbols.unnamed(needed, "`memcpy`"),
+                         ["docs/porting.md does not name _ZN4VELK11FoldHfsUnitEt"])
+
 
 class Stack(unittest.TestCase):
     LISTING = ("0000 <Small()>:\n  0: push   %rbp\n  1: sub    $0x7f8,%rsp\n"

@@ -1,9 +1,9 @@
 #!/usr/bin/env python3
 """The engine library needs nothing but the platform beneath it: its undefined symbols are memory
 moves, the platform's functions, and what the compiler adds. So it has no heap of its own, no
-exceptions, no run-time types.
+exceptions, no run-time types. docs/porting.md names everything that a driver may have to supply.
 
-usage: symbols.py ENGINE_LIBRARY [OTHER_LIBRARY_OF_THE_PROJECT...]"""
+usage: symbols.py ENGINE_LIBRARY PLATFORM_LIBRARY [OTHER_LIBRARY_OF_THE_PROJECT...]"""
 
 import re
 import subprocess
@@ -11,11 +11,13 @@ import sys
 
 import common
 
+# What the compiler adds.
+ADDED = re.compile(
+    r"__stack_chk_fail|_GLOBAL_OFFSET_TABLE_"
+    r"|__(?:asan|ubsan|sanitizer|gcov|llvm|sancov)_\w+")
 ALLOWED = re.compile(
-    r"(?:memcpy|memmove|memset|memcmp"
-    r"|velk_\w+|_VELKTrace|VELKError|VELK_DumpMemory"
-    r"|__stack_chk_fail|_GLOBAL_OFFSET_TABLE_"
-    r"|__asan_\w+|__ubsan_\w+|__sanitizer_\w+|__gcov_\w+|__llvm_\w+|__sancov_\w+)")
+    r"memcpy|memmove|memset|memcmp"
+    r"|velk_\w+|_VELKTrace|VELKError|VELK_DumpMemory|" + ADDED.pattern)
 
 
 def symbols(library, defined):
@@ -34,11 +36,21 @@ def judge(undefined, provided):
             if not ALLOWED.fullmatch(name)]
 
 
-def check(_root, engine, *others):
-    provided = set()
+def unnamed(undefined, guide):
+    """What the text for people who bring their own platform does not name."""
+    named = re.findall(r"`(\w+)`", guide)
+    return [f"docs/porting.md does not name {name}" for name in sorted(undefined)
+            if not ADDED.fullmatch(name) and not any(each in name for each in named)]
+
+
+def check(root, engine, platform, *others):
+    needed = symbols(engine, False)
+    provided = symbols(platform, True)
+    guide = (root / "docs" / "porting.md").read_text(encoding="utf-8")
+    findings = unnamed(needed - provided, guide)
     for other in others:
         provided |= symbols(other, True)
-    return judge(symbols(engine, False), provided)
+    return judge(needed, provided) + findings
 
 
 if __name__ == "__main__":
