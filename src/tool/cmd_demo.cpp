@@ -1,4 +1,7 @@
 // demo: what the engine does, shown on a volume made in memory.
+#include <unistd.h>
+
+#include <array>
 #include <cstdio>
 
 #include "hfs/check/check.h"
@@ -73,15 +76,45 @@ void Draw(Session* session, const std::string& path) {
     file.Close();
 }
 
+// Whether the file is the volume of an earlier run: its volume header is the one of `made`.
+bool IsOfEarlierRun(const std::string& path, ImageVolume* made) {
+    std::array<u8, kHeaderSize> here{};
+    std::array<u8, kHeaderSize> wanted{};
+    std::FILE* file = std::fopen(path.c_str(), "rb");
+    const bool isRead = file != nullptr &&
+                        std::fseek(file, static_cast<long>(kHeaderOffset), SEEK_SET) == 0 &&
+                        std::fread(here.data(), 1, here.size(), file) == here.size();
+    if (file != nullptr) {
+        std::fclose(file);
+    }
+    return isRead && made->ReadVolume(kHeaderOffset, wanted.data(), wanted.size()) == kOk &&
+           here == wanted;
+}
+
+// Files of the same names that nobody made here are somebody's.
+void CheckReplaces(const std::string& image, const std::string& picture, ImageVolume* made) {
+    const bool isThere = access(image.c_str(), F_OK) == 0;
+    if (isThere && !IsOfEarlierRun(image, made)) {
+        ThrowFailed("", image + " exists", "--force replaces it");
+    }
+    if (!isThere && access(picture.c_str(), F_OK) == 0) {
+        ThrowFailed("", picture + " exists", "--force replaces it");
+    }
+}
+
 int RunDemo(Invocation* call) {
     std::string folder = ".";
     call->options.Text("--folder", &folder, "DIR", "where demo.img and demo.svg go (here)");
+    call->options.Flag("--force", &call->force, "replace files that no earlier run has made");
     call->Parse();
     const std::string imagePath = folder + "/demo.img";
     const std::string picturePath = folder + "/demo.svg";
 
     DemoFigures figures;
     const std::unique_ptr<ImageVolume> made = MakeDemoVolume(&figures);
+    if (!call->force) {
+        CheckReplaces(imagePath, picturePath, made.get());
+    }
     call->out.Print("a volume of {} in memory: {} and {} inserted, {} deleted\n\n", "64 MiB",
                     Counted(figures.folders, "folder", "folders"),
                     Counted(figures.inserted, "file", "files"), Grouped(figures.deleted));

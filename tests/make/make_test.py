@@ -201,6 +201,16 @@ class Demo(Made):
         self.assertEqual(lines[-1], "all 51 invariants hold")
         self.good("check", "--full", "--warnings-as-errors", "demo.img")
 
+    def test_replaces_only_what_an_earlier_run_made(self):
+        for name in ("demo.svg", "demo.img"):
+            with open(self.path(name), "w", encoding="utf-8") as file:
+                file.write("somebody's")
+            self.refused(8, "treehfs: ./%s exists: --force replaces it" % name, "demo")
+            with open(self.path(name), encoding="utf-8") as file:
+                self.assertEqual(file.read(), "somebody's")
+        self.good("demo", "--force")
+        self.good("demo")
+
     def test_needs_a_folder_it_can_write_to(self):
         self.refused(8, "treehfs: nowhere/demo.img: cannot be written: choose another folder with "
                      "--folder", "demo", "--folder", "nowhere")
