@@ -7,9 +7,9 @@ namespace VELK::tool {
 
 namespace {
 
-// Whether `unit` is in the set that begins behind the bracket at `*at`; `*at` ends behind it. A
+// Whether `point` is in the set that begins behind the bracket at `*at`; `*at` ends behind it. A
 // bracket that is never closed stands for itself.
-bool TakeSet(NameView pattern, std::size_t* at, char16_t unit) {
+bool TakeSet(std::u32string_view pattern, std::size_t* at, char32_t point) {
     std::size_t i = *at + 1;
     const bool negated = i < pattern.size() && (pattern[i] == '!' || pattern[i] == '^');
     i += negated ? 1u : 0u;
@@ -17,28 +17,28 @@ bool TakeSet(NameView pattern, std::size_t* at, char16_t unit) {
     const std::size_t first = i;
     for (; i < pattern.size() && (pattern[i] != ']' || i == first); ++i) {
         if (i + 2 < pattern.size() && pattern[i + 1] == '-' && pattern[i + 2] != ']') {
-            inside = inside || (unit >= pattern[i] && unit <= pattern[i + 2]);
+            inside = inside || (point >= pattern[i] && point <= pattern[i + 2]);
             i += 2;
         } else {
-            inside = inside || unit == pattern[i];
+            inside = inside || point == pattern[i];
         }
     }
     if (i >= pattern.size()) {
         *at += 1;
-        return unit == '[';
+        return point == '[';
     }
     *at = i + 1;
     return inside != negated;
 }
 
-// Whether the pattern's element at `*at` takes `unit`; `*at` ends behind the element.
-bool TakeOne(NameView pattern, std::size_t* at, char16_t unit) {
+// Whether the pattern's element at `*at` takes `point`; `*at` ends behind the element.
+bool TakeOne(std::u32string_view pattern, std::size_t* at, char32_t point) {
     switch (pattern[*at]) {
         case '?':
             *at += 1;
             return true;
         case '[':
-            return TakeSet(pattern, at, unit);
+            return TakeSet(pattern, at, point);
         case '\\':
             *at += *at + 1 < pattern.size() ? 1u : 0u;
             break;
@@ -46,14 +46,14 @@ bool TakeOne(NameView pattern, std::size_t* at, char16_t unit) {
             break;
     }
     *at += 1;
-    return pattern[*at - 1] == unit;
+    return pattern[*at - 1] == point;
 }
 
 // One star is remembered at a time: a later one makes the earlier one's choice final.
-bool Match(NameView pattern, NameView name) {
+bool Match(std::u32string_view pattern, std::u32string_view name) {
     std::size_t at = 0;
     std::size_t from = 0;
-    std::size_t star = NameView::npos;
+    std::size_t star = std::u32string_view::npos;
     std::size_t starFrom = 0;
     while (from < name.size()) {
         if (at < pattern.size() && pattern[at] == '*') {
@@ -65,7 +65,7 @@ bool Match(NameView pattern, NameView name) {
             from += 1;
             continue;
         }
-        if (star == NameView::npos) {
+        if (star == std::u32string_view::npos) {
             return false;
         }
         at = star;
@@ -84,13 +84,33 @@ void Fold(NameUnits* units) {
     }
 }
 
+bool IsPair(char16_t high, char16_t low) {
+    return high >= 0xD800 && high < 0xDC00 && low >= 0xDC00 && low < 0xE000;
+}
+
+// Two units that stand for one character count once; half of them stands for itself.
+std::u32string PointsOf(const NameUnits& units) {
+    std::u32string points;
+    points.reserve(units.size());
+    for (std::size_t i = 0; i < units.size(); ++i) {
+        if (i + 1 < units.size() && IsPair(units[i], units[i + 1])) {
+            points += static_cast<char32_t>(0x10000 + ((units[i] - 0xD800) << 10) +
+                                            (units[i + 1] - 0xDC00));
+            i += 1;
+        } else {
+            points += units[i];
+        }
+    }
+    return points;
+}
+
 // Case is folded before composing: the folding table knows no composed letters.
-NameUnits Prepared(const NameUnits& units, bool ignoreCase) {
+std::u32string Prepared(const NameUnits& units, bool ignoreCase) {
     NameUnits decomposed = DecomposedUnits(units);
     if (ignoreCase) {
         Fold(&decomposed);
     }
-    return ComposedUnits(decomposed);
+    return PointsOf(ComposedUnits(decomposed));
 }
 
 }  // namespace

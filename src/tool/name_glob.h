@@ -16,7 +16,7 @@ public:
     bool Matches(const u8* unitsBe, u32 count) const;
 
 private:
-    NameUnits pattern_;
+    std::u32string pattern_;
     bool ignoreCase_;
 };
 

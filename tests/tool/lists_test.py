@@ -34,6 +34,14 @@ checks.equal(keys("--where", "mode=0xa1ed"), ['2:"link"'], "by mode")
 checks.equal(keys("--where", "modified<2023-02-02", "--where", "node=2"), ['17:"inner"'], "by date")
 checks.equal(keys("--order", "dfs", "--where", "node=3"), ['1:"Vol"', '16:""'], "index records")
 checks.equal(keys("--where", "tree=catalog", "--where", "id=20"), ['17:"inner"'], "a tree by name")
+(folder / "names.tr").write_text(
+    'insert 2:"\\u00e9" file{id:50}\ninsert 2:"\\ud83c\\udf08" file{id:51}\n'
+    'insert 2:"\\ud800" file{id:52}\ninsert 2:two file{id:53}\n')
+out_of("apply", "--new", "1M", "-q", "--save", "names.img", "names.tr")
+for pattern, paths in (("?", ["/\u00e9", "/\\ud800", "/\U0001f308"]), ("??", []),
+                       ("[\U0001f300-\U0001f310]", ["/\U0001f308"]), ("[!\u00e9]?*", ["/two"])):
+    checks.equal(out_of("find", "names.img", "--name", pattern, code=0 if paths else 1), paths,
+                 "characters that %s takes" % pattern)
 for condition, fault in (
         ("sise=5", "no record of the catalog tree has a 'sise' (did you mean size?): "
                    "dump --values full shows the fields"),
