@@ -158,6 +158,19 @@ TEST(ScriptFault, TreeThatCannotBeOpenedIsNotCalledAbsent) {
     std::remove(script.c_str());
 }
 
+TEST(ScriptFault, TreeIsOpenedWhenThereIsMemoryAgain) {
+    const std::string image = TempPath("fault.img");
+    Apply("1M,node=512", "", {"--save", image, "--force"});
+    const std::string script = TempFile("fault.tr", "fail alloc\nfind 2:a\nfind 2:a\n");
+    EXPECT_EQ(RunTool("apply", {image, script, "-q"}).out,
+              "1 fail   00000000 ok fail=alloc after=0 times=1\n"
+              "2 find   A0000107 no-memory\n"
+              "3 find   00000000 ok found=no at=1/2\n" +
+                  script + ": 3 operations, 2 ok, 1 no-memory, 1 unexpected\n");
+    std::remove(image.c_str());
+    std::remove(script.c_str());
+}
+
 TEST(ScriptFault, OnlyOnVolumesInMemory) {
     const std::string image = TempPath("fault.img");
     Apply("1M", "state\n", {"--save", image});

@@ -271,7 +271,7 @@ CBTreeHfs* ImageVolume::State::Open(u32 fileId) {
     const Problem kept = slot->problem;
     ResetTree(slot, fileId);
     slot->problem = kept;
-    slot->wasTried = true;
+    slot->wasTried = status != kErrNoMemory;  // there may be memory the next time
     return nullptr;
 }
 
