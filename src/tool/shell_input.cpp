@@ -2,12 +2,14 @@
 // library.
 #include "tool/shell_input.h"
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 
+#include "tool/errors.h"
 #include "tool/progress.h"
 
 #ifdef TREEHFS_EDITLINE
@@ -37,6 +39,11 @@ char** Complete(const char* text, int start, int) {
 }
 
 char g_wordBreaks[] = " \t";
+
+bool HoldsSomething(const std::string& path) {
+    struct stat info;
+    return stat(path.c_str(), &info) == 0 && info.st_size != 0;
+}
 #endif
 
 }  // namespace
@@ -49,8 +56,10 @@ ShellInput::ShellInput(std::string historyFile, Completer completer)
         rl_attempted_completion_function = Complete;
         rl_completer_word_break_characters = g_wordBreaks;
         using_history();
-        if (!historyFile_.empty()) {
-            read_history(historyFile_.c_str());
+        if (!historyFile_.empty() && read_history(historyFile_.c_str()) != 0 &&
+            HoldsSomething(historyFile_)) {
+            ThrowFailed(historyFile_, "holds no history and would be replaced",
+                        "choose another name for --history");
         }
     }
 #else
@@ -61,7 +70,9 @@ ShellInput::ShellInput(std::string historyFile, Completer completer)
 ShellInput::~ShellInput() {
 #ifdef TREEHFS_EDITLINE
     if (isTerminal_ && !historyFile_.empty()) {
-        write_history(historyFile_.c_str());
+        if (write_history(historyFile_.c_str()) != 0) {
+            PrintNote(historyFile_, Failure("the history cannot be kept there", ""));
+        }
     }
     g_completer = nullptr;
 #endif

@@ -99,4 +99,28 @@ checks.check(columns in ([], [len("catalog(WRITE)> hel") + 1]), "columns %s" % c
 shell.process.send_signal(signal.SIGTERM)
 shell.ends(32, "a signal that asks for the end")
 
+# --- the history ---------------------------------------------------------------------------------
+shell = Terminal("new.img", "--history", "typed")
+shell.until(PROMPT)
+shell.type("state\n", PROMPT)
+shell.type("exit\n", "exit\n")
+shell.ends(0, "a shell that keeps its history")
+checks.check("state\nexit" in (folder / "typed").read_text("utf-8"), "what was typed is kept")
+shell = Terminal("new.img", "--history", "typed")
+shell.until(PROMPT)
+shell.type("\x1b[A\x1b[A", "state$")
+shell.type("\n", PROMPT)
+shell.type("exit\n", "exit\n")
+shell.ends(0, "the next shell knows it")
+image = (folder / "new.img").read_bytes()
+shell = Terminal("new.img", "--history", "new.img")
+shell.until("treehfs: new.img: holds no history and would be replaced: "
+            "choose another name for --history\n")
+shell.ends(8, "a file that holds something else")
+checks.check((folder / "new.img").read_bytes() == image, "it is as it was")
+shell = Terminal("new.img", "--history", "nowhere/typed")
+shell.until(PROMPT)
+shell.type("exit\n", "nowhere/typed: the history cannot be kept there\n")
+shell.ends(0, "a history that cannot be kept")
+
 checks.finish()
