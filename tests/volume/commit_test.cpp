@@ -1,27 +1,17 @@
 // Changes: committed all together, gone after a restore, kept out of the image by an overlay.
 #include <gtest/gtest.h>
 
-#include <cstring>
-
 #include "capture.h"
 #include "disk_builder.h"
 #include "hfs/volume/convert.h"
 #include "hfs/volume/make_volume.h"
 #include "hfs/volume/wire.h"
+#include "small_volume.h"
 
 namespace VELK {
 namespace {
 
-// Catalog key of a thread-like record in host order: number as parent, empty name.
-struct alignas(4) NumberKey {
-    u8 bytes[kCatKeyName] = {};
-
-    explicit NumberKey(u32 number) {
-        const u16 length = kCatKeyFixed;
-        std::memcpy(bytes, &length, sizeof length);
-        std::memcpy(bytes + kCatKeyParentId, &number, sizeof number);
-    }
-};
+using test::NumberKey;
 
 class CommitTest : public testing::Test {
 protected:
@@ -30,30 +20,9 @@ protected:
         ASSERT_NE(nullptr, volume_) << problem_.Text();
         size_ = size;
     }
-    static FormatOptions Small() {
-        FormatOptions options;
-        options.blockSize = 512;
-        options.catalogNodeSize = 512;
-        options.extentsNodeSize = 512;
-        options.attributesNodeSize = 512;
-        options.clumpSize = 512;
-        return options;
-    }
     CBTreeHfs* Catalog() { return volume_->Tree(kCatalogFileId, &problem_); }
-    int Insert(u32 number) {
-        const NumberKey key(number);
-        const u8 data[100] = {0xFF, 0xFF};
-        return Catalog()->InsertRecord(key.bytes, number, data, sizeof data);
-    }
-    bool Has(u32 number) {
-        const NumberKey key(number);
-        HfsFindData path;
-        bool found = false;
-        EXPECT_EQ(0, Catalog()->FindEntry(reinterpret_cast<const BTreeKey*>(key.bytes), number,
-                                          &path, &found, nullptr, nullptr, nullptr, nullptr));
-        path.ClearPath();
-        return found;
-    }
+    int Insert(u32 number) { return test::InsertNumber(volume_.get(), number); }
+    bool Has(u32 number) { return test::HasNumber(volume_.get(), number); }
     // Mounts what was committed anew; changes stay in memory.
     void ReopenWithBudget(u64 cacheBudget) {
         const std::vector<u8> image = Bytes();
@@ -78,7 +47,7 @@ protected:
 };
 
 TEST_F(CommitTest, NothingReachesTheDeviceBeforeTheCommit) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     const std::vector<u8> before = Bytes();
     ASSERT_EQ(0, Insert(100));
     EXPECT_EQ(before, Bytes());
@@ -88,14 +57,14 @@ TEST_F(CommitTest, NothingReachesTheDeviceBeforeTheCommit) {
 }
 
 TEST_F(CommitTest, ACommitWithoutChangesWritesNothing) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     const u64 written = volume_->CommittedBytes();
     ASSERT_EQ(0, volume_->Commit(0));
     EXPECT_EQ(written, volume_->CommittedBytes());
 }
 
 TEST_F(CommitTest, RestoreLeavesTheLastCommitByteForByte) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     for (u32 i = 100; i < 200; ++i) {
         ASSERT_EQ(0, Insert(i));
     }
@@ -126,7 +95,7 @@ TEST_F(CommitTest, RestoreLeavesTheLastCommitByteForByte) {
 
 // The work that a restore threw away can be done again and gives the bytes it would have given.
 TEST_F(CommitTest, WorkAfterARestoreEqualsUndisturbedWork) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     for (u32 i = 100; i < 2000; ++i) {
         ASSERT_EQ(0, Insert(i));
     }
@@ -136,7 +105,7 @@ TEST_F(CommitTest, WorkAfterARestoreEqualsUndisturbedWork) {
     }
     ASSERT_EQ(0, volume_->Commit(0));
     const std::vector<u8> disturbed = Bytes();
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     for (u32 i = 100; i < 1000; ++i) {
         ASSERT_EQ(0, Insert(i));
     }
@@ -145,7 +114,7 @@ TEST_F(CommitTest, WorkAfterARestoreEqualsUndisturbedWork) {
 }
 
 TEST_F(CommitTest, ATreeMadeAndNotCommittedIsGoneAfterARestore) {
-    FormatOptions options = Small();
+    FormatOptions options = test::SmallTrees();
     options.withAttributes = false;
     Make(1 << 20, options);
     const std::vector<u8> before = Bytes();
@@ -161,7 +130,7 @@ TEST_F(CommitTest, ATreeMadeAndNotCommittedIsGoneAfterARestore) {
 }
 
 TEST_F(CommitTest, OnlyFailuresThatMayHaveChangedSomethingRestore) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     EXPECT_FALSE(volume_->RestoreAfter(kOk));
     EXPECT_FALSE(volume_->RestoreAfter(kErrNotFound));
     EXPECT_FALSE(volume_->RestoreAfter(kErrExists));
@@ -171,7 +140,7 @@ TEST_F(CommitTest, OnlyFailuresThatMayHaveChangedSomethingRestore) {
 }
 
 TEST_F(CommitTest, AFullVolumeRefusesGrowthAndKeepsWhatWasCommitted) {
-    Make(96 << 10, Small());
+    Make(96 << 10, test::SmallTrees());
     int status = 0;
     u32 number = 100;
     while (status == 0 && number < 100000) {
@@ -209,7 +178,7 @@ protected:
 };
 
 TEST_F(OverflowTest, ForksOfMoreThanEightExtentsComeBackWhole) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     GrowInTurn(40);
     ASSERT_EQ(0, volume_->Commit(0));
     const std::vector<HfsExtent> extents = volume_->ForkExtents(kCatalogFileId);
@@ -236,7 +205,7 @@ TEST_F(OverflowTest, ForksOfMoreThanEightExtentsComeBackWhole) {
 }
 
 TEST_F(OverflowTest, RecordsFollowAForkThatGrowsFurther) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     GrowInTurn(12);
     ASSERT_EQ(0, volume_->Commit(0));
     GrowInTurn(12);
@@ -248,7 +217,7 @@ TEST_F(OverflowTest, RecordsFollowAForkThatGrowsFurther) {
 }
 
 TEST_F(OverflowTest, ARestoreDropsRecordsNotCommitted) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     const std::vector<u8> before = Bytes();
     GrowInTurn(20);
     volume_->Restore();
@@ -258,7 +227,7 @@ TEST_F(OverflowTest, ARestoreDropsRecordsNotCommitted) {
 }
 
 TEST_F(OverflowTest, TheExtentsTreeItselfStopsAtEightExtents) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     int status = 0;
     for (u32 i = 0; i < 40 && status == 0; ++i) {
         CBTreeHfs* catalog = volume_->Tree(kCatalogFileId, &problem_);
@@ -271,7 +240,7 @@ TEST_F(OverflowTest, TheExtentsTreeItselfStopsAtEightExtents) {
 }
 
 TEST_F(CommitTest, AnOverlayNeverWritesTheImage) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     const std::vector<u8> image = Bytes();
     auto device = std::make_unique<MemoryDevice>(image.size());
     MemoryDevice* home = device.get();
@@ -292,7 +261,7 @@ TEST_F(CommitTest, AnOverlayNeverWritesTheImage) {
 }
 
 TEST_F(CommitTest, AReadOnlyVolumeRefusesEveryChange) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     const std::vector<u8> image = Bytes();
     auto device = std::make_unique<MemoryDevice>(image.size());
     ASSERT_TRUE(device->Write(0, image.data(), image.size()).Ok());
@@ -307,7 +276,7 @@ TEST_F(CommitTest, AReadOnlyVolumeRefusesEveryChange) {
 }
 
 TEST_F(CommitTest, HeaderCountsFollowCatalogRecords) {
-    Make(1 << 20, Small());
+    Make(1 << 20, test::SmallTrees());
     volume_->CountCatalogRecord(1, 16, 1);
     volume_->CountCatalogRecord(2, 40, 1);
     volume_->CountCatalogRecord(2, 17, 1);
@@ -452,7 +421,7 @@ TEST_F(WriteTest, BlocksOfSpecialFilesAreNotHandedOutWhateverTheBitmapSays) {
 
 // The cache falls back under its budget, and a path held by a caller stays good.
 TEST_F(CommitTest, TrimCacheKeepsHeldAndModifiedNodes) {
-    FormatOptions small = Small();
+    FormatOptions small = test::SmallTrees();
     small.name = u"Trim";
     Make(1 << 20, small);
     for (u32 i = 100; i < 900; ++i) {
@@ -463,8 +432,8 @@ TEST_F(CommitTest, TrimCacheKeepsHeldAndModifiedNodes) {
     const NumberKey key(500);
     HfsFindData path;
     bool found = false;
-    ASSERT_EQ(0, Catalog()->FindEntry(reinterpret_cast<const BTreeKey*>(key.bytes), 500, &path,
-                                      &found, nullptr, nullptr, nullptr, nullptr));
+    ASSERT_EQ(
+        0, Catalog()->FindEntry(key.Get(), 500, &path, &found, nullptr, nullptr, nullptr, nullptr));
     ASSERT_TRUE(found);
     ASSERT_EQ(0, Insert(1000));
     u64 most = 0;
@@ -486,7 +455,7 @@ TEST_F(CommitTest, TrimCacheKeepsHeldAndModifiedNodes) {
 TEST_F(CommitTest, RandomLookupsStayWithinTheCacheBudget) {
     constexpr u32 kRecords = 6000;
     constexpr u64 kBudget = 64 << 10;
-    Make(4 << 20, Small());
+    Make(4 << 20, test::SmallTrees());
     for (u32 i = 0; i < kRecords; ++i) {
         ASSERT_EQ(0, Insert(100 + i));
     }

@@ -3,7 +3,6 @@
 // undisturbed work.
 #include <gtest/gtest.h>
 
-#include <cstring>
 #include <functional>
 
 #include "capture.h"
@@ -11,21 +10,14 @@
 #include "heap_guard.h"
 #include "hfs/volume/make_volume.h"
 #include "hfs/volume/volume_header.h"
+#include "small_volume.h"
 
 namespace VELK {
 namespace {
 
 constexpr u64 kSize = 512 << 10;
 
-struct alignas(4) NumberKey {
-    u8 bytes[kCatKeyName] = {};
-
-    explicit NumberKey(u32 number) {
-        const u16 length = kCatKeyFixed;
-        std::memcpy(bytes, &length, sizeof length);
-        std::memcpy(bytes + kCatKeyParentId, &number, sizeof number);
-    }
-};
+using test::NumberKey;
 
 std::unique_ptr<ImageVolume> Start() {
     FormatOptions options;

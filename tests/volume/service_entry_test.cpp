@@ -2,12 +2,12 @@
 // of extents that find no room in the volume header are left to the commit.
 #include <gtest/gtest.h>
 
-#include <cstring>
 #include <string>
 
 #include "capture.h"
 #include "hfs/volume/make_volume.h"
 #include "ledger.h"
+#include "small_volume.h"
 
 namespace VELK {
 namespace {
@@ -115,26 +115,11 @@ private:
     HfsService<HfsVolumeOps> behind_;
 };
 
-// A catalog key in host order: the number as parent, an empty name.
-int InsertCatalog(CBTreeHfs* tree, u32 number) {
-    alignas(4) u8 key[kCatKeyName] = {};
-    const u16 length = kCatKeyFixed;
-    std::memcpy(key, &length, sizeof length);
-    std::memcpy(key + kCatKeyParentId, &number, sizeof number);
-    const u8 data[100] = {0xFF, 0xFF};
-    return tree->InsertRecord(key, number, data, sizeof data);
-}
-
 TEST(VolumeServices, ChangeNoTree) {
     const test::Capture capture;
-    FormatOptions options;
-    options.blockSize = 512;
-    options.catalogNodeSize = 512;
-    options.extentsNodeSize = 512;
-    options.attributesNodeSize = 512;
-    options.clumpSize = 512;
     Problem problem;
-    const std::unique_ptr<ImageVolume> volume = MakeMemoryVolume(1 << 20, options, &problem);
+    const std::unique_ptr<ImageVolume> volume =
+        MakeMemoryVolume(1 << 20, test::SmallTrees(), &problem);
     ASSERT_NE(nullptr, volume) << problem.Text();
     Watch watch(volume.get());
     CBTreeHfs* catalog = volume->Tree(kCatalogFileId, &problem);
@@ -145,13 +130,13 @@ TEST(VolumeServices, ChangeNoTree) {
     // Files that grow in turns soon have more pieces than the volume header has room for.
     for (u32 i = 0; i < 60; ++i) {
         for (u32 n = 0; n < 5; ++n) {
-            ASSERT_EQ(0, InsertCatalog(catalog, 100 + i * 5 + n));
+            ASSERT_EQ(0, test::InsertNumber(volume.get(), 100 + i * 5 + n));
         }
         ASSERT_EQ(0, attributes->ExtendBTree(attributes->header.totalNodes + 1, nullptr, &clump));
         ASSERT_EQ(0, volume->Commit(i % 4 == 0 ? 4 : 0));
     }
     for (u32 n = 400; n < 500; ++n) {
-        ASSERT_EQ(0, InsertCatalog(catalog, n));
+        ASSERT_EQ(0, test::InsertNumber(volume.get(), n));
     }
     volume->Restore();
     EXPECT_EQ(watch.entered, std::vector<std::string>{});

@@ -14,25 +14,20 @@ namespace {
 
 constexpr u32 kRecordSize = 100;
 
-struct alignas(4) NumberKey {
-    u8 bytes[kCatKeyName] = {};
-
-    explicit NumberKey(u32 number) {
-        const u16 length = kCatKeyFixed;
-        std::memcpy(bytes, &length, sizeof length);
-        std::memcpy(bytes + kCatKeyParentId, &number, sizeof number);
-    }
-};
-
 }  // namespace
 
-FormatOptions SmallFormat(u64 journalSize) {
+FormatOptions SmallTrees() {
     FormatOptions options;
     options.blockSize = 512;
     options.catalogNodeSize = 512;
     options.extentsNodeSize = 512;
     options.attributesNodeSize = 512;
     options.clumpSize = 512;
+    return options;
+}
+
+FormatOptions SmallFormat(u64 journalSize) {
+    FormatOptions options = SmallTrees();
     options.withAttributes = false;
     options.journalSize = journalSize;
     return options;
@@ -76,6 +71,12 @@ std::unique_ptr<ImageVolume> MountOn(BlockDevice* device, const OpenOptions& opt
                              nullptr, problem);
 }
 
+NumberKey::NumberKey(u32 number) {
+    const u16 length = kCatKeyFixed;
+    std::memcpy(bytes, &length, sizeof length);
+    std::memcpy(bytes + kCatKeyParentId, &number, sizeof number);
+}
+
 int InsertNumber(ImageVolume* volume, u32 number) {
     const NumberKey key(number);
     u8 data[kRecordSize] = {0xFF, 0xFF};
@@ -92,8 +93,8 @@ int UpdateNumber(ImageVolume* volume, u32 number, u8 fill) {
     data[1] = 0xFF;
     CBTreeHfs* tree = volume->Tree(kCatalogFileId, nullptr);
     bool found = false;
-    int status = tree->FindEntry(reinterpret_cast<const BTreeKey*>(key.bytes), number,
-                                 &tree->findData, &found, nullptr, nullptr, nullptr, nullptr);
+    int status = tree->FindEntry(key.Get(), number, &tree->findData, &found, nullptr, nullptr,
+                                 nullptr, nullptr);
     if (status == kOk) {
         status = found ? tree->UpdateKeyAndRecord(nullptr, data) : kErrNotFound;
     }
@@ -110,9 +111,9 @@ bool HasNumber(ImageVolume* volume, u32 number) {
     const NumberKey key(number);
     HfsFindData path;
     bool found = false;
-    EXPECT_EQ(0, volume->Tree(kCatalogFileId, nullptr)
-                     ->FindEntry(reinterpret_cast<const BTreeKey*>(key.bytes), number, &path,
-                                 &found, nullptr, nullptr, nullptr, nullptr));
+    EXPECT_EQ(
+        0, volume->Tree(kCatalogFileId, nullptr)
+               ->FindEntry(key.Get(), number, &path, &found, nullptr, nullptr, nullptr, nullptr));
     path.ClearPath();
     return found;
 }

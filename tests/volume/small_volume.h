@@ -1,5 +1,5 @@
-// Small volumes for tests of what reaches the medium: the device belongs to the test, a cut is a
-// copy of its bytes taken while the volume is mounted.
+// Small volumes with records of no meaning. Where a test asks what reaches the medium, the device
+// belongs to the test, and a cut is a copy of its bytes taken while the volume is mounted.
 #pragma once
 
 #include <memory>
@@ -12,7 +12,8 @@
 
 namespace VELK::test {
 
-// Trees of 512-byte nodes, blocks of 512 bytes.
+// Blocks of 512 bytes and trees of 512-byte nodes: all three; or no attributes tree, and a journal.
+FormatOptions SmallTrees();
 FormatOptions SmallFormat(u64 journalSize);
 
 std::vector<u8> BytesOf(BlockDevice* device);
@@ -25,7 +26,15 @@ OpenOptions Writing(bool force = false);  // with replay
 std::unique_ptr<ImageVolume> MountOn(BlockDevice* device, const OpenOptions& options,
                                      Problem* problem);
 
-// Catalog records with an empty name under the parent `number`, 100 bytes each.
+// Catalog key with an empty name under the parent `number`, in host order.
+struct alignas(4) NumberKey {
+    u8 bytes[kCatKeyName] = {};
+
+    explicit NumberKey(u32 number);
+    const BTreeKey* Get() const { return reinterpret_cast<const BTreeKey*>(bytes); }
+};
+
+// Catalog records with such keys, 100 bytes each.
 int InsertNumber(ImageVolume* volume, u32 number);
 int UpdateNumber(ImageVolume* volume, u32 number, u8 fill);
 int DeleteNumber(ImageVolume* volume, u32 number);

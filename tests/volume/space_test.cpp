@@ -7,6 +7,7 @@
 #include "disk_builder.h"
 #include "hfs/volume/make_volume.h"
 #include "hfs/volume/wire.h"
+#include "small_volume.h"
 
 namespace VELK {
 namespace {
@@ -18,19 +19,10 @@ constexpr unsigned kClump = 512;
 
 class Space : public testing::Test {
 protected:
-    static FormatOptions Small() {
-        FormatOptions options;
-        options.blockSize = 512;
-        options.catalogNodeSize = 512;
-        options.extentsNodeSize = 512;
-        options.attributesNodeSize = 512;
-        options.clumpSize = 512;
-        return options;
-    }
     // A fresh volume of small blocks and nodes as an image.
     static Bytes Fresh(u64 size = 1 << 18) {
         Problem problem;
-        auto volume = MakeMemoryVolume(size, Small(), &problem);
+        auto volume = MakeMemoryVolume(size, test::SmallTrees(), &problem);
         Bytes bytes(static_cast<std::size_t>(size));
         EXPECT_EQ(0, volume->ReadVolume(0, bytes.data(), bytes.size()));
         return bytes;
@@ -163,7 +155,7 @@ TEST_F(Space, AForkThatIsNotMappedInFullKeepsItsSize) {
 
 // Nothing but the extents tree can tell of more than eight extents.
 TEST_F(Space, WithoutAnExtentsTreeAForkHasEightExtents) {
-    FormatOptions options = Small();
+    FormatOptions options = test::SmallTrees();
     options.emptyTrees = true;
     volume_ = MakeMemoryVolume(1 << 20, options, &problem_);
     ASSERT_NE(nullptr, volume_) << problem_.Text();
