@@ -36,11 +36,19 @@ int FailC(int status, std::string text);
 // The same for a failure of an operation on a volume: the medium's problem where it is one.
 int FailOn(const treehfs_volume* handle, u32 tree, int status);
 
+// A handle or pointer that is needed is null.
+int NoHandle();
+
 bool IsTreeId(u32 tree);
 // Reads a key given as bytes; a status with its text kept.
 int KeyFromBytes(u32 tree, const void* key, u32 size, SearchKey* result);
 // Hands bytes out: `*size` says how many there are.
 int PutBytes(const void* bytes, std::size_t count, void* target, u32 capacity, u32* size);
+// The same with a NUL behind the text, which `*size` does not count.
+int PutText(const std::string& text, char* target, u32 capacity, u32* size);
+
+// Cursors give their nodes up before anything changes: a restore would pull them away.
+void ReleaseCursors(treehfs_volume* handle);
 
 // Runs a call of the interface: no exception leaves it.
 template <typename Call>
@@ -76,15 +84,16 @@ bool TakeStruct(const Struct* from, Struct* to) {
     return true;
 }
 
+// The other way; a status with its text kept.
 template <typename Struct>
-bool GiveStruct(const Struct& from, Struct* to) {
-    if (to == nullptr || to->struct_size < sizeof to->struct_size) {
-        return false;
+int GiveStruct(const Struct& from, Struct* to) {
+    if (to->struct_size < sizeof to->struct_size) {
+        return FailC(kErrInvalid, "the struct has no size");
     }
     const u32 size = to->struct_size;
     std::memcpy(to, &from, std::min<std::size_t>(size, sizeof from));
     to->struct_size = size;
-    return true;
+    return kOk;
 }
 
 }  // namespace VELK
