@@ -16,12 +16,14 @@ struct KeyLayout {
     u32 longestName;  // units
 };
 
+// The keys of each tree.
 constexpr KeyLayout kCatalogKeys = {kCatKeyFixed, kCatKeyParentId, 0, kCatKeyNameLength,
                                     (kCatMaxKeyLength - kCatKeyFixed) / 2};
 constexpr KeyLayout kExtentsKeys = {kExtKeyFixed, kExtKeyFileId, kExtKeyStartBlock, 0, 0};
 constexpr KeyLayout kAttributesKeys = {kAttrKeyFixed, kAttrKeyFileId, kAttrKeyStartBlock,
                                        kAttrKeyNameLength, (kAttrMaxKeyLength - kAttrKeyFixed) / 2};
 
+// Those of tree `fileId`.
 constexpr const KeyLayout& KeyLayoutOf(u32 fileId) {
     return fileId == kExtentsFileId      ? kExtentsKeys
            : fileId == kAttributesFileId ? kAttributesKeys
@@ -31,8 +33,10 @@ constexpr const KeyLayout& KeyLayoutOf(u32 fileId) {
 // A key as stored. REQUIRES: bytes that SearchKeyFromStored takes.
 class KeyView {
 public:
+    // Of a key of tree `fileId`; its bytes have to outlive the view.
     KeyView(u32 fileId, const u8* stored) : layout_(KeyLayoutOf(fileId)), bytes_(stored) {}
 
+    // The fields by name; 0 for one that keys of this tree do not have.
     u32 Id() const { return GetBe32(bytes_ + layout_.id); }
     u32 StartBlock() const {
         return layout_.startBlock == 0 ? 0 : GetBe32(bytes_ + layout_.startBlock);
@@ -40,7 +44,7 @@ public:
     u32 NameLength() const {
         return layout_.nameLength == 0 ? 0 : GetBe16(bytes_ + layout_.nameLength);
     }
-    // Its units, big-endian: they follow the fields.
+    // The name's units, big-endian: they follow the fields.
     const u8* Name() const { return bytes_ + kKeyLengthSize + layout_.fixed; }
     // Bytes of length field, fields and name; the key's length field may say more.
     u32 Size() const { return kKeyLengthSize + layout_.fixed + 2 * NameLength(); }

@@ -7,14 +7,16 @@
 namespace VELK {
 
 // The thread of a folder or file as stored; invalid for anything else, or when its name does not
-// fit into the record. REQUIRES (all but IsValid): a valid one.
+// fit into the record.
 class ThreadView {
 public:
+    // Of a record's data, which has to outlive the view.
     ThreadView(const u8* data, u32 size) : data_(data) {
         const u32 type = size >= kThreadFixed ? GetBe16(data) : 0;
         isValid_ = (type == kFolderThread || type == kFileThread) && Size() <= size;
     }
 
+    // Fields may be asked of any thread that has them, the units of the name of a valid one.
     bool IsValid() const { return isValid_; }
     bool IsOfFolder() const { return GetBe16(data_) == kFolderThread; }
     // The folder that its item lies in.
