@@ -204,17 +204,6 @@ std::string VerdictText(const CheckStage& stage, bool color) {
     return text;
 }
 
-// Whether pieces of the tree this stage is about could not be read.
-bool StageIsUnread(const Run& run, const CheckStage& stage) {
-    for (const u32 fileId : {kExtentsFileId, kCatalogFileId, kAttributesFileId}) {
-        if ((run.unreadTrees & (1u << fileId)) != 0 &&
-            std::string(stage.title) == std::string(ForkName(fileId)) + " tree") {
-            return true;
-        }
-    }
-    return false;
-}
-
 void PrintStages(const Run& run, const CheckSummary& summary) {
     Invocation* call = run.call;
     constexpr std::size_t kTitleWidth = 32;
@@ -224,7 +213,7 @@ void PrintStages(const Run& run, const CheckSummary& summary) {
         std::string title = fmt::format("{}/{} {} ", i + 1, summary.stageCount, stage.title);
         title.resize(std::max(title.size(), kTitleWidth), '.');
         std::string verdict = VerdictText(stage, call->color);
-        if (StageIsUnread(run, stage)) {
+        if (stage.tree != 0 && (run.unreadTrees & (1u << stage.tree)) != 0) {
             verdict = (verdict == "ok" ? "" : verdict + ", ") + "not all could be read";
         }
         std::string line = title + " " + fmt::format("{:<{}}", verdict, kVerdictWidth);

@@ -19,9 +19,15 @@ enum StageIndex : u32 {
     kStageCross
 };
 
-constexpr const char* kTitles[kCheckStages] = {"volume header",  "extents tree",
-                                               "catalog tree",   "attributes tree",
-                                               "bad-block list", "trees against each other"};
+constexpr struct {
+    const char* title;
+    u32 tree;
+} kStages[kCheckStages] = {{"volume header", 0},
+                           {"extents tree", kExtentsFileId},
+                           {"catalog tree", kCatalogFileId},
+                           {"attributes tree", kAttributesFileId},
+                           {"bad-block list", 0},
+                           {"trees against each other", 0}};
 
 // Leaf records of the extents tree: those of special files extend their forks, the others are kept
 // for later.
@@ -213,7 +219,8 @@ void RunCross(CheckVolumeState* state) {
 void NameStages(CheckSummary* summary) {
     summary->stageCount = kCheckStages;
     for (u32 i = 0; i < kCheckStages; ++i) {
-        summary->stages[i].title = kTitles[i];
+        summary->stages[i].title = kStages[i].title;
+        summary->stages[i].tree = kStages[i].tree;
     }
 }
 
@@ -263,7 +270,7 @@ CheckSummary CheckVolume(const CheckSource& source, const CheckOptions& options,
     CloseStage(&run, header);
     if (!goesOn) {
         for (u32 i = kStageExtents; i < kCheckStages; ++i) {
-            run.StageAt(i)->why = "the volume header is damaged";
+            run.Summary()->stages[i].why = "the volume header is damaged";
         }
         return *run.Summary();
     }
@@ -280,7 +287,8 @@ CheckSummary CheckTreeBytes(const void* bytes, std::size_t size, const CheckTree
     FlatBytes flat = {static_cast<const u8*>(bytes)};
     CheckRun run({&flat, ReadFlat, size, 0}, options, sink);
     run.Summary()->stageCount = 1;
-    run.Summary()->stages[0].title = CheckFileName(kind.fileId);
+    run.Stage()->title = CheckFileName(kind.fileId);
+    run.Stage()->tree = kind.fileId;
     CheckFile file(&run, kind.fileId);
     file.AddRun(0, size);
     CheckTree tree(&run, &file, {kind.fileId, kind.names});

@@ -145,6 +145,7 @@ enum class CheckVerdict : u8 {
 // What one stage found. Counts are of this stage alone.
 struct CheckStage {
     const char* title = "";                        // "catalog tree"
+    u32 tree = 0;                                  // file ID of the tree it is about, 0: of none
     CheckVerdict verdict = CheckVerdict::kNotRun;  // how it ended
     const char* why = "";                          // of kNotRun and kStopped: "needs --full"
     // Findings by severity.

@@ -25,13 +25,4 @@ inline bool IsPowerOfTwo(u64 value) {
     return value != 0 && (value & (value - 1)) == 0;
 }
 
-inline bool IsZero(const u8* bytes, u64 size) {
-    for (u64 i = 0; i < size; ++i) {
-        if (bytes[i] != 0) {
-            return false;
-        }
-    }
-    return true;
-}
-
 }  // namespace VELK

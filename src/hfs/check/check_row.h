@@ -30,8 +30,6 @@ public:
     // Remembers the last sound key of the node.
     void KeepLastKey(u32 nodeNum, const u8* key);
 
-    bool HasNode() const { return hasNode_; }
-
 private:
     void CheckAbove(const CheckTree& tree, const CheckNode& node, const u8* key,
                     const CheckParent& parent) const;

@@ -40,7 +40,6 @@ public:
 
     const CheckSource& Source() const { return source_; }
     const CheckOptions& Options() const { return options_; }
-    CheckScope Scope() const { return scope_; }
     bool IsFull() const { return scope_ == CheckScope::kFull; }
     bool IsQuick() const { return scope_ == CheckScope::kQuick; }
 
@@ -72,7 +71,6 @@ public:
         return stage_;
     }
     CheckStage* Stage() { return stage_; }
-    CheckStage* StageAt(u32 index) { return &summary_.stages[index]; }
 
     // One more node of `stage` visited.
     void CountNode(const char* stage, u64 total);
