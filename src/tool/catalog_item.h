@@ -44,7 +44,6 @@ public:
     u64 ResourceSize() const { return IsFolder() ? 0 : GetBe64(data_ + 168); }
     const u8* DataFork() const { return data_ + 88; }
     const u8* ResourceFork() const { return data_ + 168; }
-    bool HasAttributes() const { return (Flags() & 0x0004) != 0; }
 
 private:
     static u64 GetBe64(const u8* bytes) { return u64{GetBe32(bytes)} << 32 | GetBe32(bytes + 4); }

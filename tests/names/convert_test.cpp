@@ -3,6 +3,8 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <bit>
 #include <cstring>
 #include <random>
 #include <vector>
@@ -179,13 +181,33 @@ TEST(ConvertKeys, ExtentsKeyGoesInFromHostOrderAndComesOutAsStored) {
     EXPECT_EQ(out, stored);
 }
 
+// A field that the size cuts stays as it is stored, and nothing behind the size is written.
 TEST(ConvertKeys, SizeCutsTheKeyShort) {
+    if (std::endian::native != std::endian::little) {
+        GTEST_SKIP() << "the host has the disk's byte order";
+    }
     const Bytes stored = {0, 8, 0, 0, 0, 2, 0, 1, 0x20, 0xAC};
-    for (unsigned size = 0; size <= stored.size(); ++size) {
-        Bytes host(size);
-        const Bytes source(stored.begin(), stored.begin() + size);
-        ConvertFor(kCatalogFileId).KeyToMemory(host.data(), source.data(), size);
-        ConvertFor(kAttributesFileId).KeyToMemory(host.data(), source.data(), size);
+    const struct {
+        u32 fileId;
+        Bytes host;
+        std::vector<std::size_t> fieldEnds;
+    } keys[] = {
+        {kCatalogFileId, {8, 0, 2, 0, 0, 0, 1, 0, 0xAC, 0x20}, {0, 2, 6, 8, 10}},
+        {kAttributesFileId, {8, 0, 0, 0, 1, 0, 2, 0, 0x20, 0xAC}, {0, 2, 4, 8}},
+    };
+    for (const auto& key : keys) {
+        for (unsigned size = 0; size <= stored.size(); ++size) {
+            const Bytes source(stored.begin(), stored.begin() + size);
+            Bytes host(size + 1, 0xEE);
+            ConvertFor(key.fileId).KeyToMemory(host.data(), source.data(), size);
+            const auto whole =
+                *(std::upper_bound(key.fieldEnds.begin(), key.fieldEnds.end(), size) - 1);
+            Bytes expected(key.host.begin(), key.host.begin() + static_cast<std::ptrdiff_t>(whole));
+            expected.insert(expected.end(), source.begin() + static_cast<std::ptrdiff_t>(whole),
+                            source.end());
+            expected.push_back(0xEE);
+            EXPECT_EQ(host, expected) << "file " << key.fileId << ", " << size << " bytes";
+        }
     }
 }
 
