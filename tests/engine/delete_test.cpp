@@ -396,7 +396,7 @@ TEST_F(DeleteAtPath, NextRecordThatCannotBecomeASeparatorIsReported) {
     Open(Image(512, 9, 3));
     Find(3);
     HfsNode* leaf = Tree().findData.path[1].node;
-    leaf->bufs[0].data[14 + 44] = 0x70;  // key length of the second record
+    tree_->Volume().Damage(leaf, 14 + 44, 0x70);  // key length of the second record
     ExpectRefused(DeleteHere(), kErrCorrupt,
                   {Reported(kReasonNode, kAnySite), Reported(kErrCorrupt, 4970),
                    Reported(kErrCorrupt, 5148)});

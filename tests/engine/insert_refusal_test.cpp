@@ -445,7 +445,7 @@ TEST_F(InsertStep, NodeOfAnotherHeightIsRefused) {
 
 TEST_F(InsertStep, LeafOfTheWrongKindIsAsserted) {
     OpenAt(0);
-    path_.path[1].node->bufs[0].data[kDescKind] = kBTHeaderNode;
+    tree_->Volume().Damage(path_.path[1].node, kDescKind, kBTHeaderNode);
     EXPECT_EQ(InsertLevel(path_.path[1].node, 1, 1), kOk);
     EXPECT_EQ(tree_->capture.Take(), Events{Asserted(4631)});
 }
@@ -479,7 +479,7 @@ TEST_F(InsertStep, TopOfThePathHasNoParent) {
     HfsNode* leaf = path_.path[1].node;
     path_.path[1].node = nullptr;
     path_.path[15].node = leaf;
-    leaf->bufs[0].data[kDescHeight] = 15;
+    tree_->Volume().Damage(leaf, kDescHeight, 15);
     EXPECT_EQ(InsertLevel(leaf, 0, 15), kErrCorrupt);
     EXPECT_EQ(tree_->capture.Take(), Events{Reported(kReasonTree, 9244)});
     path_.path[15].node = nullptr;
@@ -567,7 +567,7 @@ TEST_F(InsertOne, RootOfDepth15DoesNotSplit) {
     for (const u16 depth : {u16{14}, u16{15}}) {
         OpenAt(0);
         HfsNode* root = path_.path[3].node;
-        root->bufs[0].data[kDescHeight] = static_cast<u8>(depth);
+        tree_->Volume().Damage(root, kDescHeight, static_cast<u8>(depth));
         Tree().header.treeDepth = depth;
         const u32 before = Tree().header.freeNodes;
         const int status = InsertNode(root, root->nodeNum, 1, 440);

@@ -86,6 +86,15 @@ void MemVolume::LoadFile(u32 fileId, const Bytes& content) {
     file.resize(fork->logicalSize, options.stale);
 }
 
+void MemVolume::Damage(const HfsNode* node, u32 offset, u8 value) {
+    const u32 at = offset % options.mapBlockSize;
+    Block* block = lent_.at(node->bufs[offset / options.mapBlockSize].bh).get();
+    block->data[at] = value;
+    if (fs.journal) {
+        block->clean[at] = value;
+    }
+}
+
 Bytes MemVolume::DiskNode(u32 fileId, u32 nodeSize, u32 nodeNum) {
     const Bytes& file = files_[fileId];
     const u64 start = static_cast<u64>(nodeNum) * nodeSize;
@@ -138,6 +147,22 @@ MemVolume::Block* MemVolume::Find(buffer_head* bh, const char* what) {
     return found->second.get();
 }
 
+// From here on a journal knows nothing of what becomes of the block.
+void MemVolume::NoteClean(Block* block) {
+    block->access = false;
+    if (fs.journal) {
+        block->clean.assign(block->data, block->data + options.mapBlockSize);
+    }
+}
+
+// What a journal keeps of a block is what it holds when access is asked for.
+void MemVolume::Grant(Block* block) {
+    if (!block->access && !std::equal(block->clean.begin(), block->clean.end(), block->data)) {
+        breaches.push_back("a block was changed before journal access");
+    }
+    block->access = true;
+}
+
 void MemVolume::CheckFork(const HfsFork* fork, u8 forkType) {
     if (fork != nullptr || forkType != 0) {
         breaches.push_back("a fork was passed where the tree file itself is meant");
@@ -171,6 +196,7 @@ int MemVolume::OnMap(void* self, CFileSystemHfs* fs, HfsRuns* /*runs*/, HfsFork*
         buffer_head* bh = reinterpret_cast<buffer_head*>(block.get());
         bufs[b].bh = bh;
         bufs[b].data = block->data;
+        volume->NoteClean(block.get());
         volume->lent_[bh] = std::move(block);
     }
     return kOk;
@@ -191,6 +217,7 @@ int MemVolume::OnDirtyMeta(void* self, CFileSystemHfs* fs, buffer_head* bh) {
         return kMemNoRange;
     }
     std::memcpy(file.data() + block->offset, block->data, fs->mapBlockSize);
+    volume->NoteClean(block);
     return kOk;
 }
 
@@ -327,7 +354,7 @@ int MemVolume::OnWriteAccess(void* self, buffer_head* bh) {
     Block* block = volume->Find(bh, "WriteAccess");
     volume->Note(Call::kWriteAccess, block != nullptr ? block->offset : 0, 0, false);
     if (block != nullptr) {
-        block->access = true;
+        volume->Grant(block);
     }
     return kOk;
 }
@@ -337,7 +364,7 @@ int MemVolume::OnCreateAccess(void* self, buffer_head* bh) {
     Block* block = volume->Find(bh, "CreateAccess");
     volume->Note(Call::kCreateAccess, block != nullptr ? block->offset : 0, 0, false);
     if (block != nullptr) {
-        block->access = true;
+        volume->Grant(block);
     }
     return kOk;
 }

@@ -73,6 +73,8 @@ public:
     void LoadFile(u32 fileId, const Bytes& content);
     void LoadTree(const TreeImage& image) { LoadFile(image.shape.fileId, image.bytes); }
     Bytes& Disk(u32 fileId) { return files_[fileId]; }
+    // Changes a byte of a cached node behind the engine's back, as if it had been read so.
+    void Damage(const HfsNode* node, u32 offset, u8 value);
     // One node as it is on disk now.
     Bytes DiskNode(u32 fileId, u32 nodeSize, u32 nodeNum);
 
@@ -99,7 +101,8 @@ private:
         u8* data;
         u32 fileId;
         u64 offset;
-        bool access = false;
+        Bytes clean;          // with a journal: what it held when it was read or handed over last
+        bool access = false;  // granted since then
         bool open = false;
     };
 
@@ -118,6 +121,8 @@ private:
 
     void Note(Call call, u64 offset, u64 bytes, bool noRead);
     Block* Find(buffer_head* bh, const char* what);
+    void NoteClean(Block* block);
+    void Grant(Block* block);
     void CheckFork(const HfsFork* fork, u8 forkType);
     int Grow(HfsFork* fork, u32 blocks);
     void Shrink(HfsFork* fork, u32 blocks);
