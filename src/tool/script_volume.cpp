@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <cstdio>
+#include <filesystem>
 
 #include "hfs/records/text_format.h"
 #include "hfs/volume/make_volume.h"
@@ -169,6 +170,10 @@ namespace {
 std::unique_ptr<ImageVolume> OpenWithUndo(const Invocation& call, const TargetOptions& target,
                                           const OpenOptions& options, Problem* problem) {
     CheckReplaces(target, target.undoFile);
+    std::error_code none;
+    if (std::filesystem::equivalent(target.undoFile, call.image, none)) {
+        ThrowFailed(target.undoFile, "is the image itself", "choose another name");
+    }
     std::unique_ptr<BlockDevice> device =
         FileDevice::Open(call.image, FileDevice::Mode::kReadWrite, 0, problem);
     if (device != nullptr) {
@@ -228,11 +233,11 @@ void FinishTarget(const Invocation& call, const TargetOptions& options, ImageVol
     if (options.write || (keeps && volume->IsWritable())) {
         KeepRest(options.Subject(call), volume);
     }
-    if (!options.saveFile.empty()) {
-        Save(options, volume);
-    }
     if (options.write && volume->Close() != kOk) {
         ThrowProblem(call.image, volume->LastIoProblem());
+    }
+    if (!options.saveFile.empty()) {
+        Save(options, volume);  // closed, if it was written to, so that the copy is whole in itself
     }
     u64 changed = volume->HandedOverBlocks() - handedOverBefore;
     for (const u32 fileId : {kCatalogFileId, kExtentsFileId, kAttributesFileId}) {

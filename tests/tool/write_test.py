@@ -360,6 +360,19 @@ for closed in ((0,), (1,), (2,), (0, 1, 2)):
     checks.check((folder / "closed.img").read_bytes() == before,
                  "closed: %s: the image has changed" % (closed,))
 
+# --- files that are the image, and copies of it --------------------------------------------------
+refused("treehfs: same.img: is the image itself: choose another name",
+        "apply", volume("same.img"), script("one.tr", INSERTS % 1), "--write", "--undo",
+        "same.img", "--force")
+os.link(folder / "same.img", folder / "other-name")
+refused("treehfs: other-name: is the image itself: choose another name",
+        "apply", "same.img", "one.tr", "--write", "--undo", "other-name", "--force")
+small_volume("copied.img")
+run("apply", "copied.img", "one.tr", "--write", "--save", "copy.img", "-q")
+checks.check(is_clean("copied.img") and
+             (folder / "copy.img").read_bytes() == (folder / "copied.img").read_bytes(),
+             "a copy of a volume with a journal is closed as the volume is")
+
 # --- a volume that cannot be made replaces nothing -----------------------------------------------
 refused("treehfs: closed.img: block size 3,000 is not a power of two from 512 to 65,536",
         "format", "closed.img", "--size", "1M", "--force", "--block-size", "3000", code=16)
