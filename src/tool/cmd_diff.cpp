@@ -1,4 +1,6 @@
 // diff: what two volumes' trees differ in, record by record.
+#include <filesystem>
+
 #include "hfs/records/name_text.h"
 #include "hfs/records/record_view.h"
 #include "hfs/records/text_format.h"
@@ -156,6 +158,10 @@ int RunDiff(Invocation* call) {
     call->DeclareOutputFile();
     call->Parse();
     CheckIgnored(*call, options.ignored);
+    std::error_code none;
+    if (std::filesystem::equivalent(call->outputFile, options.other, none)) {
+        ThrowFailed(call->outputFile, "is the image itself", "choose another name");
+    }
     Session before(*call, Session::Truncated::kRefuse);
     Session after(*call, options.other, Session::Truncated::kRefuse);
     if (call->json) {

@@ -83,7 +83,7 @@ private:
         try {
             Handle(line);
         } catch (const Interrupted&) {
-            LendVolume(nullptr);
+            LendVolume(nullptr, "");
             if (!input_.IsTerminal() || !TakeInterrupt()) {
                 throw;
             }
@@ -163,7 +163,7 @@ private:
         std::vector<std::string> arguments = {kLentImage};
         arguments.insert(arguments.end(), words.begin() + 1, words.end());
         call_->out.Flush();
-        LendVolume(volume_);
+        LendVolume(volume_, call_->image);
         try {
             Invocation inner(*command, arguments);
             command->run(&inner);
@@ -172,7 +172,7 @@ private:
         } catch (const ToolError& error) {
             PrintError(error, false);
         }
-        LendVolume(nullptr);
+        LendVolume(nullptr, "");
     }
 
     void Help(const std::vector<std::string_view>& words) {

@@ -10,6 +10,7 @@
 
 #include "hfs/format.h"
 #include "tool/errors.h"
+#include "tool/session.h"
 
 namespace VELK::tool {
 
@@ -175,7 +176,7 @@ void Invocation::Parse() {
     }
     ChooseGeneral();
     if (!outputFile.empty()) {
-        out.OpenFile(outputFile, image, force);
+        out.OpenFile(outputFile, FileOfImage(image), force);
     }
 }
 

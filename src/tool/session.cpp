@@ -31,11 +31,17 @@ void ExplainPlace(const std::string& image, const VolumeScan& scan) {
 }
 
 ImageVolume* g_lentVolume = nullptr;
+std::string g_lentFile;
 
 }  // namespace
 
-void LendVolume(ImageVolume* volume) {
+void LendVolume(ImageVolume* volume, const std::string& file) {
     g_lentVolume = volume;
+    g_lentFile = file;
+}
+
+const std::string& FileOfImage(const std::string& image) {
+    return g_lentVolume != nullptr && image == kLentImage ? g_lentFile : image;
 }
 
 Session::Session(const Invocation& call, const std::string& image, Truncated truncated)

@@ -12,9 +12,11 @@
 namespace VELK::tool {
 
 // While a volume is lent, a session on the image named kLentImage looks at it as it stands, changes
-// in memory included. Null ends the loan.
+// in memory included. Null ends the loan. `file` is the one it lies in.
 constexpr char kLentImage[] = "(this volume)";
-void LendVolume(ImageVolume* volume);
+void LendVolume(ImageVolume* volume, const std::string& file);
+// The file behind the image's name: the lent volume's, or the image itself.
+const std::string& FileOfImage(const std::string& image);
 
 class Session {
 public:

@@ -195,6 +195,12 @@ write("there.txt", b"old")
 expect(["ls", good, "-o", "there.txt"], 8, "treehfs: there.txt exists: --force replaces it")
 expect(["ls", good, "-o", good, "--force"], 8,
        "treehfs: good.img: is the image itself: choose another name")
+expect(["diff", "two.img", good, "--partition", "1", "-o", good, "--force"], 8,
+       "treehfs: good.img: is the image itself: choose another name")
+code, out, err = harness.text("shell", good, cwd=folder, stdin=b"ls -o good.img --force\n")
+checks.equal((code, out, err),
+             (0, "", "treehfs: good.img: is the image itself: choose another name\n"),
+             "-o in the shell")
 code, out, err = harness.text("ls", good, "-o", "there.txt", "--force", cwd=folder)
 checks.equal((code, out, (folder / "there.txt").read_text()), (0, "", "alpha\nbeta\ngamma\nlink\n"),
              "-o FILE --force")
