@@ -296,8 +296,9 @@ public:
 
     // Inserts a record; `keyLen` is the ID the comparator takes. Splits, grows the file and adds
     // levels as needed. An odd `dataSize` is padded with a zero.
-    // kErrExists: the key is there; kErrTooLarge: no node can hold it; kErrInvalid: no data. With
-    // these nothing changed.
+    // kErrExists: the key is there; kErrTooLarge: longer than a node; kErrInvalid, when `dataSize`
+    // is 0: no data. With these nothing changed. kErrInvalid otherwise: no room in a node of its
+    // own, as only a split shows.
     int InsertRecord(const void* key, unsigned keyLen, const void* data, unsigned dataSize);
     // Removes the record of `key` or, with a null key or `usePath` and a valid path of the tree's
     // own, the one that path stands on; `keyLength` is the ID the comparator takes.

@@ -93,7 +93,7 @@ TEST_P(FencedNode, ARecordThatBeginsOnABlocksLastByteIsReadWithCare) {
         for (const u32 odd : {0u, 2u, 4u}) {
             Make(kind, odd);
             const HostKey host = HostCatKey(7, Name(odd));
-            SearchKey key(&bench_.tree, host.Get(), host.id);
+            SoughtKey key(&bench_.tree, host.Get(), host.id);
             SearchResult result{};
             EXPECT_FALSE(SearchInside(&bench_.tree, node_->Get(), key, &result));
             key.LearnOrder();

@@ -2,12 +2,12 @@
 // before the first one. Also the first leaf of an empty tree, and InsertTree for records that
 // start at any level.
 #include "hfs/treehfs/cache.h"
+#include "hfs/treehfs/key_shape.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/path_check.h"
 #include "hfs/treehfs/report.h"
-#include "hfs/treehfs/scratch.h"
 
 namespace VELK {
 

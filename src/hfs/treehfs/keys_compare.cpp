@@ -1,6 +1,6 @@
 // The key comparators of the three tree kinds. The first key is the search key in host order, its
 // ID passed beside it; the second is the key of a node, big-endian as stored. They trust the
-// lengths in the keys: whoever takes a key from a node checks it first (see scratch.h).
+// lengths in the keys: whoever takes a key from a node checks it first (see key_shape.h).
 #include "hfs/names.h"
 #include "hfs/treehfs/bytes.h"
 #include "hfs/treehfs/report.h"

@@ -6,10 +6,10 @@
 #include "hfs/names.h"
 #include "hfs/treehfs/bytes.h"
 #include "hfs/treehfs/hints.h"
+#include "hfs/treehfs/key_shape.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/path_deliver.h"
 #include "hfs/treehfs/report.h"
-#include "hfs/treehfs/scratch.h"
 
 namespace VELK {
 
@@ -74,21 +74,21 @@ private:
 // known to the compiler.
 struct FoldedKeys {
     FoldedKeys() = default;
-    explicit FoldedKeys(const SearchKey&) {}
+    explicit FoldedKeys(const SoughtKey&) {}
     static constexpr u32 kFixed = kCatKeyFixed;
     static constexpr u32 kNameLengthAt = kCatKeyNameLength;
     static constexpr u32 Fixed() { return kFixed; }
     static constexpr u32 NameLengthAt() { return kNameLengthAt; }
-    static int Compare(const SearchKey& key, const BTreeKey* nodeKey) {
+    static int Compare(const SoughtKey& key, const BTreeKey* nodeKey) {
         return key.CompareFolded(nodeKey);
     }
 };
 struct OtherKeys {
-    explicit OtherKeys(const SearchKey& key)
+    explicit OtherKeys(const SoughtKey& key)
         : fixed(key.Fixed()), nameLengthAt(key.NameLengthAt()) {}
     u32 Fixed() const { return fixed; }
     u32 NameLengthAt() const { return nameLengthAt; }
-    static int Compare(const SearchKey& key, const BTreeKey* nodeKey) {
+    static int Compare(const SoughtKey& key, const BTreeKey* nodeKey) {
         return key.Compare(nodeKey);
     }
     u32 fixed;
@@ -207,7 +207,7 @@ bool MakeOrder(u32 parent, u32 length, Unit unit, u64* order) {
 // holds few.
 class NothingKnown {
 public:
-    static bool Decide(u32, const SearchKey&, int*) { return false; }
+    static bool Decide(u32, const SoughtKey&, int*) { return false; }
     template <typename Keys>
     static void Learn(u32, const u8*, const Keys&) {}
 };
@@ -217,7 +217,7 @@ class KnownSeparators {
 public:
     explicit KnownSeparators(const Hints& hints) : hints_(hints) {}
 
-    bool Decide(u32 index, const SearchKey& key, int* order) const {
+    bool Decide(u32 index, const SoughtKey& key, int* order) const {
         const u64 known = hints_.Order(index);
         if (known == 0 || known == key.Order()) {
             return false;
@@ -259,13 +259,13 @@ bool TableFits(const BTHeaderMem& header, u32 count) {
 }
 
 // Without a known shape, or with more slots than the node has room for, no key is quick.
-bool HasQuickKeys(const BTHeaderMem& header, const SearchKey& key, u32 count) {
+bool HasQuickKeys(const BTHeaderMem& header, const SoughtKey& key, u32 count) {
     return key.Fixed() != 0 && TableFits(header, count);
 }
 
 }  // namespace
 
-SearchKey::SearchKey(const CBTreeHfs* tree, const BTreeKey* key, unsigned id)
+SoughtKey::SoughtKey(const CBTreeHfs* tree, const BTreeKey* key, unsigned id)
     : key_(key), compare_(tree->compareKeys), id_(id) {
     // A search key out of line is asserted by the comparator each time it is asked.
     KeyShape shape;
@@ -285,7 +285,7 @@ SearchKey::SearchKey(const CBTreeHfs* tree, const BTreeKey* key, unsigned id)
     firstUnit_ = length > 0 ? FoldPlain(unit(0)) : u16{0};
 }
 
-void SearchKey::LearnOrder() {
+void SoughtKey::LearnOrder() {
     if (!isFolded_) {
         return;
     }
@@ -295,7 +295,7 @@ void SearchKey::LearnOrder() {
 }
 
 // Decides by parent and first unit of the name; 0 when these are equal or not plain.
-inline int SearchKey::CompareFirstUnits(const u8* nodeKey) const {
+inline int SoughtKey::CompareFirstUnits(const u8* nodeKey) const {
     const u32 parent = GetBe32(nodeKey + kCatKeyParentId);
     if (id_ != parent) {
         return id_ > parent ? 1 : -1;
@@ -310,12 +310,12 @@ inline int SearchKey::CompareFirstUnits(const u8* nodeKey) const {
     return firstUnit_ > unit ? 1 : -1;
 }
 
-inline int SearchKey::CompareFolded(const BTreeKey* nodeKey) const {
+inline int SoughtKey::CompareFolded(const BTreeKey* nodeKey) const {
     const int order = CompareFirstUnits(reinterpret_cast<const u8*>(nodeKey));
     return order != 0 ? order : CompareCatKeysCaseIns(key_, id_, nodeKey);
 }
 
-inline int SearchKey::Compare(const BTreeKey* nodeKey) const {
+inline int SoughtKey::Compare(const BTreeKey* nodeKey) const {
     return isFolded_ ? CompareFolded(nodeKey) : compare_(key_, id_, nodeKey);
 }
 
@@ -329,7 +329,7 @@ enum class Doubt {
 
 // The same search with and without what the node remembers: it probes the same records.
 template <typename Blocks, typename Shape, typename Known>
-int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt doubt,
+int Search(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doubt doubt,
            const QuickKeys<Blocks, Shape>& keys, const Known& known, SearchResult* result) {
     const u32 count = NumRecords(node);
     s32 low = 0;
@@ -379,7 +379,7 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt dou
 }
 
 template <typename Blocks, typename Shape>
-int SearchPlain(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt doubt,
+int SearchPlain(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doubt doubt,
                 SearchResult* result) {
     const u32 count = NumRecords(node);
     const QuickKeys<Blocks, Shape> keys(&tree->header, node, Shape(key));
@@ -390,7 +390,7 @@ int SearchPlain(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doub
 }
 
 template <typename Blocks>
-int SearchKnown(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt doubt,
+int SearchKnown(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doubt doubt,
                 SearchResult* result) {
     const u32 count = NumRecords(node);
     const QuickKeys<Blocks, FoldedKeys> keys(&tree->header, node, FoldedKeys());
@@ -402,7 +402,7 @@ int SearchKnown(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doub
 }
 
 template <typename Blocks>
-int SearchFolded(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt doubt,
+int SearchFolded(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doubt doubt,
                  SearchResult* result) {
     return node->hints != nullptr && key.HasOrder()
                ? SearchKnown<Blocks>(tree, node, key, doubt, result)
@@ -411,7 +411,7 @@ int SearchFolded(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Dou
 
 // SearchInside without the search proper. True: the key lies between the first and the last.
 template <typename Blocks>
-bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, u32 count,
+bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SoughtKey& key, u32 count,
                 bool* isBehindAll) {
     const QuickKeys<Blocks, OtherKeys> keys(&tree->header, leaf, OtherKeys(key));
     const u8* last = keys.KeyAt(count - 1);
@@ -426,7 +426,7 @@ bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, u32 
     return first != nullptr && key.Compare(reinterpret_cast<const BTreeKey*>(first)) >= 0;
 }
 
-int SearchByShape(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Doubt doubt,
+int SearchByShape(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doubt doubt,
                   SearchResult* result) {
     const bool isWhole = tree->header.blocksPerNode == 1;
     if (key.IsFolded()) {
@@ -439,7 +439,7 @@ int SearchByShape(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, Do
 
 }  // namespace
 
-int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result) {
+int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, SearchResult* result) {
     return SearchByShape(tree, node, key, Doubt::kSettle, result);
 }
 
@@ -468,7 +468,7 @@ bool DescribePlain(const CBTreeHfs* tree, const HfsNode* leaf, u32 index, NodeKe
                                    : DescribeIn<ManyBlocks>(hdr, leaf, index, record, key);
 }
 
-bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key,
+bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SoughtKey& key,
                   SearchResult* result) {
     const u32 count = NumRecords(leaf);
     if (count == 0 || !HasQuickKeys(tree->header, key, count)) {

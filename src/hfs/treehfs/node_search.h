@@ -6,12 +6,12 @@
 namespace VELK {
 
 // A search key with what the search needs to know of its tree, worked out once per lookup.
-class SearchKey {
+class SoughtKey {
 public:
-    SearchKey(const CBTreeHfs* tree, const BTreeKey* key, unsigned id);
+    SoughtKey(const CBTreeHfs* tree, const BTreeKey* key, unsigned id);
 
     // Order of the search key against a key of a node, as the tree's comparator has it.
-    // REQUIRES: the node key is sound (see scratch.h).
+    // REQUIRES: the node key is sound (see key_shape.h).
     int Compare(const BTreeKey* nodeKey) const;
     // The same by the comparator itself, which may have something to assert.
     int CompareAsAsked(const BTreeKey* nodeKey) const { return compare_(key_, id_, nodeKey); }
@@ -53,12 +53,12 @@ struct SearchResult {
 };
 
 // Reports a key that cannot be read at 3005, kErrNoMemory nowhere.
-int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SearchKey& key, SearchResult* result);
+int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, SearchResult* result);
 
 // The same for a key known to lie between the first and the last key of `leaf`, or behind the last
 // key of the tree's last leaf. False, nothing reported: it does not, or the node is not so plain
 // that this can be told at once.
-bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SearchKey& key, SearchResult* result);
+bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SoughtKey& key, SearchResult* result);
 
 // What delivery needs of record `index` of a leaf whose keys are in folded order: what FetchKey
 // would give. False, nothing reported: something about it is out of the ordinary, or its key or

@@ -5,6 +5,7 @@
 #include <cstring>
 
 #include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/key_shape.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/scratch.h"
 

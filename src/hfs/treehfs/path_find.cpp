@@ -65,7 +65,7 @@ int DeliverFoundRecord(CBTreeHfs* tree, const HfsNode* node, const SearchResult&
 // Searches an index node of the path and gives the child that leads on to the key, and the way
 // there. The way goes on while the record's bytes may still be on theirs: should they lead to
 // another child, somebody wrote into the node, and it is searched once more as it is.
-int SearchIndex(CBTreeHfs* tree, const SearchKey& key, HfsFindLevel* entry, bool* found,
+int SearchIndex(CBTreeHfs* tree, const SoughtKey& key, HfsFindLevel* entry, bool* found,
                 SearchResult* result, u32* child, HintedWay* way) {
     const int status = SearchNode(tree, entry->node, key, result);
     if (HFS_UNLIKELY(status != kOk)) {
@@ -90,7 +90,7 @@ int SearchIndex(CBTreeHfs* tree, const SearchKey& key, HfsFindLevel* entry, bool
 
 // Goes from the root to a leaf and searches each node on the way. `*found` tells of the node
 // searched last.
-int Descend(CBTreeHfs* tree, const SearchKey& key, HfsFindData* path, bool* found,
+int Descend(CBTreeHfs* tree, const SoughtKey& key, HfsFindData* path, bool* found,
             SearchResult* result) {
     u32 nodeNum = tree->header.rootNode;
     int level = tree->header.treeDepth;
@@ -148,7 +148,7 @@ bool PathStillLeads(const CBTreeHfs* tree) {
 // Records are often inserted in key order. When the tree's own path still leads where it did, and
 // the key lies between the first and the last key of its leaf, or past the last one of the last
 // leaf, the way down is the one the path holds. Counters move as they would on the way down.
-bool FindOnSameLeaf(CBTreeHfs* tree, const SearchKey& key, SearchResult* result) {
+bool FindOnSameLeaf(CBTreeHfs* tree, const SoughtKey& key, SearchResult* result) {
     HfsFindData* path = &tree->findData;
     if (!PathStillLeads(tree) || !SearchInside(tree, path->path[1].node, key, result)) {
         return false;
@@ -223,7 +223,7 @@ int CBTreeHfs::FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, 
     if (header.treeDepth == 0) {
         return kOk;
     }
-    SearchKey searchKey(this, key, keyArg);
+    SoughtKey searchKey(this, key, keyArg);
     SearchResult result;
     if (path == &findData && FindOnSameLeaf(this, searchKey, &result)) {
         *found = result.found;

@@ -1,5 +1,4 @@
-// Keys and data in one piece: the scratch buffer, and the gate a key from a node passes before it
-// is compared or converted.
+// Keys and data in one piece: the scratch buffer.
 #include "hfs/treehfs/scratch.h"
 
 #include "hfs/treehfs/bytes.h"
@@ -7,19 +6,6 @@
 #include "platform/heap.h"
 
 namespace VELK {
-
-bool ShapeOf(CompareKeysFn compare, KeyShape* shape) {
-    if (compare == CompareCatKeysCaseIns || compare == CompareCatKeysCaseBin) {
-        *shape = {kCatKeyFixed, kCatKeyParentId, kCatKeyNameLength};
-    } else if (compare == CompareExtentKeysPlus) {
-        *shape = {kExtKeyFixed, kExtKeyFileId, 0};
-    } else if (compare == CompareAttrKeys) {
-        *shape = {kAttrKeyFixed, kAttrKeyFileId, kAttrKeyNameLength};
-    } else {
-        return false;
-    }
-    return true;
-}
 
 int EnsureScratch(CBTreeHfs* tree) {
     if (tree->scratch == nullptr) {
@@ -60,21 +46,6 @@ int GatherKey(CBTreeHfs* tree, const HfsNode* node, const NodeKey& record, const
     const int status = CopyKey(tree, node, record, key);
     HFS_ASSERT(status != kOk || record.next1 != nullptr, 262);
     return status;
-}
-
-bool NodeKeyIsSound(const CBTreeHfs* tree, const BTreeKey* key, u32 keySize) {
-    KeyShape shape;
-    if (!ShapeOf(tree->compareKeys, &shape)) {
-        return true;
-    }
-    const u32 keyLength = keySize - kKeyLengthSize;
-    if (keyLength > kMaxKeyLength || keyLength < shape.fixed) {
-        return false;
-    }
-    // The whole key, not the two bytes of its length field.
-    const u8* bytes = reinterpret_cast<const u8*>(key);
-    return shape.nameLength == 0 ||
-           shape.fixed + 2u * GetBe16(bytes + shape.nameLength) <= keyLength;
 }
 
 }  // namespace VELK

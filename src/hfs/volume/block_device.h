@@ -167,9 +167,8 @@ public:
     IoResult Write(u64 offset, const void* source, std::size_t bytes) override;
     IoResult Sync() override { return {}; }
 
-    BlockDevice* Base() const { return base_; }              // the device below
-    bool IsEmpty() const { return pages_.empty(); }          // nothing was changed
-    std::size_t PageCount() const { return pages_.size(); }  // changed pages
+    BlockDevice* Base() const { return base_; }      // the device below
+    bool IsEmpty() const { return pages_.empty(); }  // nothing was changed
     // Numbers of the changed pages, rising.
     std::vector<u64> ChangedPages() const;
     // The changes in page `number`, null when there are none. Stays the device's.

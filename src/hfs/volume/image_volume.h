@@ -100,7 +100,8 @@ public:
 
     // fileId is kExtentsFileId, kCatalogFileId or kAttributesFileId.
     bool HasTree(u32 fileId) const;  // its fork is not empty
-    // The open tree; opens it on first use. Null with `*problem` (optional) set.
+    // The open tree; opens it on first use. Null with `*problem` (optional) set: it stays closed,
+    // unless it was for want of memory.
     CBTreeHfs* Tree(u32 fileId, Problem* problem);
     // The tree if it is open already, else null.
     CBTreeHfs* OpenTree(u32 fileId);
