@@ -14,9 +14,7 @@ protected:
         volume_.LoadFile(kCatalogFileId, Bytes(512, 0x11));
         EXPECT_EQ(volume_.fs.Map(nullptr, nullptr, 0, kCatalogFileId, 0, 512, false, &block_), kOk);
     }
-    ~VolumeContract() override {
-        volume_.fs.cache.Release(block_.bh, 0);
-    }
+    ~VolumeContract() override { volume_.fs.cache.Release(block_.bh, 0); }
 
     void Ask() { volume_.fs.journal.ops->GetWriteAccess(volume_.fs.journal.self, block_.bh); }
     void HandOver() { volume_.fs.DirtyMeta(block_.bh); }

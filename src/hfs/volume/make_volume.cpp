@@ -356,10 +356,6 @@ Problem Fill(BlockDevice* device, const FormatOptions& options, const Plan& plan
     return problem;
 }
 
-}  // namespace
-
-namespace {
-
 Problem PlanVolume(u64 size, const FormatOptions& options, Plan* plan) {
     const Problem problem = CheckOptions(size, options);
     return problem ? problem : MakePlan(size, options, plan);
