@@ -48,10 +48,25 @@ class Terminal:
         os.write(self.main, keys.encode())
         return self.until(wanted)
 
-    def interrupt(self, wanted, pause=0.0):
-        time.sleep(pause)  # until it waits for a key: people are slower, too
+    def sleeps(self):
+        with open("/proc/%d/stat" % self.process.pid, encoding="utf-8", errors="replace") as file:
+            return file.read().rpartition(")")[2].split()[0] == "S"
+
+    def wait_for_keys(self):
+        """Until the shell waits for a key: a signal in the instant before counts with the next."""
+        end = time.time() + 60
+        samples = 0
+        while samples < 3 and time.time() < end:
+            samples = samples + 1 if self.sleeps() else 0
+            time.sleep(0.05)
+
+    def interrupt(self, wanted):
         self.process.send_signal(signal.SIGINT)
         return self.until(wanted)
+
+    def interrupt_typing(self, wanted):
+        self.wait_for_keys()
+        return self.interrupt(wanted)
 
     def ends(self, expected, what):
         checks.equal(self.process.wait(60), expected, what)
@@ -69,12 +84,12 @@ checks.check("2 find   00000000 ok found=yes at=1/2" in shown, "completed by Tab
 
 # --- Ctrl-C at the prompt: the line is given up, the shell stays --------------------------------
 shell.type("delete 2:kept", "delete 2:kept$")
-shell.interrupt(PROMPT, pause=0.5)
+shell.interrupt_typing(PROMPT)
 shown = shell.type("find 2:kept\n", PROMPT)
 checks.check("3 find   00000000 ok found=yes" in shown, "the line was given up: %r" % shown)
 shell.type("repeat 2\n", r"\.\.\.> $")
 shell.type("delete 2:kept\n", r"\.\.\.> $")
-shell.interrupt(PROMPT, pause=0.5)
+shell.interrupt_typing(PROMPT)
 shown = shell.type("find 2:kept\n", PROMPT)
 checks.check("found=yes" in shown, "so is a repetition: %r" % shown)
 
@@ -96,6 +111,7 @@ checks.equal(shown, "\x1b[31mcatalog(WRITE)>\x1b[0m ", "the prompt is red, and o
 shown = shell.type("hel\t", "p")
 columns = [int(number) for number in re.findall(r"\x1b\[(\d+)G", shown)]
 checks.check(columns in ([], [len("catalog(WRITE)> hel") + 1]), "columns %s" % columns)
+shell.wait_for_keys()
 shell.process.send_signal(signal.SIGTERM)
 shell.ends(32, "a signal that asks for the end")
 
