@@ -4,8 +4,9 @@
 // mounted for writing; a volume that took changes can be mounted again.
 //
 // Input: how to open it (bits: 1 changes stay in memory, 2 by the copy of the header, 4 small
-// blocks, 16 and 32 the partition, 64 replay, 128 write), what to do (the pattern of changes; bit
-// 128: write past what stands against it), then the image.
+// blocks, 16 and 32 the partition, 64 replay, 128 write), what to do (bits 3 the pattern of
+// changes, 12 the size of records, 48 how many, 64 not in order of keys; bit 128: write past what
+// stands against it), then the image.
 #include <algorithm>
 #include <cstring>
 
@@ -49,13 +50,20 @@ void Walk(ImageVolume* volume, test::Metered tree) {
     path.ClearPath();
 }
 
+// Inserts records, and deletes each fourth instead or, with the last pattern, all of them again.
 void Change(ImageVolume* volume, test::Metered tree, u8 what) {
-    for (u32 n = 0; n < 12 && volume->IsWritable(); ++n) {
-        const test::HostKey key = test::NthHostKey(tree->fileId, n);
-        const test::Bytes record = test::Pattern(88, n);
-        const int status = (n + what) % 4 == 0
+    constexpr u32 kLastPattern = 3;
+    constexpr u32 kSizes[] = {88, 10, 248, 150};
+    const u32 size = kSizes[what >> 2 & 3];
+    const u32 count = 12u << (what >> 4 & 3);
+    const u32 stride = (what & 64) != 0 ? 5 : 1;  // prime to every count
+    const u32 steps = (what & 3) == kLastPattern ? 2 * count : count;
+    for (u32 n = 0; n < steps && volume->IsWritable(); ++n) {
+        const test::HostKey key = test::NthHostKey(tree->fileId, n * stride % count);
+        const test::Bytes record = test::Pattern(size, n);
+        const int status = n >= count || (n + what) % 4 == 0
                                ? tree->DeleteRecord(key.Get(), key.id, false)
-                               : tree->InsertRecord(key.Get(), key.id, record.data(), 88);
+                               : tree->InsertRecord(key.Get(), key.id, record.data(), size);
         if (status != kOk && volume->RestoreAfter(status)) {
             return;
         }
@@ -239,8 +247,10 @@ extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::
     if (size < kControl + kHeaderOffset + kHeaderSize || mutator.OneIn(4)) {
         return LLVMFuzzerMutate(data, size, most);
     }
-    if (mutator.OneIn(8)) {
-        LLVMFuzzerMutate(data, kControl, kControl);
+    if (mutator.OneIn(3)) {
+        // The same image opened or changed in another way.
+        data[mutator.Below(kControl)] = static_cast<u8>(mutator.Below(256));
+        return size;
     }
     u8* image = data + kControl;
     const u64 imageSize = size - kControl;

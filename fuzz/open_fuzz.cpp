@@ -3,9 +3,9 @@
 // leaks, no service is used against its contract, and after a change that failed the restored tree
 // is the one before it.
 //
-// Input: tree kind, geometry and fault, what to do (bits: 1 change, 2 keys between those there are,
-// 4 every call there is, as the sweep makes them, 8 grow the file by more nodes than one map node
-// covers), then the tree file.
+// Input: tree kind, geometry and fault, what to do (bits: 1 change, and fail in that, 2 keys
+// between those there are, 4 every call there is, as the sweep makes them, 8 grow the file by more
+// nodes than one map node covers), then the tree file.
 #include "fault_service.h"
 #include "fuzz.h"
 #include "keys.h"
@@ -65,16 +65,33 @@ void Restore(test::Metered tree, test::MemVolume* volume, const test::MemVolume:
     tree->RestoreModifiedNodes();
 }
 
-// Changes until one fails, then restores, as a volume does. False: restored.
-bool Change(test::Metered tree, test::MemVolume* volume, u8 pattern) {
-    if (tree->Flush(0) != kOk) {
-        return false;
+// Which call fails from now on: bits 4 to 6 of the geometry with, unless these count a trial's
+// calls, the upper half of the pattern; bit 7 of the geometry: one of the heap, else one of the
+// volume. 0: none. The numbers grow like squares, over `fine`: further on it matters less which
+// call it is.
+void SetFault(test::FaultService* faults, u8 geometry, u8 pattern, u32 fine) {
+    const u32 low = (pattern & 4) != 0 ? 0 : pattern >> 4;
+    const u32 number = (geometry >> 4 & 7u) * 16 + low;
+    const u32 nth = number * (number + fine - 1) / fine;
+    if (nth == 0) {
+        return;
     }
+    if ((geometry & 0x80) != 0) {
+        test::HeapGuard::Current()->FailNth(nth);
+    } else {
+        faults->FailAny(nth);
+    }
+}
+
+// Changes until one fails, then restores, as a volume does. False: restored. One pattern in three
+// ends with deleting all that it inserted.
+bool Change(test::Metered tree, test::MemVolume* volume, u8 pattern) {
     const test::MemVolume::Snapshot before = volume->Save();
-    for (u32 n = 0; n < kKeys; ++n) {
-        const test::HostKey key = test::NthHostKey(tree->fileId, n, (pattern & 2) != 0);
+    const u32 steps = pattern % 3 == 2 ? 2 * kKeys : kKeys;
+    for (u32 n = 0; n < steps; ++n) {
+        const test::HostKey key = test::NthHostKey(tree->fileId, n % kKeys, (pattern & 2) != 0);
         const test::Bytes record = test::Pattern(2 + 2 * (n * pattern % 120), n);
-        const int status = (n + pattern) % 3 == 0
+        const int status = n >= kKeys || (n + pattern) % 3 == 0
                                ? tree->DeleteRecord(key.Get(), key.id, false)
                                : tree->InsertRecord(key.Get(), key.id, record.data(),
                                                     static_cast<unsigned>(record.size()));
@@ -95,22 +112,6 @@ bool Change(test::Metered tree, test::MemVolume* volume, u8 pattern) {
     return true;
 }
 
-// Which call fails: bits 4 to 6 of the geometry with, unless these count a trial's calls, the upper
-// half of the pattern; bit 7 of the geometry: one of the heap, else one of the volume. 0: none.
-void SetFault(test::FaultService* faults, u8 geometry, u8 pattern) {
-    const u32 low = (pattern & 4) != 0 ? 0 : pattern >> 4;
-    const u32 number = (geometry >> 4 & 7u) * 16 + low;
-    const u32 nth = number * (number + 7) / 8;  // 1, 2, 3, 5, ... 2127
-    if (nth == 0) {
-        return;
-    }
-    if ((geometry & 0x80) != 0) {
-        test::HeapGuard::Current()->FailNth(nth);
-    } else {
-        faults->FailAny(nth);
-    }
-}
-
 void Run(fuzz::Input* input) {
     const u32 fileId = kFiles[input->U8() % 3];
     const u8 geometry = input->U8();
@@ -129,7 +130,10 @@ void Run(fuzz::Input* input) {
     test::MemVolume volume(options);
     volume.LoadFile(fileId, file);
     test::FaultService faults(&volume.fs);
-    SetFault(&faults, geometry, pattern);
+    const bool changes = (pattern & 1) != 0;
+    if (!changes) {
+        SetFault(&faults, geometry, pattern, 8);  // 1, 2, 3, 5, ... 2127
+    }
     {
         test::TestTree owner(&volume, fileId);
         const test::Metered tree(&owner.tree);
@@ -141,8 +145,11 @@ void Run(fuzz::Input* input) {
                 HfsRuns runs;
                 tree->LoadBadBlocks(&runs);
             }
-            if ((pattern & 1) != 0 && Change(tree, &volume, pattern)) {
-                Walk(tree, 1, (*tree).header.firstLeafNode);
+            if (changes && tree->Flush(0) == kOk) {
+                SetFault(&faults, geometry, pattern, 16);  // 1, 2, 3, 4, 6, ... 1127
+                if (Change(tree, &volume, pattern)) {
+                    Walk(tree, 1, (*tree).header.firstLeafNode);
+                }
             }
         }
     }
@@ -171,12 +178,12 @@ extern "C" std::size_t LLVMFuzzerCustomMutator(u8* data, std::size_t size, std::
     if (size <= kControl || mutator.OneIn(4)) {
         return LLVMFuzzerMutate(data, size, most);
     }
-    if (mutator.OneIn(8)) {
-        LLVMFuzzerMutate(data, kControl, kControl);
-    } else if (mutator.OneIn(4)) {
-        for (u8* control : {data + 1, data + 2}) {  // another fault
-            *control = static_cast<u8>((*control & 15) | mutator.Below(16) << 4);
-        }
+    if (mutator.OneIn(3)) {
+        // The same tree in other blocks, changed in another way or with another fault.
+        u8* control = data + 1 + mutator.Below(2);
+        *control = mutator.OneIn(2) ? static_cast<u8>(mutator.Below(256))
+                                    : static_cast<u8>((*control & 15) | mutator.Below(16) << 4);
+        return size;
     }
     mutator.TreeFile(data + kControl, size - kControl, kFiles[data[0] % 3]);
     return size;

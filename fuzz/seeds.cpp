@@ -118,6 +118,9 @@ void Operations() {
 void Image(const std::string& name, const Bytes& image) {
     Write("image", name + "-read", {0, 0}, image);
     Write("image", name + "-change", {1, 1}, image);
+    Write("image", name + "-change-much", {1, 0x7D}, image);
+    Write("image", name + "-rise-and-fall", {1, 0x3B}, image);
+    Write("image", name + "-change-in-small-blocks", {5, 0x75}, image);
     Write("image", name + "-write", {0x80, 1}, image);
     Write("image", name + "-force", {0x80, 0x81}, image);
     Write("image", name + "-full", {8, 0}, image);

@@ -36,6 +36,11 @@ void HeapGuard::FailNth(u32 nth, bool forever) {
     failed_ = false;
 }
 
+std::size_t HeapGuard::BytesOf(const void* block) const {
+    const auto found = live_.find(block);
+    return found != live_.end() ? found->second : 0;
+}
+
 void* HeapGuard::OnAlloc(void* self, std::size_t size) {
     HeapGuard* guard = static_cast<HeapGuard*>(self);
     guard->allocations_ += 1;

@@ -28,6 +28,9 @@ public:
     std::size_t PeakBytes() const { return peakBytes_; }
     void ResetPeak() { peakBytes_ = liveBytes_; }
 
+    // Size of a block that is out; 0: there is no such block.
+    std::size_t BytesOf(const void* block) const;
+
     // The one that stands in now; null: none.
     static HeapGuard* Current();
 
@@ -35,7 +38,7 @@ private:
     static void* OnAlloc(void* self, std::size_t size);
     static void OnFree(void* self, void* memory);
 
-    std::unordered_map<void*, std::size_t> live_;  // bytes by block
+    std::unordered_map<const void*, std::size_t> live_;  // bytes by block
     std::size_t liveBytes_ = 0;
     std::size_t peakBytes_ = 0;
     HostHeap heap_;

@@ -1,7 +1,8 @@
 // Holds every call of a tree to the bounds that no input may break: node requests at most four
-// times the tree's nodes and a few, cached nodes no more than there are, heap in proportion. Stands
-// for a pointer to the tree; what is called through it is measured until the call's statement ends,
-// so a statement that hands a field to a function of many calls says (*tree).field.
+// times the tree's nodes and a few, cached nodes no more than there are, heap in proportion to what
+// was requested and to the runs of the file. Stands for a pointer to the tree; what is called
+// through it is measured until the call's statement ends, so a statement that hands a field to a
+// function of many calls says (*tree).field.
 #pragma once
 
 #include "heap_guard.h"
@@ -26,6 +27,7 @@ public:
         u32 requests_;
         u32 totalNodes_;
         std::size_t heapBytes_ = 0;
+        std::size_t mapBytes_ = 0;
     };
 
     explicit Metered(CBTreeHfs* tree) : tree_(tree) {}
