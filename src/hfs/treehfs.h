@@ -86,11 +86,11 @@ struct HfsHintTable {
 // memory. Allocated with room for blocksPerNode blocks.
 struct HfsNode {
     rb_node link;            // by nodeNum; first member
+    u32 nodeNum;             // its place in the file: byte nodeNum << nodeShift
+    s32 refCount;            // references held; 0: cached all the same, -1: discarded
     list_head modifiedLink;  // linked to itself when no block is dirty
     HfsNode* hintedBy;       // the one node whose hints lead to this one; null: none
     HfsHintTable* hints;     // of an index node, in the node's own heap block; null: none
-    u32 nodeNum;             // its place in the file: byte nodeNum << nodeShift
-    s32 refCount;            // references held; 0: cached all the same, -1: discarded
     u32 hintedAt;            // record of that hint, unless records came or left before it since
     HfsBcbBuf bufs[1];       // the blocks, in order; blocksPerNode of them
 

@@ -8,6 +8,7 @@
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
+#include "hfs/treehfs/prefetch.h"
 #include "hfs/treehfs/report.h"
 #include "platform/heap.h"
 
@@ -235,6 +236,9 @@ int LoadNode(CBTreeHfs* tree, const Place& place, u32 nodeNum, NodeUse use, HfsN
         return status;
     }
     tree->readCount += 1;
+    // The descriptor and the offset table: needed once the node is linked.
+    Prefetch(node->bufs[0].data, 1);
+    Prefetch(TailOf(tree->header, node), 1);
     if (isNew) {
         AssertRequest(makeEmpty);
         status = InitialiseNew(tree, node);

@@ -7,6 +7,7 @@
 #include <cstddef>
 
 #include "hfs/treehfs.h"
+#include "hfs/treehfs/prefetch.h"
 
 namespace VELK {
 
@@ -23,10 +24,9 @@ inline std::size_t HintBytes(const CBTreeHfs* tree) {
 
 // Bytes from an index node to its hints: the next line of the processor's cache.
 inline std::size_t HintsOffset(const CBTreeHfs* tree) {
-    constexpr std::size_t kLine = 64;
     const std::size_t nodeSize =
         offsetof(HfsNode, bufs) + tree->header.blocksPerNode * sizeof(HfsBcbBuf);
-    return (nodeSize + kLine - 1) / kLine * kLine;
+    return (nodeSize + kCacheLine - 1) / kCacheLine * kCacheLine;
 }
 
 // The hints of one index node.

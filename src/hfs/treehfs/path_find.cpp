@@ -7,6 +7,7 @@
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/path_deliver.h"
 #include "hfs/treehfs/path_level.h"
+#include "hfs/treehfs/prefetch.h"
 #include "hfs/treehfs/report.h"
 
 namespace VELK {
@@ -145,6 +146,12 @@ bool PathStillLeads(const CBTreeHfs* tree) {
     return path.path[depth].node->nodeNum == tree->header.rootNode;
 }
 
+// Who asks for a place and no record goes on from there, with a walk or with a change.
+[[gnu::always_inline]] inline void PrefetchFrom(const BTHeaderMem& header, const HfsNode* leaf,
+                                                u32 index) {
+    PrefetchRecords(&header, leaf, NodeBytes(&header, leaf).U16(SlotOffset(&header, index)));
+}
+
 // Records are often inserted in key order. When the tree's own path still leads where it did, and
 // the key lies between the first and the last key of its leaf, or past the last one of the last
 // leaf, the way down is the one the path holds. Counters move as they would on the way down.
@@ -238,6 +245,9 @@ int CBTreeHfs::FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, 
             return status;
         }
         path->leadsAsOf = pathVersion;
+        if (record == nullptr && keyOut == nullptr) {
+            PrefetchFrom(header, path->path[1].node, static_cast<u32>(result.index));
+        }
     }
     path->level = 1;
     path->path[1].index = result.index;

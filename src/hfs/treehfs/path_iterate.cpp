@@ -5,6 +5,7 @@
 #include "hfs/treehfs/node_search.h"
 #include "hfs/treehfs/path_deliver.h"
 #include "hfs/treehfs/path_level.h"
+#include "hfs/treehfs/prefetch.h"
 #include "hfs/treehfs/report.h"
 
 namespace VELK {
@@ -34,7 +35,9 @@ int EnterLeaf(CBTreeHfs* tree, u32 sibling, Side side, HfsFindData* path) {
     path->leadsAsOf = 0;
     const int status = LoadLevel(tree, 1, sibling, way, path);
     if (status == kOk) {
-        PrefetchForStep(tree, path->path[1].node, side);  // the one after
+        HfsNode* leaf = path->path[1].node;
+        PrefetchRecords(&tree->header, leaf, 0);
+        PrefetchForStep(tree, leaf, side);  // the one after
     }
     return status;
 }

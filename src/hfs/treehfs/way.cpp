@@ -4,23 +4,19 @@
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/node_search.h"
+#include "hfs/treehfs/prefetch.h"
 
 namespace VELK {
 
 namespace {
 
-constexpr u32 kLine = 64;
-
 // What an index node remembers is searched first: asked for with the node itself, all that most
 // nodes have. Where an index node's hints begin follows from where it lies itself.
-void PrefetchHints(const CBTreeHfs* tree, const HfsNode* node) {
+[[gnu::always_inline]] inline void PrefetchHints(const CBTreeHfs* tree, const HfsNode* node) {
     constexpr u32 kUsualShare = 16;  // of the room, a sixteenth each
     constexpr u32 kUsual = 7;
-    const u8* hints = reinterpret_cast<const u8*>(node) + HintsOffset(tree);
-    const u32 end = HintRoom(tree) * kUsual / kUsualShare * u32{sizeof(HfsHint)};
-    for (u32 at = 0; at < end; at += kLine) {
-        __builtin_prefetch(hints + at);
-    }
+    Prefetch(reinterpret_cast<const u8*>(node) + HintsOffset(tree),
+             HintRoom(tree) * kUsual / kUsualShare * u32{sizeof(HfsHint)});
 }
 
 // A request met by a hint. What will be needed is asked for all at once, as each may be cold: the
@@ -31,7 +27,7 @@ void TakeHinted(CBTreeHfs* tree, const HintedWay& way, NodeUse use, HfsNode** ou
     if (use == NodeUse::kReadIndex) {
         PrefetchHints(tree, way.node);
     } else {
-        __builtin_prefetch(way.data + tree->header.blockSize - kLine);
+        __builtin_prefetch(way.data + tree->header.blockSize - kCacheLine);
     }
     TakeCached(tree, way.node, out);
 }
@@ -108,7 +104,7 @@ void PrefetchForStep(const CBTreeHfs* tree, HfsNode* node, Side side) {
         __builtin_prefetch(way.node);
         __builtin_prefetch(&way.node->bufs[0]);
         __builtin_prefetch(way.data);
-        __builtin_prefetch(way.data + tree->header.blockSize - kLine);
+        __builtin_prefetch(way.data + tree->header.blockSize - kCacheLine);
     }
 }
 
