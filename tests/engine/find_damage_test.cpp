@@ -177,6 +177,15 @@ TEST_P(FindDamage, ALeafWithoutRecordsHoldsNothing) {
     EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
+// Who looks for a place gets it, whatever stands there.
+TEST_P(FindDamage, AFreeSpaceOffsetOutsideTheNodeIsNotFollowed) {
+    image_.SetNode(kLeaf, NodeImage{}.Build(NodeSize()));
+    image_.Patch16(kLeaf, NodeSize() - 2, 0xFFFF);
+    EXPECT_EQ(Find(), kOk);
+    EXPECT_EQ(path_.path[1].index, 0);
+    EXPECT_EQ(bench_.capture.Take(), Events{Asserted(2671)});
+}
+
 // Each Map of a lookup fails in turn.
 TEST_P(FindDamage, AnUnreadableNodeIsReportedAtEveryLevel) {
     for (u32 nth = 1; nth <= 3; ++nth) {
