@@ -53,7 +53,8 @@ class Terminal:
             return file.read().rpartition(")")[2].split()[0] == "S"
 
     def wait_for_keys(self):
-        """Until the shell waits for a key: a signal in the instant before counts with the next."""
+        """Until the shell waits for a key: a signal in the instant before counts with the next, and
+        the key that ends the input is not one yet while the terminal collects lines."""
         end = time.time() + 60
         samples = 0
         while samples < 3 and time.time() < end:
@@ -101,6 +102,7 @@ for turn in (1, 2):
 shell.type("repeat 2\necho $i\nend\n", "# 1\n# 2\n" + PROMPT)
 
 # --- the end of the input ------------------------------------------------------------------------
+shell.wait_for_keys()
 shell.type("\x04", r"\n.*nothing was written: 1 block changed in memory")
 shell.ends(0, "the end of the input")
 
