@@ -5,7 +5,7 @@
 #include <cstring>
 
 #include "bench.h"
-#include "hfs/treehfs/node_search.h"
+#include "hfs/treehfs/node_child.h"
 
 namespace VELK::test {
 namespace {
@@ -289,10 +289,8 @@ TEST_P(FindDamage, LinksAreNoSlots) {
         const LooseNode node(bytes, MapBlock(), 3);
         const s32 index = static_cast<s32>(NodeSize() / 2 - 2);
         EXPECT_EQ(PlainChild(node.Hdr(), node.Get(), index), 0u);
-        NodeKey record;
-        const BTreeKey* key = nullptr;
-        EXPECT_FALSE(
-            DescribePlain(&bench_.tree.tree, node.Get(), static_cast<u32>(index), &record, &key));
+        RecordView record;
+        EXPECT_FALSE(ViewPlain(&bench_.tree.tree, node.Get(), static_cast<u32>(index), &record));
     }
 }
 

@@ -1,6 +1,7 @@
 // Searches in one node look at no byte that is not the node's: each block of it ends where memory
 // does, and a record begins on the last byte of one.
 #include "hfs/treehfs/node_search.h"
+#include "hfs/treehfs/node_child.h"
 
 #include <sys/mman.h>
 #include <unistd.h>
@@ -100,8 +101,7 @@ TEST_P(FencedNode, ARecordThatBeginsOnABlocksLastByteIsReadWithCare) {
             ASSERT_EQ(SearchNode(&bench_.tree, node_->Get(), key, &result), kOk);
             EXPECT_TRUE(result.found);
             EXPECT_EQ(result.index, static_cast<s32>(odd));
-            const BTreeKey* found = nullptr;
-            EXPECT_FALSE(DescribePlain(&bench_.tree, node_->Get(), odd, &result.record, &found));
+            EXPECT_FALSE(ViewPlain(&bench_.tree, node_->Get(), odd, &result.record));
             EXPECT_EQ(PlainChild(&bench_.tree.header, node_->Get(), static_cast<s32>(odd)), 0u);
             EXPECT_EQ(bench_.capture.Take(), Events{});
         }

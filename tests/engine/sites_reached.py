@@ -35,7 +35,6 @@ UNREACHABLE = {
     5062: "the lookup before it set it",
     5066: "an existing key has been answered before",
     5370: "every node holds 512 bytes or more",
-    9031: "the search made the same checks on the record it found",
     9201: "a record that was given room is no longer than the scratch buffer, which is there",
     9213: "as 9201",
     9263: "as 4960",

@@ -33,7 +33,7 @@ LINES = [
     "bytes node_desc prefetch report noderef own_change",
     "node_access keys_compare header_record slots hints",
     "cache cache_dirty key_shape scratch separator",
-    "map_walk path_level path_find path_deliver path_check node_search way",
+    "map_walk path_level path_find path_deliver path_check plain_record node_child node_search way",
     "path_iterate badblocks",
     "record_insert record_delete record_move record_update",
     "map_alloc space_fork space_extend space_reserve space_clump",

@@ -1,7 +1,7 @@
 // Binary search for a key inside one node.
 #pragma once
 
-#include "hfs/treehfs.h"
+#include "hfs/treehfs/path_deliver.h"
 
 namespace VELK {
 
@@ -46,10 +46,8 @@ private:
 // What a search in one node came to.
 struct SearchResult {
     bool found;
-    bool isLocated;       // `record` describes the equal record
-    s32 index;            // the equal record, or the first greater one
-    const BTreeKey* key;  // of the equal record, in one piece
-    NodeKey record;
+    s32 index;          // the equal record, or the first greater one
+    RecordView record;  // the equal record
 };
 
 // Reports a key that cannot be read at 3005, kErrNoMemory nowhere.
@@ -59,17 +57,5 @@ int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Searc
 // key of the tree's last leaf. False, nothing reported: it does not, or the node is not so plain
 // that this can be told at once.
 bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SoughtKey& key, SearchResult* result);
-
-// What delivery needs of record `index` of a leaf whose keys are in folded order: what FetchKey
-// would give. False, nothing reported: something about it is out of the ordinary, or its key or
-// data lies in two blocks.
-bool DescribePlain(const CBTreeHfs* tree, const HfsNode* leaf, u32 index, NodeKey* record,
-                   const BTreeKey** key);
-
-// GetChildNodeNum without the way round for plain records.
-int ChildOf(const CBTreeHfs* tree, const HfsNode* node, s32 index, u32* child);
-
-// The child of a record of which nothing is out of the ordinary; 0: something is.
-u32 PlainChild(const BTHeaderMem* hdr, const HfsNode* node, s32 index);
 
 }  // namespace VELK

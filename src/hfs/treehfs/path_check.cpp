@@ -1,8 +1,8 @@
 // Checks of a stored search path. See path_check.h.
 #include "hfs/treehfs/path_check.h"
 
+#include "hfs/treehfs/node_child.h"
 #include "hfs/treehfs/node_desc.h"
-#include "hfs/treehfs/node_search.h"
 
 namespace VELK {
 

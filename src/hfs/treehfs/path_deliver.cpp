@@ -2,8 +2,6 @@
 // buffer; the key is always delivered before the data, so data may use the whole of it.
 #include "hfs/treehfs/path_deliver.h"
 
-#include <cstring>
-
 #include "hfs/treehfs/bytes.h"
 #include "hfs/treehfs/key_shape.h"
 #include "hfs/treehfs/report.h"
@@ -13,66 +11,55 @@ namespace VELK {
 
 namespace {
 
-// Copies a key in steps of words, the last one over the end of the step before it. Keys are short:
-// a compiler that knows so makes of memcpy an instruction that takes longer to begin than to copy.
-void CopyKey(u8* target, const u8* source, u32 size) {
-    constexpr u32 kStep = 16;
-    u8 step[kStep];
-    if (size < kStep) {
-        std::memcpy(target, source, size);
-        return;
-    }
-    for (u32 at = 0; at < size - kStep; at += kStep) {
-        std::memcpy(step, source + at, kStep);
-        std::memcpy(target + at, step, kStep);
-    }
-    std::memcpy(step, source + size - kStep, kStep);
-    std::memcpy(target + size - kStep, step, kStep);
+RecordView ViewOf(const NodeKey& record, const BTreeKey* key) {
+    return {key,
+            record.data,
+            record.keySize,
+            record.dataSize,
+            record.offset + record.size - record.dataSize,
+            record.dataFirstBytes};
 }
 
 }  // namespace
 
-int FetchKey(CBTreeHfs* tree, const HfsNode* node, int index, NodeKey* record,
-             const BTreeKey** key) {
-    int status = node->GetKey(&tree->header, index, record);
+int FetchKey(CBTreeHfs* tree, const HfsNode* node, int index, RecordView* record) {
+    NodeKey located;
+    int status = node->GetKey(&tree->header, index, &located);
     if (HFS_UNLIKELY(status != kOk)) {
         return status;
     }
-    status = GatherKey(tree, node, *record, key);
+    const BTreeKey* key = nullptr;
+    status = GatherKey(tree, node, located, &key);
     if (HFS_UNLIKELY(status == kErrNoMemory)) {
         return status;
     }
-    if (HFS_UNLIKELY(status != kOk || !NodeKeyIsSound(tree, *key, record->keySize))) {
+    if (HFS_UNLIKELY(status != kOk || !NodeKeyIsSound(tree, key, located.keySize))) {
         return Fail(kErrCorrupt, kReasonNode, 9020);
     }
+    *record = ViewOf(located, key);
     return kOk;
 }
 
-int DeliverData(CBTreeHfs* tree, const HfsNode* node, const NodeKey& record, void* target,
-                u32 size) {
-    const u8* source = record.data;
-    if (size > record.dataFirstBytes) {
-        u8* gathered = DataScratch(tree, size);
-        if (gathered == nullptr) {
-            return kErrNoMemory;
-        }
-        NodeBytes(&tree->header, node)
-            .CopyOut(gathered, record.offset + record.size - record.dataSize, size);
-        source = gathered;
+int FetchData(const CBTreeHfs* tree, const HfsNode* node, int index, RecordView* record) {
+    NodeKey located;
+    const int status = node->GetKey(&tree->header, index, &located);
+    if (status == kOk) {
+        *record = ViewOf(located, nullptr);
     }
-    if (tree->convert.DataToMemory != nullptr) {
-        tree->convert.DataToMemory(target, source, size);
-    } else if (size > 0) {
+    return status;
+}
+
+const u8* GatherData(CBTreeHfs* tree, const HfsNode* node, const RecordView& record, u32 size) {
+    u8* gathered = DataScratch(tree, size);
+    if (gathered != nullptr) {
+        NodeBytes(&tree->header, node).CopyOut(gathered, record.dataOffset, size);
+    }
+    return gathered;
+}
+
+[[gnu::noinline]] void CopyData(void* target, const u8* source, u32 size) {
+    if (size > 0) {
         std::memcpy(target, source, size);
-    }
-    return kOk;
-}
-
-void DeliverKey(const CBTreeHfs* tree, const BTreeKey* key, void* target, u32 size) {
-    if (tree->convert.KeyToMemory != nullptr) {
-        tree->convert.KeyToMemory(target, key, size);
-    } else {
-        CopyKey(static_cast<u8*>(target), reinterpret_cast<const u8*>(key), size);
     }
 }
 

@@ -2,6 +2,7 @@
 #include "hfs/treehfs/bytes.h"
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/hints.h"
+#include "hfs/treehfs/node_child.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/node_search.h"
 #include "hfs/treehfs/noderef.h"
@@ -41,13 +42,34 @@ int CheckPlace(const HfsNode* node, int level) {
     return kOk;
 }
 
+// See LoadLevel.
+[[gnu::always_inline]] inline int LoadHere(CBTreeHfs* tree, int level, u32 nodeNum,
+                                           const HintedWay& way, HfsFindData* path) {
+    HfsFindLevel* entry = &path->path[level];
+    entry->index = 0;
+    ReleaseNode(entry->node);
+    entry->node = nullptr;
+    const u32 readBefore = tree->readCount;
+    const NodeUse use = level > 1 ? NodeUse::kReadIndex : NodeUse::kRead;
+    HFS_TRY(FetchByWay(tree, way, nodeNum, use, &entry->node), 2909);
+    const int status = CheckPlace(entry->node, level);
+    if (HFS_UNLIKELY(status != kOk && nodeNum >= tree->validNodes &&
+                     tree->readCount != readBefore)) {
+        // A damaged link led past the initialised part of the file, and the cache made up an empty,
+        // modified node for it. Looking must leave nothing to write.
+        DropNode(tree, entry->node);
+        entry->node = nullptr;
+    }
+    return status;
+}
+
 void DeliverFoundKey(const CBTreeHfs* tree, const SearchResult& found, void* keyOut,
                      unsigned* keyOutSize) {
     const u32 size = found.record.keySize;
     HFS_ASSERT(*keyOutSize <= size, 3039);
     HFS_ASSERT(*keyOutSize >= tree->convert.minKeyBuffer, 3040);
     // The whole key is delivered whatever the capacity: callers offer room for any key.
-    DeliverKey(tree, found.key, keyOut, size);
+    DeliverKey(tree, found.record.key, keyOut, size);
     *keyOutSize = Least(size, *keyOutSize);
 }
 
@@ -102,7 +124,7 @@ int Descend(CBTreeHfs* tree, const SoughtKey& key, HfsFindData* path, bool* foun
         }
         int status = CheckLevel(level);
         if (status == kOk) {
-            status = LoadLevel(tree, level, nodeNum, way, path);
+            status = LoadHere(tree, level, nodeNum, way, path);
         }
         HFS_TRY(status, 2982);
         HfsFindLevel* entry = &path->path[level];
@@ -170,8 +192,9 @@ bool FindOnSameLeaf(CBTreeHfs* tree, const SoughtKey& key, SearchResult* result)
 
 void HfsFindData::ClearPath() {
     int below = -1;
+#pragma GCC unroll 16
     for (int i = 0; i <= static_cast<int>(kMaxPathDepth); ++i) {
-        if (path[i].node == nullptr) {
+        if (HFS_LIKELY(path[i].node == nullptr)) {
             continue;
         }
         HFS_ASSERT(below < 0 || below == i - 1, 752);
@@ -190,29 +213,7 @@ int CheckLevel(int level) {
 }
 
 int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, const HintedWay& way, HfsFindData* path) {
-    HfsFindLevel* entry = &path->path[level];
-    entry->index = 0;
-    ReleaseNode(entry->node);
-    entry->node = nullptr;
-    const u32 readBefore = tree->readCount;
-    const NodeUse use = level > 1 ? NodeUse::kReadIndex : NodeUse::kRead;
-    HFS_TRY(FetchByWay(tree, way, nodeNum, use, &entry->node), 2909);
-    const int status = CheckPlace(entry->node, level);
-    if (HFS_UNLIKELY(status != kOk && nodeNum >= tree->validNodes &&
-                     tree->readCount != readBefore)) {
-        // A damaged link led past the initialised part of the file, and the cache made up an empty,
-        // modified node for it. Looking must leave nothing to write.
-        DropNode(tree, entry->node);
-        entry->node = nullptr;
-    }
-    return status;
-}
-
-bool StandsOnLeaf(const HfsFindData* path, u32 slack) {
-    const HfsFindLevel& leaf = path->path[1];
-    return path->level == 1 && leaf.node != nullptr && IsLeaf(leaf.node) &&
-           Height(leaf.node) == 1 && leaf.index >= 0 &&
-           static_cast<u32>(leaf.index) < NumRecords(leaf.node) + slack;
+    return LoadHere(tree, level, nodeNum, way, path);
 }
 
 int CBTreeHfs::ReadLevel(int level, unsigned nodeNum, HfsFindData* fd) {
@@ -255,9 +256,6 @@ int CBTreeHfs::FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, 
         return kOk;
     }
     const HfsNode* leaf = path->path[1].node;
-    if (!result.isLocated) {
-        HFS_TRY(leaf->GetKey(&header, result.index, &result.record), 9031);
-    }
     if (keyOut != nullptr) {
         DeliverFoundKey(this, result, keyOut, keyOutSize);
     }

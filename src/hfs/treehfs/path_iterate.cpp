@@ -2,9 +2,9 @@
 // over the end of a leaf the upper levels no longer lead to the position.
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/node_desc.h"
-#include "hfs/treehfs/node_search.h"
 #include "hfs/treehfs/path_deliver.h"
 #include "hfs/treehfs/path_level.h"
+#include "hfs/treehfs/plain_record.h"
 #include "hfs/treehfs/prefetch.h"
 #include "hfs/treehfs/report.h"
 
@@ -112,32 +112,38 @@ struct Delivery {
     unsigned* keySize;
 };
 
-int Deliver(CBTreeHfs* tree, const HfsFindLevel& leaf, const Delivery& to) {
-    NodeKey record;
-    const BTreeKey* key = nullptr;
-    int status = kOk;
-    if (to.keyOut == nullptr) {
-        status = leaf.node->GetKey(&tree->header, leaf.index, &record);
-    } else if (!DescribePlain(tree, leaf.node, static_cast<u32>(leaf.index), &record, &key)) {
-        status = FetchKey(tree, leaf.node, leaf.index, &record, &key);
+int Fetch(CBTreeHfs* tree, const HfsFindLevel& leaf, bool withKey, RecordView* record) {
+    const int status = withKey ? FetchKey(tree, leaf.node, leaf.index, record)
+                               : FetchData(tree, leaf.node, leaf.index, record);
+    if (status != kOk && status != kErrNoMemory) {
+        Report(status, 3305);
     }
-    if (HFS_UNLIKELY(status != kOk)) {
-        if (status != kErrNoMemory) {
-            Report(status, 3305);
+    return status;
+}
+
+[[gnu::always_inline]] inline int Deliver(CBTreeHfs* tree, const HfsFindLevel& leaf,
+                                          const Delivery& to) {
+    RecordView record;
+    if (to.keyOut == nullptr ||
+        HFS_UNLIKELY(!ViewPlain(tree, leaf.node, static_cast<u32>(leaf.index), &record))) {
+        RecordView fetched;
+        const int status = Fetch(tree, leaf, to.keyOut != nullptr, &fetched);
+        if (HFS_UNLIKELY(status != kOk)) {
+            return status;
         }
-        return status;
+        record = fetched;  // a view nobody else saw can stay in registers
     }
     HFS_ASSERT(to.keyOut != nullptr || to.keyCapacity == 0, 3312);
     if (to.keyOut != nullptr) {
         HFS_ASSERT(to.keyCapacity >= record.keySize, 3316);
         HFS_ASSERT(to.keyCapacity >= tree->convert.minKeyBuffer, 3317);
         *to.keySize = Least(to.keyCapacity, record.keySize);
-        DeliverKey(tree, key, to.keyOut, *to.keySize);
+        DeliverKey(tree, record.key, to.keyOut, *to.keySize);
     }
     HFS_ASSERT(tree->fileId == kAttributesFileId || to.recordCapacity >= record.dataSize, 3339);
     HFS_ASSERT(to.recordCapacity >= tree->convert.minDataBuffer, 3340);
     const u32 size = Least(to.recordCapacity, record.dataSize);
-    status = DeliverData(tree, leaf.node, record, to.record, size);
+    const int status = DeliverData(tree, leaf.node, record, to.record, size);
     if (status == kOk) {
         *to.recordSize = size;
     }

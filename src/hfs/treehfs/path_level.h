@@ -1,7 +1,7 @@
 // Loading of one level of a search path.
 #pragma once
 
-#include "hfs/treehfs.h"
+#include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/way.h"
 
 namespace VELK {
@@ -17,6 +17,11 @@ int LoadLevel(CBTreeHfs* tree, int level, u32 nodeNum, const HintedWay& way, Hfs
 // Whether `path` stands on a record of a leaf: level 1, a leaf held there, its index at most
 // `slack` past the last record. False for a path that was cleared, failed half-way or was outlived
 // by its records.
-bool StandsOnLeaf(const HfsFindData* path, u32 slack);
+inline bool StandsOnLeaf(const HfsFindData* path, u32 slack) {
+    const HfsFindLevel& leaf = path->path[1];
+    return path->level == 1 && leaf.node != nullptr && IsLeaf(leaf.node) &&
+           Height(leaf.node) == 1 && leaf.index >= 0 &&
+           static_cast<u32>(leaf.index) < NumRecords(leaf.node) + slack;
+}
 
 }  // namespace VELK
