@@ -150,7 +150,9 @@ private:
 
     // From the first key of `parent` on; keys are delivered because a listing needs them.
     u32 Walk(u32 parent, u64* sum, bool oneFolder) {
-        alignas(8) u8 key[kKeyLengthSize + kMaxKeyLength + 6] = {6};
+        alignas(8) u8 key[kKeyLengthSize + kMaxKeyLength + 6];
+        std::memset(key, 0, kKeyLengthSize + kCatKeyFixed);  // no name
+        key[0] = kCatKeyFixed;
         u8 data[kLargestData];
         bool found = false;
         if (tree_.FindEntry(reinterpret_cast<BTreeKey*>(key), parent, &path_, &found, nullptr,

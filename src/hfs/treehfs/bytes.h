@@ -8,6 +8,7 @@
 // ends.
 #pragma once
 
+#include <bit>
 #include <cstring>
 
 #include "hfs/treehfs.h"
@@ -21,13 +22,19 @@ inline u32 GetBe32(const u8* bytes) {
     return (static_cast<u32>(bytes[0]) << 24) | (static_cast<u32>(bytes[1]) << 16) |
            (static_cast<u32>(bytes[2]) << 8) | bytes[3];
 }
+// In one piece: who reads a number back soon would wait for single bytes to come together.
 inline void PutBe16(u8* bytes, u32 value) {
-    bytes[0] = static_cast<u8>(value >> 8);
-    bytes[1] = static_cast<u8>(value);
+    u16 stored = static_cast<u16>(value);
+    if constexpr (std::endian::native == std::endian::little) {
+        stored = __builtin_bswap16(stored);
+    }
+    std::memcpy(bytes, &stored, sizeof stored);
 }
 inline void PutBe32(u8* bytes, u32 value) {
-    PutBe16(bytes, value >> 16);
-    PutBe16(bytes + 2, value);
+    if constexpr (std::endian::native == std::endian::little) {
+        value = __builtin_bswap32(value);
+    }
+    std::memcpy(bytes, &value, sizeof value);
 }
 // Host-order 16 bits of a search key, wherever it lies.
 inline u16 GetHost16(const void* bytes) {

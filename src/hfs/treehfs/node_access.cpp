@@ -118,6 +118,31 @@ bool GetPlainKey(const BTHeaderMem* hdr, const HfsNode* node, u32 index, NodeKey
     return true;
 }
 
+// GetFreeKey of a node in one block, as far as nothing about it is out of the ordinary.
+bool GetPlainFree(const BTHeaderMem* hdr, const HfsNode* node, u32 index, NodeKey* out) {
+    const u32 nodeSize = hdr->nodeSize;
+    const u64 fromEnd = static_cast<u64>(index) * kSlotSize + kSlotSize;
+    if (hdr->blockSize != nodeSize || index != NumRecords(node) || fromEnd >= nodeSize) {
+        return false;
+    }
+    u8* data = node->bufs[0].data;
+    const u32 position = nodeSize - static_cast<u32>(fromEnd);
+    const u32 start = GetBe16(data + position);
+    if (start > position) {
+        return false;
+    }
+    out->offset = start;
+    out->firstBytes = nodeSize - start;
+    out->ptr = data + start;
+    out->next1 = nullptr;
+    out->next2 = nullptr;
+    out->size = position - start;
+    out->entryPos = position;
+    out->entry = data + position;
+    out->entryBytes = static_cast<u32>(fromEnd);
+    return true;
+}
+
 }  // namespace
 
 unsigned GetKeyLength(const BTHeaderMem* hdr, const BTreeKey* key, bool leaf) {
@@ -178,6 +203,9 @@ int HfsNode::GetKey(const BTHeaderMem* hdr, int index, NodeKey* out) const {
 }
 
 int HfsNode::GetFreeKey(const BTHeaderMem* hdr, unsigned index, NodeKey* out) const {
+    if (hdr->blocksPerNode == 1 && GetPlainFree(hdr, this, index, out)) {
+        return kOk;
+    }
     HFS_ASSERT(index == NumRecords(this), 588);
     const u64 fromEnd = static_cast<u64>(index) * kSlotSize + kSlotSize;
     if (fromEnd >= hdr->nodeSize) {

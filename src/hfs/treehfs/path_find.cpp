@@ -172,6 +172,8 @@ bool PathStillLeads(const CBTreeHfs* tree) {
 [[gnu::always_inline]] inline void PrefetchFrom(const BTHeaderMem& header, const HfsNode* leaf,
                                                 u32 index) {
     PrefetchRecords(&header, leaf, NodeBytes(&header, leaf).U16(SlotOffset(&header, index)));
+    __builtin_prefetch(leaf->modifiedLink.prev, 1);
+    __builtin_prefetch(leaf->modifiedLink.next, 1);
 }
 
 // Records are often inserted in key order. When the tree's own path still leads where it did, and

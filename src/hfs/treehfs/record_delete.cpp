@@ -10,6 +10,18 @@ namespace VELK {
 
 namespace {
 
+// Gives every slot from `slot` up to `end` the value of its lower neighbour, `lower` for the first
+// of them, less the deleted bytes. Returns what the last one held.
+u32 CloseRun(u8* slot, u8* const end, u32 lower, u32 removed) {
+    for (; slot < end; slot += kSlotSize) {
+        HFS_ASSERT(lower > removed, 1082);
+        const u32 value = GetBe16(slot);
+        PutBe16(slot, lower - removed);
+        lower = value;
+    }
+    return lower;
+}
+
 // Gives every slot from that of the record before the last up to that of the record behind the
 // deleted one the value of its lower neighbour, less the deleted bytes. Blocks are marked as the
 // walk enters them; a failure leaves the slots before in place.
@@ -28,19 +40,34 @@ int CloseSlots(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 ind
             piece = end - position;
         }
         u8* slot = bytes.At(position);
-        for (u8* const pieceEnd = slot + piece; slot < pieceEnd; slot += kSlotSize) {
-            HFS_ASSERT(lower > removed, 1082);
-            const u32 value = GetBe16(slot);
-            PutBe16(slot, lower - removed);
-            lower = value;
-        }
+        lower = CloseRun(slot, slot + piece, lower, removed);
         position += piece;
     }
     return kOk;
 }
 
+// CloseGap in a node that lies in one block and was marked before: no step can be refused. False:
+// nothing has changed.
+bool ClosePlainGap(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 index) {
+    if (tree->header.blockSize != tree->header.nodeSize || !node->bufs[0].dirty) {
+        return false;
+    }
+    u8* const data = node->bufs[0].data;
+    NodeBytes(&tree->header, node).Move(slots.start, slots.end, slots.free - slots.end);
+    const u32 removed = slots.end - slots.start;
+    PutBe16(data + slots.limit, 0);
+    CloseRun(data + slots.limit + kSlotSize, data + SlotOffset(&tree->header, index), slots.free,
+             removed);
+    SetNumRecords(&tree->header, node, slots.count - 1);
+    node->modifiedLink.MoveTail(&tree->modifiedList);
+    return true;
+}
+
 // Closes the gap that record `index` leaves.
 int CloseGap(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 index) {
+    if (HFS_LIKELY(ClosePlainGap(tree, node, slots, index))) {
+        return kOk;
+    }
     HFS_TRY(MarkDirty(tree, node, slots.limit), 962);
     HFS_TRY(MarkDirty(tree, node, slots.start, slots.free - slots.start), 1011);
     const NodeBytes bytes(&tree->header, node);

@@ -33,11 +33,18 @@ bool LoadRecordSlots(const BTHeaderMem* hdr, const HfsNode* node, u32 index, Rec
     if (index >= slots->count || !CountFits(hdr, slots->count)) {
         return false;
     }
-    const NodeBytes bytes(hdr, node);
     slots->limit = SlotOffset(hdr, slots->count);
-    slots->start = bytes.U16(SlotOffset(hdr, index));
-    slots->end = bytes.U16(SlotOffset(hdr, index + 1));
-    slots->free = bytes.U16(slots->limit);
+    if (hdr->blockSize == hdr->nodeSize) {
+        const u8* table = node->bufs[0].data + SlotOffset(hdr, index);
+        slots->start = GetBe16(table);
+        slots->end = GetBe16(table - kSlotSize);
+        slots->free = GetBe16(node->bufs[0].data + slots->limit);
+    } else {
+        const NodeBytes bytes(hdr, node);
+        slots->start = bytes.U16(SlotOffset(hdr, index));
+        slots->end = bytes.U16(SlotOffset(hdr, index + 1));
+        slots->free = bytes.U16(slots->limit);
+    }
     return kDescSize <= slots->start && slots->start < slots->end && slots->end <= slots->free &&
            slots->free <= slots->limit && ((slots->start | slots->end | slots->free) & 1) == 0;
 }
