@@ -70,15 +70,24 @@ void CopySwapped(u8* target, const u8* source, unsigned size = sizeof(Field)) {
     std::memcpy(target, &fields, size);
 }
 
+// In words, the last one over the end of the word before it: names have any length, and a loop over
+// their last units ends where no processor expects it to. That word is read before a conversion in
+// place could change it.
 template <typename Field>
 void CopyRun(u8* target, const u8* source, unsigned size) {
-    unsigned at = 0;
-    for (; size - at >= sizeof(u64); at += sizeof(u64)) {
-        CopySwapped<Field>(target + at, source + at, sizeof(u64));
+    constexpr unsigned kStep = sizeof(u64);
+    if (size < kStep) {
+        for (unsigned at = 0; at < size; at += sizeof(Field)) {
+            CopySwapped<Field>(target + at, source + at);
+        }
+        return;
     }
-    for (; at < size; at += sizeof(Field)) {
-        CopySwapped<Field>(target + at, source + at);
+    u8 last[kStep];
+    CopySwapped<Field>(last, source + size - kStep, kStep);
+    for (unsigned at = 0; at + kStep < size; at += kStep) {
+        CopySwapped<Field>(target + at, source + at, kStep);
     }
+    std::memcpy(target + size - kStep, last, kStep);
 }
 
 template <unsigned kWidth>
