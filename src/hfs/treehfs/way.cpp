@@ -66,7 +66,7 @@ void PrefetchForStep(const CBTreeHfs* tree, HfsNode* node, Side side) {
         __builtin_prefetch(way.node);
         __builtin_prefetch(&way.node->bufs[0]);
         __builtin_prefetch(way.data);
-        __builtin_prefetch(way.data + tree->header.blockSize - kCacheLine);
+        PrefetchTail(tree->header, way.data);
     }
 }
 

@@ -48,7 +48,7 @@ inline void TakeHinted(CBTreeHfs* tree, const HintedWay& way, NodeUse use, HfsNo
     if (use == NodeUse::kReadIndex) {
         PrefetchHints(tree, way.node);
     } else {
-        __builtin_prefetch(way.data + tree->header.blockSize - kCacheLine);
+        PrefetchTail(tree->header, way.data);
     }
     TakeCached(tree, way.node, out);
 }
