@@ -27,6 +27,17 @@ const BTreeKey* StoredKeyOf(const u8* stored) {
     return reinterpret_cast<const BTreeKey*>(stored);
 }
 
+// False also when the tree cannot be opened: whoever walks it says so.
+bool IsReversed(Session* session, u32 fileId, const KeyRange& range) {
+    Problem problem;
+    const CBTreeHfs* tree = session->TryTree(fileId, &problem);
+    if (tree == nullptr || !range.from || !range.to) {
+        return false;
+    }
+    const std::vector<u8> to = StoredKey(fileId, *range.to);
+    return tree->compareKeys(range.from->Key(), range.from->id, StoredKeyOf(to.data())) > 0;
+}
+
 }  // namespace
 
 SearchKey KeyArgument(Session* session, u32 fileId, const std::string& text) {
@@ -64,6 +75,10 @@ KeyRange RangeArgument(Session* session, u32 fileId, const std::string& text) {
     }
     if (dots + 2 < text.size()) {
         range.to = KeyArgument(session, fileId, text.substr(dots + 2));
+    }
+    if (IsReversed(session, fileId, range)) {
+        ThrowArgument("", "range '" + text + "': the first key sorts behind the second",
+                      "exchange them");
     }
     return range;
 }

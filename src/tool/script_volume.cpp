@@ -88,6 +88,16 @@ std::unique_ptr<ImageVolume> OpenNew(const TargetOptions& target) {
     return volume;
 }
 
+// Whether two names, of files that need not be there yet, lead to one.
+bool IsSameFile(const std::string& one, const std::string& other) {
+    namespace files = std::filesystem;
+    std::error_code none;
+    const auto place = [&none](const std::string& name) {
+        return files::weakly_canonical(files::absolute(name, none), none);
+    };
+    return place(one) == place(other) || files::equivalent(one, other, none);
+}
+
 // REQUIRES of a file that is to be written: it is not there, or --force replaces it.
 void CheckReplaces(const TargetOptions& options, const std::string& file) {
     if (!options.force && !file.empty() && access(file.c_str(), F_OK) == 0) {
@@ -191,6 +201,10 @@ std::unique_ptr<ImageVolume> OpenTarget(const Invocation& call, const TargetOpti
                    "");
     }
     CheckReplaces(options, options.saveFile);  // now, not when all the work is done
+    if (!options.undoFile.empty() && !options.saveFile.empty() &&
+        IsSameFile(options.undoFile, options.saveFile)) {
+        ThrowFailed(options.saveFile, "--undo writes there", "choose another name");
+    }
     if (!options.newVolume.empty()) {
         if (options.write) {
             ThrowUsage(call.command.name, "--new and --write do not go together",

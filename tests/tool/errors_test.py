@@ -125,6 +125,10 @@ expect(["find", good, "--key", "hex:0010 0000 0002 0003 0061 0062 0063"], 16,
        "treehfs: hex:0010 ... : length field says 16 bytes, 12 follow")
 expect(["dump", good, "--range", "2:a-2:b"], 16,
        "treehfs: range '2:a-2:b': expected FROM..TO: for example '2:a..2:b', '2:a..' or '..2:b'")
+expect(["dump", good, "--range", "2:b..2:a"], 16,
+       "treehfs: range '2:b..2:a': the first key sorts behind the second: exchange them")
+expect(["dump", good, "--range", "3:a..2:zz", "--reverse"], 16,
+       "treehfs: range '3:a..2:zz': the first key sorts behind the second: exchange them")
 
 # --- the command line ------------------------------------------------------------------------
 expect(["chek"], 16, "treehfs: unknown command 'chek' (did you mean check?)")

@@ -367,6 +367,9 @@ refused("treehfs: same.img: is the image itself: choose another name",
 os.link(folder / "same.img", folder / "other-name")
 refused("treehfs: other-name: is the image itself: choose another name",
         "apply", "same.img", "one.tr", "--write", "--undo", "other-name", "--force")
+refused("treehfs: ./kept: --undo writes there: choose another name",
+        "apply", "same.img", "one.tr", "--write", "--undo", "kept", "--save", "./kept", "--force")
+checks.check(not (folder / "kept").exists(), "nothing was written before the names were looked at")
 small_volume("copied.img")
 run("apply", "copied.img", "one.tr", "--write", "--save", "copy.img", "-q")
 checks.check(is_clean("copied.img") and
