@@ -15,8 +15,8 @@ constexpr u32 kCacheLine = 64;  // bytes
     }
 }
 
-// The offset table of a node of which only the first block is known. The blocks of a node mostly lie
-// one behind the other; where they do not, the request is in vain.
+// The offset table of a node of which only the first block is known. The blocks of a node mostly
+// lie one behind the other; where they do not, the request is in vain.
 [[gnu::always_inline]] inline void PrefetchTail(const BTHeaderMem& header, const u8* firstBlock) {
     const std::uintptr_t end = reinterpret_cast<std::uintptr_t>(firstBlock) + header.nodeSize;
     __builtin_prefetch(reinterpret_cast<const void*>(end - kCacheLine));
