@@ -31,7 +31,7 @@ struct FoldedKeys : CatalogShape {
     }
 };
 struct OtherKeys : AnyShape {
-    explicit OtherKeys(const SoughtKey& key) : AnyShape{key.Fixed(), key.NameLengthAt()} {}
+    explicit OtherKeys(const SoughtKey& key) : AnyShape(key.Fixed(), key.NameLengthAt()) {}
     static int Compare(const SoughtKey& key, const BTreeKey* nodeKey) {
         return key.Compare(nodeKey);
     }

@@ -65,11 +65,15 @@ struct CatalogShape {
     static constexpr u32 Fixed() { return kCatKeyFixed; }
     static constexpr u32 NameLengthAt() { return kCatKeyNameLength; }
 };
-struct AnyShape {
-    u32 Fixed() const { return fixed; }
-    u32 NameLengthAt() const { return nameLengthAt; }
-    u32 fixed;
-    u32 nameLengthAt;
+class AnyShape {
+public:
+    AnyShape(u32 fixed, u32 nameLengthAt) : fixed_(fixed), nameLengthAt_(nameLengthAt) {}
+    u32 Fixed() const { return fixed_; }
+    u32 NameLengthAt() const { return nameLengthAt_; }
+
+private:
+    u32 fixed_;
+    u32 nameLengthAt_;
 };
 
 // A record of which nothing is out of the ordinary. Its data is given by node offsets.
