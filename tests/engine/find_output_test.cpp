@@ -48,19 +48,22 @@ TEST_F(FindOutput, BuffersOfTheRightSizeAssertNothing) {
     EXPECT_EQ(bench_.capture.Take(), Events{});
 }
 
-// Without a hook the caller gets the key as it lies in the node, however short it is.
+// Without a hook the caller gets the key as it lies in the node, however short it is. No two bytes
+// of the name are alike, so that none can stand for another.
 TEST(FindOutputAsStored, KeysOfEveryLength) {
     Bench bench(Blocks(512));
     TreeShape shape;
     std::vector<TreeRecord> records;
+    std::u16string name;
     for (u32 units = 0; units < 40; ++units) {
-        records.push_back({DiskCatKey(16, std::u16string(units, u'a')), Pattern(4, units)});
+        records.push_back({DiskCatKey(16, name), Pattern(4, units)});
+        name.push_back(static_cast<char16_t>(0x2181 + 0x0101 * units));
     }
     bench.Open(BuildTree(shape, records));
     bench->convert.KeyToMemory = nullptr;
     HfsFindData path;
     for (u32 units = 0; units < 40; ++units) {
-        const HostKey key = HostCatKey(16, std::u16string(units, u'a'));
+        const HostKey key = HostCatKey(16, name.substr(0, units));
         const Bytes stored = records[units].key;
         alignas(8) u8 room[128] = {};
         u32 size = static_cast<u32>(stored.size());
@@ -70,9 +73,43 @@ TEST(FindOutputAsStored, KeysOfEveryLength) {
         EXPECT_EQ(size, stored.size());
         EXPECT_EQ(Bytes(room, room + stored.size()), stored);
         EXPECT_EQ(room[stored.size()], 0);
+
+        u8 data[4];
+        u32 dataSize = 0;
+        alignas(8) u8 walked[128] = {};
+        ASSERT_EQ(bench->IncPos(0, data, sizeof data, &dataSize, walked,
+                                static_cast<u32>(stored.size()), &size, &path),
+                  kOk);
+        EXPECT_EQ(Bytes(walked, walked + sizeof walked), Bytes(room, room + sizeof room));
     }
     path.ClearPath();
     EXPECT_EQ(bench.capture.Take(), Events{});
+}
+
+TEST(FindOutputAsStored, AWalkCutsKeysAtEveryByte) {
+    Bench bench(Blocks(512));
+    const Bytes stored = DiskCatKey(16, u"\u2181\u2282\u2383\u2484\u2585\u2686");
+    bench.Open(BuildTree(TreeShape{}, {{stored, Pattern(4, 1)}}));
+    bench->convert.KeyToMemory = nullptr;
+    HfsFindData path;
+    bool found = false;
+    const HostKey key = HostCatKey(16, u"");
+    ASSERT_EQ(bench->FindEntry(key, key.id, &path, &found, nullptr, nullptr, nullptr, nullptr),
+              kOk);
+    for (u32 capacity = 0; capacity < stored.size(); ++capacity) {
+        u8 data[4];
+        u32 dataSize = 0;
+        u32 size = 0;
+        alignas(8) u8 walked[32] = {};
+        ASSERT_EQ(bench->IncPos(0, data, sizeof data, &dataSize, walked, capacity, &size, &path),
+                  kOk);
+        Bytes wanted(stored.begin(), stored.begin() + capacity);
+        wanted.resize(sizeof walked);
+        EXPECT_EQ(size, capacity);
+        EXPECT_EQ(Bytes(walked, walked + sizeof walked), wanted);
+        EXPECT_EQ(bench.capture.Take().front(), Asserted(3316));
+    }
+    path.ClearPath();
 }
 
 TEST_F(FindOutput, ASmallKeyBufferGetsTheWholeKeyAllTheSame) {
