@@ -79,6 +79,19 @@ bool GetPlainRecordSize(const BTHeaderMem* hdr, const HfsNode* node, u32 index, 
     return end < hdr->nodeSize && start < end;
 }
 
+// Describes where a record and its slot lie in a node of one block, the slot `fromEnd` bytes before
+// the node's end.
+void LocateInOneBlock(u8* data, u32 nodeSize, u32 start, u32 fromEnd, NodeKey* out) {
+    out->offset = start;
+    out->firstBytes = nodeSize - start;
+    out->ptr = data + start;
+    out->next1 = nullptr;
+    out->next2 = nullptr;
+    out->entryPos = nodeSize - fromEnd;
+    out->entry = data + (nodeSize - fromEnd);
+    out->entryBytes = fromEnd;
+}
+
 // GetKey of a node in one block, as far as nothing about the record is out of the ordinary. False:
 // the long way round has to tell what it is.
 bool GetPlainKey(const BTHeaderMem* hdr, const HfsNode* node, u32 index, NodeKey* out) {
@@ -100,15 +113,8 @@ bool GetPlainKey(const BTHeaderMem* hdr, const HfsNode* node, u32 index, NodeKey
     if (end - start <= padded) {
         return false;
     }
-    out->offset = start;
-    out->firstBytes = nodeSize - start;
-    out->ptr = data + start;
-    out->next1 = nullptr;
-    out->next2 = nullptr;
+    LocateInOneBlock(data, nodeSize, start, static_cast<u32>(fromEnd) - kSlotSize, out);
     out->size = end - start;
-    out->entryPos = nodeSize - static_cast<u32>(fromEnd) + kSlotSize;
-    out->entry = slots + kSlotSize;
-    out->entryBytes = static_cast<u32>(fromEnd) - kSlotSize;
     out->keySize = keyLength + kKeyLengthSize;
     out->dataSize = end - start - padded;
     out->dataFirstBytes = nodeSize - start - padded;
@@ -131,15 +137,8 @@ bool GetPlainFree(const BTHeaderMem* hdr, const HfsNode* node, u32 index, NodeKe
     if (start > position) {
         return false;
     }
-    out->offset = start;
-    out->firstBytes = nodeSize - start;
-    out->ptr = data + start;
-    out->next1 = nullptr;
-    out->next2 = nullptr;
+    LocateInOneBlock(data, nodeSize, start, static_cast<u32>(fromEnd), out);
     out->size = position - start;
-    out->entryPos = position;
-    out->entry = data + position;
-    out->entryBytes = static_cast<u32>(fromEnd);
     return true;
 }
 
