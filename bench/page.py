@@ -11,23 +11,19 @@ import pathlib
 import re
 import statistics
 
+from stores import rate
+
 DOCS = pathlib.Path(__file__).resolve().parents[1] / "docs"
 FIGURES = DOCS / "benchmarks"
 PICTURES = DOCS / "pictures"
 GOALS = {"load in key order": 0.9, "load in random order": 1.1, "lookup, existing": 1.15,
          "lookup, absent": 1.15, "full scan": 1.4, "folder listing": 1.4, "update in place": 1.3,
-         "delete half": 1.4, "delete all": 1.4}
+         "delete half": 1.4, "delete the rest": 1.4, "delete all": 1.4}
 COLOURS = ("#1f4e79", "#b04a2f", "#4d7d3a", "#7a5195", "#8a6d1d")
 
 
 def read(name):
     return json.loads((FIGURES / name).read_text(encoding="utf-8"))
-
-
-def rate(results, operation):
-    rates = [result["operations"][operation]["count"] / result["operations"][operation]["seconds"]
-             for result in results]
-    return statistics.median(rates), (max(rates) - min(rates)) / statistics.median(rates)
 
 
 def stores_table(name):

@@ -18,7 +18,7 @@ import subprocess
 import sys
 
 WORK = pathlib.Path(__file__).resolve().parents[1] / "build" / "bench"
-STORES = "treehfs,lmdb,bdb,sqlite,leveldb,absl"
+STORES = "treehfs,lmdb,lmdb-append,bdb,sqlite,leveldb,absl"
 FILE_STORES = "treehfs-image,lmdb,bdb,sqlite"
 BASE = "lmdb"
 

@@ -15,6 +15,9 @@
 
 namespace {
 
+using bench::Batch;
+using bench::Digest;
+using bench::Record;
 using bench::Store;
 using bench::Workload;
 
@@ -36,74 +39,75 @@ public:
             std::iota(order_.begin(), order_.end(), 0u);
             std::sort(order_.begin(), order_.end(),
                       [this](std::uint32_t a, std::uint32_t b) { return store_->Less(a, b); });
-            InsertTail(true);
-        } else if (operation == "load-random") {
-            InsertTail(false);
-        } else {
-            // Calls go to records in another order than they came in.
-            const std::uint32_t present =
-                operation == "absent" ? load_.count - calls_ : load_.count;
-            Insert(0, present, false);
-            const std::vector<std::uint32_t> again = bench::Shuffled(load_.count, 11);
-            Measure(operation, operation == "absent" ? &order_[present] : again.data());
         }
-    }
-
-private:
-    void Insert(std::uint32_t from, std::uint32_t to, bool ascending) {
-        for (std::uint32_t k = from; k < to; ++k) {
-            bench::MakeData(order_[k], 0, load_.dataSize[order_[k]], data_);
-            if (!store_->Insert(order_[k], data_, load_.dataSize[order_[k]], ascending)) {
-                Stop("an insertion failed");
-            }
-        }
-    }
-
-    void InsertTail(bool ascending) {
-        Insert(0, load_.count - calls_, ascending);
+        const bool absent = operation.starts_with("load-") || operation == "absent";
+        const Numbers order(order_);
+        Insert(absent ? order.first(order.size() - calls_) : order);
+        // Calls go to records in another order than they came in.
+        const std::vector<std::uint32_t> again = bench::Shuffled(load_.count, 11);
+        const Numbers numbers = absent ? order.last(calls_) : Numbers(again).first(calls_);
+        batch_.Fill(load_, numbers, 0);
         CALLGRIND_START_INSTRUMENTATION;
-        Insert(load_.count - calls_, load_.count, ascending);
-        CALLGRIND_STOP_INSTRUMENTATION;
-    }
-
-    void Measure(const std::string& operation, const std::uint32_t* records) {
-        std::uint64_t sum = 0;
-        bool right = true;
-        CALLGRIND_START_INSTRUMENTATION;
-        if (operation == "scan") {
-            right = store_->Scan(&sum) == load_.count;
-        } else {
-            for (std::uint32_t k = 0; k < calls_ && right; ++k) {
-                right = Call(operation, records[k], &sum);
-            }
-        }
+        const bool right = Call(operation, numbers);
         CALLGRIND_STOP_INSTRUMENTATION;
         if (!right) {
             Stop("a wrong answer, or no such operation");
         }
     }
 
-    bool Call(const std::string& operation, std::uint32_t record, std::uint64_t* sum) {
-        switch (operation[0]) {
-            case 'l':
-                return operation == "lookup"
-                           ? store_->Lookup(record, data_) == load_.dataSize[record]
-                           : store_->List(16 + record % load_.folders, sum) > 0;
-            case 'a':
-                return store_->Lookup(record, data_) == -1;
-            case 'u':
-                return store_->Update(record, data_, load_.dataSize[record]);
-            case 'd':
-                return store_->Delete(record);
-            default:
-                return false;
+private:
+    using Numbers = std::span<const std::uint32_t>;
+
+    void Insert(Numbers numbers) {
+        Batch batch;
+        batch.Fill(load_, numbers, 0);
+        for (const Record& record : batch.Records()) {
+            if (!store_->Insert(record, false)) {
+                Stop("an insertion failed");
+            }
         }
+    }
+
+    template <typename One>
+    bool Each(One one) {
+        const auto records = batch_.Records();
+        return std::all_of(records.begin(), records.end(), one);
+    }
+
+    bool Call(const std::string& operation, Numbers numbers) {
+        if (operation.starts_with("load-")) {
+            return Each([this](const Record& record) { return store_->Insert(record, false); });
+        }
+        if (operation == "lookup") {
+            return Each([this](const Record& record) {
+                return store_->Lookup(record, data_) == static_cast<int>(record.size);
+            });
+        }
+        if (operation == "absent") {
+            return Each(
+                [this](const Record& record) { return store_->Lookup(record, data_) == -1; });
+        }
+        if (operation == "update") {
+            return Each([this](const Record& record) { return store_->Update(record); });
+        }
+        if (operation == "delete") {
+            return Each([this](const Record& record) { return store_->Delete(record); });
+        }
+        Digest sum(Digest::kBrief);
+        if (operation == "scan") {
+            return store_->Scan(&sum) == load_.count;
+        }
+        return operation == "list" &&
+               std::all_of(numbers.begin(), numbers.end(), [this, &sum](std::uint32_t number) {
+                   return store_->List(bench::kFirstParent + number % load_.folders, &sum) > 0;
+               });
     }
 
     const Workload load_;
     std::unique_ptr<Store> store_;
     std::vector<std::uint32_t> order_;
     std::uint32_t calls_;
+    Batch batch_;
     std::uint8_t data_[bench::kLargestData] = {};
 };
 

@@ -10,7 +10,9 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <ctime>
+#include <numeric>
 
 #include "sample.h"
 #include "store.h"
@@ -41,11 +43,11 @@ void Fill(const std::string& name, std::uint32_t records, std::uint64_t seed,
     if (store == nullptr) {
         Fail("no such store", name);
     }
-    std::uint8_t data[bench::kLargestData];
+    bench::Batch one;
     store->BeginPhase(true);
     for (const std::uint32_t i : bench::Shuffled(load.count, 7)) {
-        bench::MakeData(i, 0, load.dataSize[i], data);
-        if (!store->Insert(i, data, load.dataSize[i], false)) {
+        one.Fill(load, {&i, 1}, 0);
+        if (!store->Insert(one.Records()[0], false)) {
             Fail("inserting", name);
         }
     }
@@ -64,6 +66,10 @@ void Look(const std::string& name, const std::string& folder) {
     const std::uint32_t count = sample.load.count;
     std::vector<std::uint8_t> data(std::size_t{count} * bench::kLargestData);
     std::vector<int> sizes(count);
+    std::vector<std::uint32_t> numbers(count);
+    std::iota(numbers.begin(), numbers.end(), 0u);
+    bench::Batch keys;
+    keys.Fill(sample.load, numbers, bench::Batch::kKeysOnly);
     const double wall = Seconds(CLOCK_MONOTONIC);
     const double busy = Seconds(CLOCK_PROCESS_CPUTIME_ID);
     const auto store = bench::OpenStore(name, sample.load, folder);
@@ -73,18 +79,18 @@ void Look(const std::string& name, const std::string& folder) {
     store->BeginPhase(false);
     const double opened = Seconds(CLOCK_PROCESS_CPUTIME_ID);
     for (std::uint32_t k = 0; k < count; ++k) {
-        sizes[k] = store->Lookup(k, data.data() + std::size_t{k} * bench::kLargestData);
+        sizes[k] =
+            store->Lookup(keys.Records()[k], data.data() + std::size_t{k} * bench::kLargestData);
     }
     const double end = Seconds(CLOCK_PROCESS_CPUTIME_ID);
     const double wallEnd = Seconds(CLOCK_MONOTONIC);
     store->EndPhase();
     for (std::uint32_t k = 0; k < count; ++k) {
-        const int size = sample.load.dataSize[k];
+        const std::uint32_t size = sample.load.dataSize[k];
         std::uint8_t wanted[bench::kLargestData];
-        bench::MakeData(sample.origin[k], 0, sample.load.dataSize[k], wanted);
-        if (sizes[k] != size || bench::Digest(data.data() + std::size_t{k} * bench::kLargestData,
-                                              static_cast<std::size_t>(size)) !=
-                                    bench::Digest(wanted, static_cast<std::size_t>(size))) {
+        bench::MakeData(sample.origin[k], 0, size, wanted);
+        if (sizes[k] != static_cast<int>(size) ||
+            std::memcmp(data.data() + std::size_t{k} * bench::kLargestData, wanted, size) != 0) {
             Fail("wrong answer", name);
         }
     }

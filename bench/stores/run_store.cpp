@@ -8,8 +8,10 @@
 #include <sys/resource.h>
 
 #include <algorithm>
+#include <array>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <ctime>
 #include <numeric>
 
@@ -17,13 +19,16 @@
 
 namespace {
 
+using bench::Batch;
+using bench::Digest;
+using bench::Record;
 using bench::Store;
 using bench::Workload;
 
 struct Result {
     const char* operation;
     double seconds;
-    std::uint32_t count;
+    std::size_t count;
 };
 
 // Processor time of this process, all threads: nothing here waits for a device, and unlike the wall
@@ -42,10 +47,7 @@ double Seconds() {
 class Yardstick {
 public:
     Yardstick(const Workload& load, std::string name, std::string folder)
-        : load_(load), name_(std::move(name)), folder_(std::move(folder)), half_(load.count / 2) {
-        // Records at odd places of a shuffle stay absent until the last operations.
-        order_ = bench::Shuffled(load.count, 7);
-    }
+        : load_(load), name_(std::move(name)), folder_(std::move(folder)) {}
 
     void Run(bool onlyReads) {
         if (!onlyReads) {
@@ -55,7 +57,8 @@ public:
         LoadAtRandom();
         Read();
         if (!onlyReads) {
-            Change();
+            Update();
+            Delete();
         }
     }
 
@@ -66,20 +69,63 @@ public:
             "{\"store\":\"%s\",\"records\":%u,\"peakKiB\":%ld,\"bytes\":%llu,\"operations\":{",
             name_.c_str(), load_.count, usage.ru_maxrss, static_cast<unsigned long long>(bytes_));
         for (std::size_t i = 0; i < results_.size(); ++i) {
-            std::printf("%s\"%s\":{\"seconds\":%.6f,\"count\":%u}", i == 0 ? "" : ",",
+            std::printf("%s\"%s\":{\"seconds\":%.6f,\"count\":%zu}", i == 0 ? "" : ",",
                         results_[i].operation, results_[i].seconds, results_[i].count);
         }
         std::printf("}}\n");
     }
 
 private:
+    // Records gathered at once for the calls that take them: few enough for the processor's cache.
+    static constexpr std::size_t kBatch = 256;
+
+    using Numbers = std::span<const std::uint32_t>;
+
     template <typename Body>
-    void Time(const char* operation, bool writing, std::uint32_t count, Body body) {
+    static void Time(Result* result, Body body) {
         const double start = Seconds();
-        store_->BeginPhase(writing);
         body();
-        store_->EndPhase();
-        results_.push_back({operation, Seconds() - start, count});
+        result->seconds += Seconds() - start;
+    }
+
+    // One phase of the store. `body` adds to the result what of it is to count.
+    template <typename Body>
+    Result Phase(const char* operation, bool writing, std::size_t count, Body body) {
+        Result result = {operation, 0, count};
+        Time(&result, [this, writing] { store_->BeginPhase(writing); });
+        body(&result);
+        Time(&result, [this] { store_->EndPhase(); });
+        return result;
+    }
+
+    // A phase of one call for each of these records; one that returns false answered wrongly. Only
+    // the calls count: who asks has the key at hand, and the data in the version it is to have.
+    template <typename Call>
+    Result Each(const char* operation, bool writing, Numbers numbers, std::uint32_t version,
+                Call call) {
+        return Phase(operation, writing, numbers.size(), [&](Result* result) {
+            for (; !numbers.empty(); numbers = numbers.subspan(batch_.Records().size())) {
+                batch_.Fill(load_, numbers.first(std::min(kBatch, numbers.size())), version);
+                Time(result, [&] {
+                    for (const Record& record : batch_.Records()) {
+                        if (!call(record)) {
+                            Wrong(operation);
+                        }
+                    }
+                });
+            }
+        });
+    }
+
+    Result Insert(const char* operation, Numbers numbers, bool ascending) {
+        return Each(operation, true, numbers, 0, [this, ascending](const Record& record) {
+            return store_->Insert(record, ascending);
+        });
+    }
+
+    Result Remove(const char* operation, Numbers numbers) {
+        return Each(operation, true, numbers, Batch::kKeysOnly,
+                    [this](const Record& record) { return store_->Delete(record); });
     }
 
     void Open(const char* part) {
@@ -91,147 +137,128 @@ private:
         }
     }
 
-    void Insert(std::uint32_t i, bool ascending) {
-        bench::MakeData(i, 0, load_.dataSize[i], data_);
-        if (!store_->Insert(i, data_, load_.dataSize[i], ascending)) {
-            Wrong("insert");
-        }
-    }
-
     void LoadInOrder() {
         Open("ordered");
         std::vector<std::uint32_t> sorted(load_.count);
         std::iota(sorted.begin(), sorted.end(), 0u);
         std::sort(sorted.begin(), sorted.end(),
                   [this](std::uint32_t a, std::uint32_t b) { return store_->Less(a, b); });
-        Time("load in key order", true, load_.count, [&] {
-            for (const std::uint32_t i : sorted) {
-                Insert(i, true);
-            }
-        });
-        bytesOrdered_ = store_->Bytes();
+        results_.push_back(Insert("load in key order", sorted, true));
     }
 
     // Half of the records are loaded first, so that the absent keys lie among the present ones.
     void LoadAtRandom() {
         Open("random");
-        Time("half load", true, half_, [&] {
-            for (std::uint32_t k = 0; k < half_; ++k) {
-                Insert(order_[k], false);
-            }
-        });
-        const double firstHalf = results_.back().seconds;
-        results_.pop_back();
-        Time("lookup, absent", false, load_.count - half_, [&] {
-            for (std::uint32_t k = half_; k < load_.count; ++k) {
-                if (store_->Lookup(order_[k], data_) != -1) {
-                    Wrong("lookup, absent");
-                }
-            }
-        });
-        Time("load in random order", true, load_.count, [&] {
-            for (std::uint32_t k = half_; k < load_.count; ++k) {
-                Insert(order_[k], false);
-            }
-        });
-        results_.back().seconds += firstHalf;
+        const char* const operation = "load in random order";
+        const std::vector<std::uint32_t> order = bench::Shuffled(load_.count, 7);
+        const Numbers first = Numbers(order).first(order.size() / 2);
+        const Numbers others = Numbers(order).subspan(first.size());
+        const Result half = Insert(operation, first, false);
+        results_.push_back(
+            Each("lookup, absent", false, others, Batch::kKeysOnly,
+                 [this](const Record& record) { return store_->Lookup(record, data_) == -1; }));
+        results_.push_back(Sum(operation, half, Insert(operation, others, false)));
         bytes_ = store_->Bytes();
     }
 
-    void CheckData(std::uint32_t i, std::uint32_t version, int size) {
-        std::uint8_t wanted[bench::kLargestData];
-        bench::MakeData(i, version, load_.dataSize[i], wanted);
-        if (size != load_.dataSize[i] || bench::Digest(data_, static_cast<std::size_t>(size)) !=
-                                             bench::Digest(wanted, load_.dataSize[i])) {
-            Wrong("lookup");
+    // Every record has the data of that version, byte for byte.
+    void Check(Numbers numbers, std::uint32_t version) {
+        Each("lookup", false, numbers, version, [this](const Record& record) {
+            return store_->Lookup(record, data_) == static_cast<int>(record.size) &&
+                   std::memcmp(data_, record.data, record.size) == 0;
+        });
+    }
+
+    // Both walks; what they deliver is looked at from end to end, or only by its ends, which costs
+    // next to nothing beside a step.
+    std::array<Result, 2> Walk(Digest::Kind kind) {
+        Digest wanted(kind);
+        for (std::uint32_t i = 0; i < load_.count; ++i) {
+            bench::MakeData(i, 0, load_.dataSize[i], data_);
+            wanted.Add(data_, load_.dataSize[i]);
         }
+        Digest seen(kind);
+        const Result scan = Phase("full scan", false, load_.count, [&](Result* result) {
+            Time(result, [&] {
+                if (store_->Scan(&seen) != load_.count) {
+                    Wrong("full scan");
+                }
+            });
+        });
+        if (seen != wanted) {
+            Wrong("full scan");
+        }
+        seen = Digest(kind);
+        const std::vector<std::uint32_t> folders = bench::Shuffled(load_.folders, 13);
+        const Result list = Phase("folder listing", false, load_.folders, [&](Result* result) {
+            Time(result, [&] {
+                for (const std::uint32_t folder : folders) {
+                    if (store_->List(bench::kFirstParent + folder, &seen) !=
+                        load_.folderSize[folder]) {
+                        Wrong("folder listing");
+                    }
+                }
+            });
+        });
+        if (seen != wanted) {
+            Wrong("folder listing");
+        }
+        return {scan, list};
     }
 
     void Read() {
         const std::vector<std::uint32_t> order = bench::Shuffled(load_.count, 11);
-        std::uint64_t wanted = 0;
-        for (std::uint32_t i = 0; i < load_.count; ++i) {
-            bench::MakeData(i, 0, load_.dataSize[i], data_);
-            wanted += bench::Digest(data_, load_.dataSize[i]);
-        }
-        store_->BeginPhase(false);  // warm
-        for (std::uint32_t k = 0; k < load_.count; ++k) {
-            CheckData(order[k], 0, store_->Lookup(order[k], data_));
-        }
-        store_->EndPhase();
-        Time("lookup, existing", false, load_.count, [&] {
-            for (const std::uint32_t i : order) {
-                if (store_->Lookup(i, data_) != load_.dataSize[i]) {
-                    Wrong("lookup, existing");
-                }
-            }
-        });
-        std::uint64_t sum = 0;
-        Time("full scan", false, load_.count, [&] {
-            if (store_->Scan(&sum) != load_.count || sum != wanted) {
-                Wrong("full scan");
-            }
-        });
-        const std::vector<std::uint32_t> folders = bench::Shuffled(load_.folders, 13);
-        sum = 0;
-        Time("folder listing", false, load_.folders, [&] {
-            for (const std::uint32_t folder : folders) {
-                if (store_->List(16 + folder, &sum) != load_.folderSize[folder]) {
-                    Wrong("folder listing");
-                }
-            }
-        });
-        if (sum != wanted) {
-            Wrong("folder listing");
+        Check(order, 0);  // warms, too
+        results_.push_back(
+            Each("lookup, existing", false, order, Batch::kKeysOnly, [this](const Record& record) {
+                return store_->Lookup(record, data_) == static_cast<int>(record.size);
+            }));
+        Walk(Digest::kWhole);
+        for (const Result& result : Walk(Digest::kBrief)) {
+            results_.push_back(result);
         }
     }
 
-    void Change() {
+    void Update() {
         const std::vector<std::uint32_t> order = bench::Shuffled(load_.count, 17);
-        Time("update in place", true, load_.count, [&] {
-            for (const std::uint32_t i : order) {
-                bench::MakeData(i, 1, load_.dataSize[i], data_);
-                if (!store_->Update(i, data_, load_.dataSize[i])) {
-                    Wrong("update in place");
-                }
-            }
-        });
+        results_.push_back(Each("update in place", true, order, 1,
+                                [this](const Record& record) { return store_->Update(record); }));
+        Check(order, 1);
+    }
+
+    // Whether a walk meets as many records as that.
+    void CheckCount(const char* operation, std::size_t count) {
+        Digest sum(Digest::kBrief);
         store_->BeginPhase(false);
-        for (const std::uint32_t i : order) {
-            CheckData(i, 1, store_->Lookup(i, data_));
+        if (store_->Scan(&sum) != count) {
+            Wrong(operation);
         }
         store_->EndPhase();
-        const auto removeRange = [&](std::uint32_t from, std::uint32_t to) {
-            for (std::uint32_t k = from; k < to; ++k) {
-                if (!store_->Delete(order[k])) {
-                    Wrong("delete");
-                }
-            }
-        };
-        Time("delete half", true, half_, [&] { removeRange(0, half_); });
-        std::uint64_t sum = 0;
-        store_->BeginPhase(false);
-        if (store_->Scan(&sum) != load_.count - half_ || store_->Lookup(order[0], data_) != -1) {
-            Wrong("delete half");
-        }
-        store_->EndPhase();
-        Time("delete all", true, load_.count - half_, [&] { removeRange(half_, load_.count); });
-        store_->BeginPhase(false);
-        if (store_->Scan(&sum) != 0) {
-            Wrong("delete all");
-        }
-        store_->EndPhase();
+    }
+
+    void Delete() {
+        const std::vector<std::uint32_t> order = bench::Shuffled(load_.count, 17);
+        const Numbers first = Numbers(order).first(order.size() / 2);
+        const Numbers others = Numbers(order).subspan(first.size());
+        const Result half = Remove("delete half", first);
+        CheckCount("delete half", others.size());
+        Check(others, 1);
+        const Result rest = Remove("delete the rest", others);
+        CheckCount("delete the rest", 0);
+        results_.insert(results_.end(), {half, rest, Sum("delete all", half, rest)});
+    }
+
+    static Result Sum(const char* operation, const Result& a, const Result& b) {
+        return {operation, a.seconds + b.seconds, a.count + b.count};
     }
 
     const Workload& load_;
     std::string name_;
     std::string folder_;
-    std::uint32_t half_;
     std::unique_ptr<Store> store_;
-    std::vector<std::uint32_t> order_;
+    Batch batch_;
     std::vector<Result> results_;
     std::uint64_t bytes_ = 0;
-    std::uint64_t bytesOrdered_ = 0;
     std::uint8_t data_[bench::kLargestData] = {};
 };
 

@@ -40,10 +40,10 @@ Sample TakeSample(const Workload& load, std::uint32_t count) {
     Workload* few = &sample.load;
     few->count = static_cast<std::uint32_t>(sample.origin.size());
     for (const std::uint32_t i : sample.origin) {
-        const std::size_t hostEnd = i + 1 < load.count ? load.hostAt[i + 1] : load.hostKeys.size();
+        const auto host = load.Host(i);
         const auto plain = load.Plain(i);
         few->hostAt.push_back(static_cast<std::uint32_t>(few->hostKeys.size()));
-        few->hostKeys.insert(few->hostKeys.end(), load.Host(i), load.hostKeys.data() + hostEnd);
+        few->hostKeys.insert(few->hostKeys.end(), host.begin(), host.end());
         few->plainAt.push_back(static_cast<std::uint32_t>(few->plainKeys.size()));
         few->plainKeys.insert(few->plainKeys.end(), plain.begin(), plain.end());
         few->parent.push_back(load.parent[i]);

@@ -26,8 +26,8 @@ std::unique_ptr<Store> OpenStore(const std::string& name, const Workload& load,
     if (name == "treehfs-image") {
         return MakeImage(load, folder);
     }
-    if (name == "lmdb") {
-        return MakeLmdb(load, folder);
+    if (name == "lmdb" || name == "lmdb-append") {
+        return MakeLmdb(load, folder, name == "lmdb-append");
     }
     if (name == "bdb") {
         return MakeBdb(load, folder);

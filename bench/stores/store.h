@@ -20,25 +20,24 @@ public:
     virtual void Keep() {}
 
     // `ascending`: records come in the store's own order.
-    virtual bool Insert(std::uint32_t i, const std::uint8_t* data, std::uint32_t size,
-                        bool ascending) = 0;
+    virtual bool Insert(const Record& record, bool ascending) = 0;
     // Size of the data delivered, -1: absent.
-    virtual int Lookup(std::uint32_t i, std::uint8_t* out) = 0;
-    virtual bool Update(std::uint32_t i, const std::uint8_t* data, std::uint32_t size) = 0;
-    virtual bool Delete(std::uint32_t i) = 0;
-    // Delivers every record, or those of one parent, in order; adds their digests to `*sum` and
-    // returns how many there were.
-    virtual std::uint32_t Scan(std::uint64_t* sum) = 0;
-    virtual std::uint32_t List(std::uint32_t parent, std::uint64_t* sum) = 0;
+    virtual int Lookup(const Record& record, std::uint8_t* out) = 0;
+    virtual bool Update(const Record& record) = 0;
+    virtual bool Delete(const Record& record) = 0;
+    // Delivers every record, or those of one parent, in order; adds them to `*sum` and returns how
+    // many there were.
+    virtual std::uint32_t Scan(Digest* sum) = 0;
+    virtual std::uint32_t List(std::uint32_t parent, Digest* sum) = 0;
     // Bytes the records take in the store's file or memory.
     virtual std::uint64_t Bytes() = 0;
-    // Records in the store's own order.
+    // Numbers of records in the store's own order.
     virtual bool Less(std::uint32_t a, std::uint32_t b) const = 0;
 };
 
 // Known names: treehfs, treehfs-2blocks, treehfs-8blocks (map blocks per node), treehfs-image,
-// lmdb, bdb, sqlite, leveldb, absl. Null: none of them. `folder` is emptied for the store to keep
-// files in.
+// lmdb, lmdb-append (told when records ascend), bdb, sqlite, leveldb, absl. Null: none of them.
+// `folder` is emptied for the store to keep files in.
 std::unique_ptr<Store> MakeStore(const std::string& name, const Workload& load,
                                  const std::string& folder);
 // The same on what the folder holds, of those that keep files.
@@ -47,7 +46,7 @@ std::unique_ptr<Store> OpenStore(const std::string& name, const Workload& load,
 
 std::unique_ptr<Store> MakeTreehfs(const Workload& load, std::uint32_t blocksPerNode);
 std::unique_ptr<Store> MakeImage(const Workload& load, const std::string& folder);
-std::unique_ptr<Store> MakeLmdb(const Workload& load, const std::string& folder);
+std::unique_ptr<Store> MakeLmdb(const Workload& load, const std::string& folder, bool appends);
 std::unique_ptr<Store> MakeBdb(const Workload& load, const std::string& folder);
 std::unique_ptr<Store> MakeSqlite(const Workload& load, const std::string& folder);
 std::unique_ptr<Store> MakeLevelDb(const Workload& load, const std::string& folder);

@@ -11,34 +11,32 @@ class AbslStore : public PlainStore {
 public:
     using PlainStore::PlainStore;
 
-    bool Insert(std::uint32_t i, const std::uint8_t* data, std::uint32_t size,
-                bool ascending) override {
-        bytes_ += load_.Plain(i).size() + size;
-        const std::string_view value(reinterpret_cast<const char*>(data), size);
+    bool Insert(const Record& record, bool ascending) override {
+        bytes_ += record.plain.size() + record.size;
         if (ascending) {
-            map_.emplace_hint(map_.end(), Key(i), value);
+            map_.emplace_hint(map_.end(), Key(record), Data(record));
             return true;
         }
-        return map_.emplace(Key(i), value).second;
+        return map_.emplace(Key(record), Data(record)).second;
     }
-    int Lookup(std::uint32_t i, std::uint8_t* out) override {
-        const auto at = map_.find(Key(i));
+    int Lookup(const Record& record, std::uint8_t* out) override {
+        const auto at = map_.find(Key(record));
         if (at == map_.end()) {
             return -1;
         }
         std::memcpy(out, at->second.data(), at->second.size());
         return static_cast<int>(at->second.size());
     }
-    bool Update(std::uint32_t i, const std::uint8_t* data, std::uint32_t size) override {
-        const auto at = map_.find(Key(i));
+    bool Update(const Record& record) override {
+        const auto at = map_.find(Key(record));
         if (at == map_.end()) {
             return false;
         }
-        at->second.assign(reinterpret_cast<const char*>(data), size);
+        at->second.assign(Data(record));
         return true;
     }
-    bool Delete(std::uint32_t i) override {
-        const auto at = map_.find(Key(i));
+    bool Delete(const Record& record) override {
+        const auto at = map_.find(Key(record));
         if (at == map_.end()) {
             return false;
         }
@@ -48,11 +46,13 @@ public:
     std::uint64_t Bytes() override { return bytes_; }
 
 private:
-    std::string_view Key(std::uint32_t i) const {
-        const auto key = load_.Plain(i);
-        return {reinterpret_cast<const char*>(key.data()), key.size()};
+    static std::string_view Key(const Record& record) {
+        return {reinterpret_cast<const char*>(record.plain.data()), record.plain.size()};
     }
-    std::uint32_t Walk(std::uint32_t parent, std::uint64_t* sum, bool oneFolder) override {
+    static std::string_view Data(const Record& record) {
+        return {reinterpret_cast<const char*>(record.data), record.size};
+    }
+    std::uint32_t Walk(std::uint32_t parent, Digest* sum, bool oneFolder) override {
         const Prefix prefix(parent);
         const std::string_view start(reinterpret_cast<const char*>(prefix.bytes),
                                      sizeof prefix.bytes);
@@ -66,7 +66,7 @@ private:
             std::memcpy(keyCopy, at->first.data(), at->first.size());
             UseKey(keyCopy);
             std::memcpy(data, at->second.data(), at->second.size());
-            *sum += Digest(data, at->second.size());
+            sum->Add(data, at->second.size());
             count += 1;
         }
         return count;

@@ -35,23 +35,23 @@ public:
     }
     ~BdbStore() override { db_->close(db_, DB_NOSYNC); }
 
-    bool Insert(std::uint32_t i, const std::uint8_t* data, std::uint32_t size, bool) override {
-        DBT key = Key(i);
-        DBT value = Value(data, size);
+    bool Insert(const Record& record, bool) override {
+        DBT key = Key(record);
+        DBT value = Value(record.data, record.size);
         return db_->put(db_, nullptr, &key, &value, DB_NOOVERWRITE) == 0;
     }
-    int Lookup(std::uint32_t i, std::uint8_t* out) override {
-        DBT key = Key(i);
+    int Lookup(const Record& record, std::uint8_t* out) override {
+        DBT key = Key(record);
         DBT value = Room(out, kLargestData);
         return db_->get(db_, nullptr, &key, &value, 0) == 0 ? static_cast<int>(value.size) : -1;
     }
-    bool Update(std::uint32_t i, const std::uint8_t* data, std::uint32_t size) override {
-        DBT key = Key(i);
-        DBT value = Value(data, size);
+    bool Update(const Record& record) override {
+        DBT key = Key(record);
+        DBT value = Value(record.data, record.size);
         return db_->put(db_, nullptr, &key, &value, 0) == 0;
     }
-    bool Delete(std::uint32_t i) override {
-        DBT key = Key(i);
+    bool Delete(const Record& record) override {
+        DBT key = Key(record);
         return db_->del(db_, nullptr, &key, 0) == 0;
     }
     void Keep() override { Must(db_->sync(db_, 0)); }
@@ -77,11 +77,8 @@ private:
         value.flags = DB_DBT_USERMEM;
         return value;
     }
-    DBT Key(std::uint32_t i) const {
-        const auto key = load_.Plain(i);
-        return Value(key.data(), key.size());
-    }
-    std::uint32_t Walk(std::uint32_t parent, std::uint64_t* sum, bool oneFolder) override {
+    static DBT Key(const Record& record) { return Value(record.plain.data(), record.plain.size()); }
+    std::uint32_t Walk(std::uint32_t parent, Digest* sum, bool oneFolder) override {
         const Prefix prefix(parent);
         std::uint8_t keyBytes[kLargestKey] = {};
         std::uint8_t data[kLargestData];
@@ -95,7 +92,7 @@ private:
         int status = cursor->get(cursor, &key, &value, DB_SET_RANGE);
         while (status == 0 && !(oneFolder && !prefix.Starts(key.data))) {
             UseKey(keyBytes);
-            *sum += Digest(data, value.size);
+            sum->Add(data, value.size);
             count += 1;
             status = cursor->get(cursor, &key, &value, DB_NEXT);
         }

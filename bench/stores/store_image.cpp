@@ -23,7 +23,7 @@ constexpr u32 kBatch = 100000;  // records of a commit while the image is filled
 
 class ImageStore : public Store {
 public:
-    ImageStore(const Workload& load, const std::string& folder) : load_(load) {
+    ImageStore(const Workload& load, const std::string& folder) {
         const std::string path = folder + "/volume.img";
         Problem problem;
         volume_ = ImageVolume::OpenFile(path, OpenOptions{}, nullptr, &problem);
@@ -46,18 +46,18 @@ public:
         volume_->Close();
     }
 
-    bool Insert(std::uint32_t i, const std::uint8_t* data, std::uint32_t size, bool) override {
-        if (tree_->InsertRecord(load_.Host(i), load_.parent[i], data, size) != kOk) {
+    bool Insert(const Record& record, bool) override {
+        if (tree_->InsertRecord(record.host, record.Parent(), record.data, record.size) != kOk) {
             return false;
         }
         volume_->TrimCache();
         inserted_ += 1;
         return inserted_ % kBatch != 0 || volume_->Commit(0) == kOk;
     }
-    int Lookup(std::uint32_t i, std::uint8_t* out) override {
+    int Lookup(const Record& record, std::uint8_t* out) override {
         unsigned size = 0;
-        return tree_->FindRecord(load_.Host(i), load_.parent[i], out, kLargestData, &size,
-                                 &path_) == kOk
+        return tree_->FindRecord(record.host, record.Parent(), out, kLargestData, &size, &path_) ==
+                       kOk
                    ? static_cast<int>(size)
                    : -1;
     }
@@ -69,14 +69,13 @@ public:
     std::uint64_t Bytes() override { return volume_->ForkBytes(kCatalogFileId); }
 
     // What a store in memory is measured by: not asked of an image.
-    bool Update(std::uint32_t, const std::uint8_t*, std::uint32_t) override { return false; }
-    bool Delete(std::uint32_t) override { return false; }
-    std::uint32_t Scan(std::uint64_t*) override { return 0; }
-    std::uint32_t List(std::uint32_t, std::uint64_t*) override { return 0; }
+    bool Update(const Record&) override { return false; }
+    bool Delete(const Record&) override { return false; }
+    std::uint32_t Scan(Digest*) override { return 0; }
+    std::uint32_t List(std::uint32_t, Digest*) override { return 0; }
     bool Less(std::uint32_t, std::uint32_t) const override { return false; }
 
 private:
-    const Workload& load_;
     std::unique_ptr<ImageVolume> volume_;
     CBTreeHfs* tree_ = nullptr;
     HfsFindData path_;

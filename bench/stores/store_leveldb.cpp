@@ -30,20 +30,20 @@ public:
         db_.reset(db);
     }
 
-    bool Insert(std::uint32_t i, const std::uint8_t* data, std::uint32_t size, bool) override {
-        return db_->Put({}, Key(i), Bytes(data, size)).ok();
+    bool Insert(const Record& record, bool) override {
+        return db_->Put({}, Key(record), Bytes(record.data, record.size)).ok();
     }
-    int Lookup(std::uint32_t i, std::uint8_t* out) override {
-        if (!db_->Get({}, Key(i), &value_).ok()) {
+    int Lookup(const Record& record, std::uint8_t* out) override {
+        if (!db_->Get({}, Key(record), &value_).ok()) {
             return -1;
         }
         std::memcpy(out, value_.data(), value_.size());
         return static_cast<int>(value_.size());
     }
-    bool Update(std::uint32_t i, const std::uint8_t* data, std::uint32_t size) override {
-        return db_->Put({}, Key(i), Bytes(data, size)).ok();
+    bool Update(const Record& record) override {
+        return db_->Put({}, Key(record), Bytes(record.data, record.size)).ok();
     }
-    bool Delete(std::uint32_t i) override { return db_->Delete({}, Key(i)).ok(); }
+    bool Delete(const Record& record) override { return db_->Delete({}, Key(record)).ok(); }
     std::uint64_t Bytes() override {
         const leveldb::Range all("", "\xff\xff\xff\xff\xff");
         std::uint64_t size = 0;
@@ -55,11 +55,10 @@ private:
     static leveldb::Slice Bytes(const std::uint8_t* data, std::size_t size) {
         return {reinterpret_cast<const char*>(data), size};
     }
-    leveldb::Slice Key(std::uint32_t i) const {
-        const auto key = load_.Plain(i);
-        return Bytes(key.data(), key.size());
+    static leveldb::Slice Key(const Record& record) {
+        return Bytes(record.plain.data(), record.plain.size());
     }
-    std::uint32_t Walk(std::uint32_t parent, std::uint64_t* sum, bool oneFolder) override {
+    std::uint32_t Walk(std::uint32_t parent, Digest* sum, bool oneFolder) override {
         const Prefix prefix(parent);
         const std::unique_ptr<leveldb::Iterator> at(db_->NewIterator({}));
         std::uint8_t data[kLargestData];
@@ -72,7 +71,7 @@ private:
             std::memcpy(keyCopy, at->key().data(), at->key().size());
             UseKey(keyCopy);
             std::memcpy(data, at->value().data(), at->value().size());
-            *sum += Digest(data, at->value().size());
+            sum->Add(data, at->value().size());
             count += 1;
         }
         return count;

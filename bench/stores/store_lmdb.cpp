@@ -25,7 +25,8 @@ void Must(int status) {
 
 class LmdbStore : public PlainStore {
 public:
-    LmdbStore(const Workload& load, const std::string& folder) : PlainStore(load) {
+    LmdbStore(const Workload& load, const std::string& folder, bool appends)
+        : PlainStore(load), appends_(appends) {
         Must(mdb_env_create(&env_));
         Must(mdb_env_set_mapsize(env_, kMapSize));
         Must(mdb_env_open(env_, folder.c_str(), MDB_WRITEMAP | MDB_NOSYNC, 0644));
@@ -46,14 +47,11 @@ public:
         mdb_cursor_close(cursor_);
         Must(mdb_txn_commit(txn_));
     }
-    bool Insert(std::uint32_t i, const std::uint8_t* data, std::uint32_t size,
-                bool ascending) override {
-        MDB_val key = Key(i);
-        MDB_val value = {size, const_cast<std::uint8_t*>(data)};
-        return mdb_cursor_put(cursor_, &key, &value, ascending ? MDB_APPEND : MDB_NOOVERWRITE) == 0;
+    bool Insert(const Record& record, bool ascending) override {
+        return Put(record, appends_ && ascending ? MDB_APPEND : MDB_NOOVERWRITE);
     }
-    int Lookup(std::uint32_t i, std::uint8_t* out) override {
-        MDB_val key = Key(i);
+    int Lookup(const Record& record, std::uint8_t* out) override {
+        MDB_val key = Key(record);
         MDB_val value;
         if (mdb_get(txn_, dbi_, &key, &value) != 0) {
             return -1;
@@ -61,13 +59,9 @@ public:
         std::memcpy(out, value.mv_data, value.mv_size);
         return static_cast<int>(value.mv_size);
     }
-    bool Update(std::uint32_t i, const std::uint8_t* data, std::uint32_t size) override {
-        MDB_val key = Key(i);
-        MDB_val value = {size, const_cast<std::uint8_t*>(data)};
-        return mdb_cursor_put(cursor_, &key, &value, 0) == 0;
-    }
-    bool Delete(std::uint32_t i) override {
-        MDB_val key = Key(i);
+    bool Update(const Record& record) override { return Put(record, 0); }
+    bool Delete(const Record& record) override {
+        MDB_val key = Key(record);
         return mdb_del(txn_, dbi_, &key, nullptr) == 0;
     }
     std::uint64_t Bytes() override {
@@ -91,11 +85,15 @@ private:
             }
         }
     }
-    MDB_val Key(std::uint32_t i) const {
-        const auto key = load_.Plain(i);
-        return {key.size(), const_cast<std::uint8_t*>(key.data())};
+    static MDB_val Key(const Record& record) {
+        return {record.plain.size(), const_cast<std::uint8_t*>(record.plain.data())};
     }
-    std::uint32_t Walk(std::uint32_t parent, std::uint64_t* sum, bool oneFolder) override {
+    bool Put(const Record& record, unsigned flags) {
+        MDB_val key = Key(record);
+        MDB_val value = {record.size, const_cast<std::uint8_t*>(record.data)};
+        return mdb_cursor_put(cursor_, &key, &value, flags) == 0;
+    }
+    std::uint32_t Walk(std::uint32_t parent, Digest* sum, bool oneFolder) override {
         const Prefix prefix(parent);
         MDB_val key = {sizeof prefix.bytes, const_cast<std::uint8_t*>(prefix.bytes)};
         MDB_val value;
@@ -107,13 +105,14 @@ private:
             std::memcpy(keyCopy, key.mv_data, key.mv_size);
             UseKey(keyCopy);
             std::memcpy(data, value.mv_data, value.mv_size);
-            *sum += Digest(data, value.mv_size);
+            sum->Add(data, value.mv_size);
             count += 1;
             status = mdb_cursor_get(cursor_, &key, &value, MDB_NEXT);
         }
         return count;
     }
 
+    const bool appends_;
     MDB_env* env_ = nullptr;
     MDB_txn* txn_ = nullptr;
     MDB_dbi dbi_ = 0;
@@ -122,8 +121,8 @@ private:
 
 }  // namespace
 
-std::unique_ptr<Store> MakeLmdb(const Workload& load, const std::string& folder) {
-    return std::make_unique<LmdbStore>(load, folder);
+std::unique_ptr<Store> MakeLmdb(const Workload& load, const std::string& folder, bool appends) {
+    return std::make_unique<LmdbStore>(load, folder, appends);
 }
 
 }  // namespace bench

@@ -17,14 +17,14 @@ public:
         const auto right = load_.Plain(b);
         return std::lexicographical_compare(left.begin(), left.end(), right.begin(), right.end());
     }
-    std::uint32_t Scan(std::uint64_t* sum) override { return Walk(0, sum, false); }
-    std::uint32_t List(std::uint32_t parent, std::uint64_t* sum) override {
+    std::uint32_t Scan(Digest* sum) override { return Walk(0, sum, false); }
+    std::uint32_t List(std::uint32_t parent, Digest* sum) override {
         return Walk(parent, sum, true);
     }
 
 protected:
     // Delivers records from the first of `parent` on, to the end or to the last one of it.
-    virtual std::uint32_t Walk(std::uint32_t parent, std::uint64_t* sum, bool oneFolder) = 0;
+    virtual std::uint32_t Walk(std::uint32_t parent, Digest* sum, bool oneFolder) = 0;
 
     const Workload& load_;
 };

@@ -35,11 +35,9 @@ public:
 
     void BeginPhase(bool) override { Run("BEGIN"); }
     void EndPhase() override { Run("COMMIT"); }
-    bool Insert(std::uint32_t i, const std::uint8_t* data, std::uint32_t size, bool) override {
-        return Change(insert_, i, data, size);
-    }
-    int Lookup(std::uint32_t i, std::uint8_t* out) override {
-        BindKey(lookup_, i);
+    bool Insert(const Record& record, bool) override { return Change(insert_, record); }
+    int Lookup(const Record& record, std::uint8_t* out) override {
+        BindKey(lookup_, record);
         int size = -1;
         if (sqlite3_step(lookup_) == SQLITE_ROW) {
             size = sqlite3_column_bytes(lookup_, 0);
@@ -48,11 +46,11 @@ public:
         sqlite3_reset(lookup_);
         return size;
     }
-    bool Update(std::uint32_t i, const std::uint8_t* data, std::uint32_t size) override {
-        return Change(update_, i, data, size) && sqlite3_changes(db_) == 1;
+    bool Update(const Record& record) override {
+        return Change(update_, record) && sqlite3_changes(db_) == 1;
     }
-    bool Delete(std::uint32_t i) override {
-        BindKey(remove_, i);
+    bool Delete(const Record& record) override {
+        BindKey(remove_, record);
         const bool done = sqlite3_step(remove_) == SQLITE_DONE && sqlite3_changes(db_) == 1;
         sqlite3_reset(remove_);
         return done;
@@ -78,20 +76,19 @@ private:
         Must(sqlite3_prepare_v3(db_, text, -1, SQLITE_PREPARE_PERSISTENT, &statement, nullptr));
         return statement;
     }
-    void BindKey(sqlite3_stmt* statement, std::uint32_t i) {
-        const auto key = load_.Plain(i);
-        Must(sqlite3_bind_blob(statement, 1, key.data(), static_cast<int>(key.size()),
-                               SQLITE_STATIC));
+    void BindKey(sqlite3_stmt* statement, const Record& record) {
+        Must(sqlite3_bind_blob(statement, 1, record.plain.data(),
+                               static_cast<int>(record.plain.size()), SQLITE_STATIC));
     }
-    bool Change(sqlite3_stmt* statement, std::uint32_t i, const std::uint8_t* data,
-                std::uint32_t size) {
-        BindKey(statement, i);
-        Must(sqlite3_bind_blob(statement, 2, data, static_cast<int>(size), SQLITE_STATIC));
+    bool Change(sqlite3_stmt* statement, const Record& record) {
+        BindKey(statement, record);
+        Must(sqlite3_bind_blob(statement, 2, record.data, static_cast<int>(record.size),
+                               SQLITE_STATIC));
         const bool done = sqlite3_step(statement) == SQLITE_DONE;
         sqlite3_reset(statement);
         return done;
     }
-    std::uint32_t Walk(std::uint32_t parent, std::uint64_t* sum, bool oneFolder) override {
+    std::uint32_t Walk(std::uint32_t parent, Digest* sum, bool oneFolder) override {
         const Prefix prefix(parent);
         Must(sqlite3_bind_blob(walk_, 1, prefix.bytes, sizeof prefix.bytes, SQLITE_STATIC));
         std::uint8_t data[kLargestData];
@@ -106,7 +103,7 @@ private:
             UseKey(keyCopy);
             const std::size_t size = static_cast<std::size_t>(sqlite3_column_bytes(walk_, 1));
             std::memcpy(data, sqlite3_column_blob(walk_, 1), size);
-            *sum += Digest(data, size);
+            sum->Add(data, size);
             count += 1;
         }
         sqlite3_reset(walk_);

@@ -108,55 +108,49 @@ public:
             std::abort();
         }
     }
-    bool Insert(u32 i, const u8* data, u32 size, bool) override {
-        return tree_.InsertRecord(load_.Host(i), Parent(i), data, size) == kOk;
+    bool Insert(const Record& record, bool) override {
+        return tree_.InsertRecord(record.host, record.Parent(), record.data, record.size) == kOk;
     }
-    int Lookup(u32 i, u8* out) override {
+    int Lookup(const Record& record, u8* out) override {
         unsigned size = 0;
-        return tree_.FindRecord(load_.Host(i), Parent(i), out, kLargestData, &size, &path_) == kOk
+        return tree_.FindRecord(record.host, record.Parent(), out, kLargestData, &size, &path_) ==
+                       kOk
                    ? static_cast<int>(size)
                    : -1;
     }
-    bool Update(u32 i, const u8* data, u32) override {
+    bool Update(const Record& record) override {
         bool found = false;
-        return tree_.FindEntry(Key(i), Parent(i), nullptr, &found, nullptr, nullptr, nullptr,
-                               nullptr) == kOk &&
-               found && tree_.UpdateKeyAndRecord(nullptr, data) == kOk;
+        return tree_.FindEntry(Key(record.host), record.Parent(), nullptr, &found, nullptr, nullptr,
+                               nullptr, nullptr) == kOk &&
+               found && tree_.UpdateKeyAndRecord(nullptr, record.data) == kOk;
     }
-    bool Delete(u32 i) override {
-        return tree_.DeleteRecord(load_.Host(i), Parent(i), false) == kOk;
+    bool Delete(const Record& record) override {
+        return tree_.DeleteRecord(record.host, record.Parent(), false) == kOk;
     }
-    u32 Scan(u64* sum) override { return Walk(0, sum, false); }
-    u32 List(u32 parent, u64* sum) override { return Walk(parent, sum, true); }
+    u32 Scan(Digest* sum) override { return Walk(0, sum, false); }
+    u32 List(u32 parent, Digest* sum) override { return Walk(parent, sum, true); }
     u64 Bytes() override { return volume_.fs.catalogFork.logicalSize; }
     bool Less(u32 a, u32 b) const override {
         if (load_.parent[a] != load_.parent[b]) {
             return load_.parent[a] < load_.parent[b];
         }
         alignas(8) u8 other[kLargestKey];
-        tree_.convert.KeyToDisk(other, load_.Host(b));
-        return CompareCatKeysCaseIns(Key(a), load_.parent[a],
-                                     reinterpret_cast<const BTreeKey*>(other)) < 0;
+        tree_.convert.KeyToDisk(other, load_.Host(b).data());
+        return CompareCatKeysCaseIns(Key(load_.Host(a).data()), load_.parent[a], Key(other)) < 0;
     }
 
 private:
-    // As the key has it: who asks has its key at hand.
-    u32 Parent(u32 i) const {
-        u32 parent;
-        std::memcpy(&parent, load_.Host(i) + kCatKeyParentId, sizeof parent);
-        return parent;
-    }
-    const BTreeKey* Key(u32 i) const { return reinterpret_cast<const BTreeKey*>(load_.Host(i)); }
+    static const BTreeKey* Key(const void* bytes) { return static_cast<const BTreeKey*>(bytes); }
 
     // From the first key of `parent` on; keys are delivered because a listing needs them.
-    u32 Walk(u32 parent, u64* sum, bool oneFolder) {
+    u32 Walk(u32 parent, Digest* sum, bool oneFolder) {
         alignas(8) u8 key[kKeyLengthSize + kMaxKeyLength + 6];
         std::memset(key, 0, kKeyLengthSize + kCatKeyFixed);  // no name
         key[0] = kCatKeyFixed;
         u8 data[kLargestData];
         bool found = false;
-        if (tree_.FindEntry(reinterpret_cast<BTreeKey*>(key), parent, &path_, &found, nullptr,
-                            nullptr, nullptr, nullptr) != kOk) {
+        if (tree_.FindEntry(Key(key), parent, &path_, &found, nullptr, nullptr, nullptr, nullptr) !=
+            kOk) {
             return 0;
         }
         u32 count = 0;
@@ -172,7 +166,7 @@ private:
             if (oneFolder && __builtin_bswap32(owner) != parent) {
                 break;
             }
-            *sum += Digest(data, size);
+            sum->Add(data, size);
             count += 1;
         }
         return count;

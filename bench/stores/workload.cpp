@@ -11,8 +11,6 @@ namespace bench {
 
 namespace {
 
-constexpr std::uint32_t kFirstParent = 16;
-
 // Sizes of the folders: falling as rank^-0.7, adding up to `count`.
 std::vector<std::uint32_t> FolderSizes(std::uint32_t count, std::uint32_t folders) {
     double sum = 0;
@@ -92,7 +90,7 @@ std::uint16_t PickSize(std::mt19937_64& random) {
     if (ticket < 70) {
         return 248;
     }
-    return ticket < 90 ? 88 : static_cast<std::uint16_t>(10 + random() % 256 * 2);
+    return ticket < 90 ? 88 : static_cast<std::uint16_t>(kLeastData + random() % 256 * 2);
 }
 
 }  // namespace
@@ -115,6 +113,35 @@ Workload MakeWorkload(std::uint32_t count, std::uint64_t seed) {
     return load;
 }
 
+void Batch::Fill(const Workload& load, std::span<const std::uint32_t> numbers,
+                 std::uint32_t version) {
+    constexpr std::size_t kWord = sizeof room_[0];
+    records_.clear();
+    room_.resize(numbers.size() * ((2 * kLargestKey + kLargestData) / kWord));
+    std::uint8_t* room = reinterpret_cast<std::uint8_t*>(room_.data());
+    const auto take = [&room](std::size_t bytes) {
+        std::uint8_t* place = room;
+        room += (bytes + kWord - 1) / kWord * kWord;
+        return place;
+    };
+    const auto copy = [&take](std::span<const std::uint8_t> bytes) {
+        std::uint8_t* place = take(bytes.size());
+        std::memcpy(place, bytes.data(), bytes.size());
+        return place;
+    };
+    for (const std::uint32_t i : numbers) {
+        const auto plain = load.Plain(i);
+        Record record = {
+            copy(load.Host(i)), {copy(plain), plain.size()}, nullptr, load.dataSize[i]};
+        if (version != kKeysOnly) {
+            std::uint8_t* data = take(record.size);
+            MakeData(i, version, record.size, data);
+            record.data = data;
+        }
+        records_.push_back(record);
+    }
+}
+
 void MakeData(std::uint32_t i, std::uint32_t version, std::uint32_t size, std::uint8_t* out) {
     std::uint64_t word = (std::uint64_t{i} << 32 | version) * 0x9E3779B97F4A7C15u + 1;
     for (std::uint32_t at = 0; at < size; at += 8) {
@@ -123,7 +150,7 @@ void MakeData(std::uint32_t i, std::uint32_t version, std::uint32_t size, std::u
     }
 }
 
-std::uint64_t Digest(const std::uint8_t* data, std::size_t size) {
+std::uint64_t Digest::All(const std::uint8_t* data, std::size_t size) {
     std::uint64_t sum = size;
     std::size_t at = 0;
     for (; at + 8 <= size; at += 8) {
