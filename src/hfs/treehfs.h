@@ -168,6 +168,7 @@ struct InsertKey {
     bool replacesSeparator;    // new separator of a child whose first key changed
     bool secondKeyFollows;     // a second key goes into the same node right after this one
     HfsNode* child = nullptr;  // the cached child of an index record, if it is at hand
+    bool wasRefused = false;   // the node has already said that it has no room
 };
 
 // A reservation of nodes (space_reserve.cpp).

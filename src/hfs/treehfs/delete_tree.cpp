@@ -3,6 +3,7 @@
 // record goes, and the root collapses only while it is an index node with a single child. Nodes
 // are never merged.
 #include "hfs/treehfs/cache.h"
+#include "hfs/treehfs/node_child.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/own_change.h"
@@ -57,16 +58,19 @@ int Unlink(CBTreeHfs* tree, HfsNode* node) {
 int ReplaceParentKey(CBTreeHfs* tree, HfsFindData* path, HfsNode* node, int level) {
     HfsNode* parent = path->path[level + 1].node;
     const int index = path->path[level + 1].index;
-    unsigned child = 0;
-    HFS_TRY(parent->GetChildNodeNum(&tree->header, index, &child), 9263);
+    u32 child = 0;
+    HFS_TRY(ChildOf(tree, parent, index, &child), 9263);
     HFS_ASSERT(child == node->nodeNum, 4960);
-    HFS_TRY(tree->_DeleteRecord(parent, index), 4964);
-    const BTreeKey* key = nullptr;
-    HFS_TRY(FirstKey(tree, node, &key), 4970);
-    Separator replacement;
-    replacement.Fill(&tree->header, key, node);
-    replacement.entry.replacesSeparator = true;
-    HFS_TRY(tree->InsertLevel(path, &replacement.entry, nullptr, parent, index, level + 1), 4981);
+    if (child != node->nodeNum || !ReplacePlainSeparator(tree, path, level + 1, node)) {
+        HFS_TRY(tree->_DeleteRecord(parent, index), 4964);
+        const BTreeKey* key = nullptr;
+        HFS_TRY(FirstKey(tree, node, &key), 4970);
+        Separator replacement;
+        replacement.Fill(&tree->header, key, node);
+        replacement.entry.replacesSeparator = true;
+        HFS_TRY(tree->InsertLevel(path, &replacement.entry, nullptr, parent, index, level + 1),
+                4981);
+    }
     const bool linked = RelinkNode(tree, node);
     HFS_ASSERT(linked, 4988);
     return kOk;

@@ -43,6 +43,11 @@ public:
             table_->hints[index].order = order;
         }
     }
+    void ForgetOrder(u32 index) const {
+        if (index < room_) {
+            table_->hints[index].order = 0;
+        }
+    }
 
     // The cached child the record leads to, and its first block; null: none is known.
     HfsNode* Child(u32 index) const { return index < room_ ? table_->hints[index].child : nullptr; }

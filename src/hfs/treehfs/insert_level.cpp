@@ -1,7 +1,7 @@
 // Carries an insertion up the search path: one or two records go into the node at one level; what
 // its parent has to learn goes up as separators, by a call for the level above. The parent is
 // changed only after the whole level below is done.
-#include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/node_child.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/path_check.h"
@@ -84,7 +84,7 @@ bool SeparatorStayedBehind(const CBTreeHfs* tree, const HfsFindData* path, HfsNo
 }
 
 // The parent's record for `node` must be there before it is replaced or followed by another.
-int CheckParent(const BTHeaderMem* hdr, const HfsFindLevel& parent, const HfsNode* node,
+int CheckParent(const CBTreeHfs* tree, const HfsFindLevel& parent, const HfsNode* node,
                 bool replace) {
     HFS_ASSERT(parent.node != nullptr && Kind(parent.node) == kBTIndexNode, 4696);
     if (parent.node == nullptr || Kind(parent.node) != kBTIndexNode) {
@@ -93,8 +93,8 @@ int CheckParent(const BTHeaderMem* hdr, const HfsFindLevel& parent, const HfsNod
     if (!replace) {
         return kOk;
     }
-    unsigned child = 0;
-    HFS_TRY(parent.node->GetChildNodeNum(hdr, parent.index, &child), 9242);
+    u32 child = 0;
+    HFS_TRY(ChildOf(tree, parent.node, parent.index, &child), 9242);
     HFS_ASSERT(child == node->nodeNum, 4705);
     if (child != node->nodeNum || parent.index < 0) {
         return Fail(kErrCorrupt, kReasonTree, 9243);
@@ -138,7 +138,7 @@ int TellParent(CBTreeHfs* tree, HfsFindData* path, HfsNode* node, const LevelCha
         return Fail(kErrCorrupt, kReasonTree, 9244);
     }
     const HfsFindLevel parent = path->path[level + 1];
-    int status = CheckParent(hdr, parent, node, change.firstKeyChanged);
+    int status = CheckParent(tree, parent, node, change.firstKeyChanged);
     if (status != 0) {
         return status;
     }
@@ -146,6 +146,9 @@ int TellParent(CBTreeHfs* tree, HfsFindData* path, HfsNode* node, const LevelCha
         return EnterNewNode(tree, path, nullptr, change.newNode.Get(), level);
     }
 
+    if (!change.enterNewNode && ReplacePlainSeparator(tree, path, level + 1, node)) {
+        return kOk;
+    }
     HFS_TRY(tree->_DeleteRecord(parent.node, parent.index), 4714);
     const BTreeKey* key = nullptr;
     HFS_TRY(FirstKey(tree, node, &key), 4716);

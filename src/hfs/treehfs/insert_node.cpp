@@ -200,9 +200,11 @@ int Place(CBTreeHfs* tree, const InsertKey& key, HfsNode* node, unsigned nodeNum
         return Fail(kErrInvalid, kReasonInvalid, 9235);
     }
     bool inserted = false;
-    HFS_TRY(tree->_InsertKeyRecord(target, index, key.key, key.keyLength, key.data, key.dataSize,
-                                   key.convert, &inserted),
-            4327);
+    if (!key.wasRefused) {
+        HFS_TRY(tree->_InsertKeyRecord(target, index, key.key, key.keyLength, key.data,
+                                       key.dataSize, key.convert, &inserted),
+                4327);
+    }
     if (!inserted) {
         return MakeRoom(tree, key, target, index, out);
     }

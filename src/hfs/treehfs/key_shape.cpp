@@ -5,19 +5,6 @@
 
 namespace VELK {
 
-bool ShapeOf(CompareKeysFn compare, KeyShape* shape) {
-    if (compare == CompareCatKeysCaseIns || compare == CompareCatKeysCaseBin) {
-        *shape = {kCatKeyFixed, kCatKeyParentId, kCatKeyNameLength};
-    } else if (compare == CompareExtentKeysPlus) {
-        *shape = {kExtKeyFixed, kExtKeyFileId, 0};
-    } else if (compare == CompareAttrKeys) {
-        *shape = {kAttrKeyFixed, kAttrKeyFileId, kAttrKeyNameLength};
-    } else {
-        return false;
-    }
-    return true;
-}
-
 bool NodeKeyIsSound(const CBTreeHfs* tree, const BTreeKey* key, u32 keySize) {
     KeyShape shape;
     if (!ShapeOf(tree->compareKeys, &shape)) {

@@ -15,7 +15,18 @@ struct KeyShape {
 };
 
 // False: a comparator this engine does not know.
-bool ShapeOf(CompareKeysFn compare, KeyShape* shape);
+inline bool ShapeOf(CompareKeysFn compare, KeyShape* shape) {
+    if (compare == CompareCatKeysCaseIns || compare == CompareCatKeysCaseBin) {
+        *shape = {kCatKeyFixed, kCatKeyParentId, kCatKeyNameLength};
+    } else if (compare == CompareExtentKeysPlus) {
+        *shape = {kExtKeyFixed, kExtKeyFileId, 0};
+    } else if (compare == CompareAttrKeys) {
+        *shape = {kAttrKeyFixed, kAttrKeyFileId, kAttrKeyNameLength};
+    } else {
+        return false;
+    }
+    return true;
+}
 
 // Refuses a node key that a comparator or converter could not read safely: longer than any key,
 // shorter than its kind's fixed part, or a name that runs past the key. Chosen by the tree's own

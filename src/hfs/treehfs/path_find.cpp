@@ -159,6 +159,7 @@ bool PathStillLeads(const CBTreeHfs* tree) {
         }
     }
     std::uintptr_t beyond = reinterpret_cast<std::uintptr_t>(path.path[0].node);
+#pragma GCC unroll 4
     for (u32 level = depth + 1; level <= kMaxPathDepth; ++level) {
         beyond |= reinterpret_cast<std::uintptr_t>(path.path[level].node);
     }

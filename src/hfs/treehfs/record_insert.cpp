@@ -99,42 +99,9 @@ int StoreData(CBTreeHfs* tree, const NodeBytes& bytes, u32 offset, const void* d
     return kOk;
 }
 
-// MakeRecord in a node that lies in one block, was marked before and has nothing out of the
-// ordinary at `index`: no step can be refused. False: nothing has changed.
-bool MakePlainRecord(CBTreeHfs* tree, HfsNode* node, u32 index, u32 count, u32 size, NodeKey* key) {
-    if (tree->header.blockSize != tree->header.nodeSize || !node->bufs[0].dirty) {
-        return false;
-    }
-    u8* const data = node->bufs[0].data;
-    u8* const freeSlot = key->entry;
-    u8* const slot = freeSlot + kSlotSize * (count - index);
-    const u32 free = key->offset;
-    const u32 start = GetBe16(slot);
-    if (index < count) {
-        const u32 end = GetBe16(slot - kSlotSize);
-        if (!IsInsertPoint(start, free) || !IsInsertPoint(end, free) || Kind(node) > kBTIndexNode ||
-            start + PaddedKeySize(GetBe16(data + start)) >= end) {
-            return false;
-        }
-        NodeBytes(&tree->header, node).Move(start + size, start, free - start);
-    }
-    for (u8* to = freeSlot - kSlotSize; to < slot; to += kSlotSize) {
-        PutBe16(to, GetBe16(to + kSlotSize) + size);
-    }
-    key->offset = start;
-    key->ptr = data + start;
-    key->firstBytes = tree->header.nodeSize - start;
-    SetNumRecords(&tree->header, node, count + 1);
-    node->modifiedLink.MoveTail(&tree->modifiedList);
-    return true;
-}
-
 // Makes a record of `size` bytes at `index`. `key` holds where free space starts and comes back
 // with the place of the record, whose bytes are not written.
 int MakeRecord(CBTreeHfs* tree, HfsNode* node, u32 index, u32 count, u32 size, NodeKey* key) {
-    if (HFS_LIKELY(MakePlainRecord(tree, node, index, count, size, key))) {
-        return kOk;
-    }
     const u32 limit = key->entryPos;
     if (index == count) {
         HFS_TRY(MarkDirty(tree, node, key->offset, size), 1257);
@@ -152,6 +119,89 @@ int MakeRecord(CBTreeHfs* tree, HfsNode* node, u32 index, u32 count, u32 size, N
     HFS_ASSERT(NodeBytes(&tree->header, node).IsDirty(0), 1296);
     SetNumRecords(&tree->header, node, count + 1);
     return kOk;
+}
+
+// How far a node went along with a change that nothing can refuse half-way.
+enum class Plain {
+    kDone,
+    kFull,      // there is no room, and nothing has changed
+    kDoubtful,  // the long way round has to tell, and nothing has changed
+};
+
+// Opens a gap of `size` bytes, an even number, for record `index` in a node that lies in one block
+// and was marked before, and counts the record.
+Plain OpenPlainGap(CBTreeHfs* tree, HfsNode* node, u32 index, u32 size, u8** gap) {
+    const u32 nodeSize = tree->header.nodeSize;
+    const u32 count = NumRecords(node);
+    const u32 tableSize = kSlotSize * (count + 1);
+    if (tree->header.blockSize != nodeSize || !node->bufs[0].dirty || index > count ||
+        tableSize >= nodeSize) {
+        return Plain::kDoubtful;
+    }
+    u8* const data = node->bufs[0].data;
+    u8* const freeSlot = data + nodeSize - tableSize;
+    const u32 free = GetBe16(freeSlot);
+    const u32 limit = nodeSize - tableSize;
+    if (!IsInsertPoint(free, limit)) {
+        return Plain::kDoubtful;
+    }
+    if (u64{free} + size + kSlotSize > limit) {
+        return Plain::kFull;
+    }
+    u8* const slot = freeSlot + kSlotSize * (count - index);
+    const u32 start = GetBe16(slot);
+    if (index < count) {
+        const u32 end = GetBe16(slot - kSlotSize);
+        if (!IsInsertPoint(start, free) || !IsInsertPoint(end, free) || Kind(node) > kBTIndexNode ||
+            start + PaddedKeySize(GetBe16(data + start)) >= end) {
+            return Plain::kDoubtful;
+        }
+        std::memmove(data + start + size, data + start, free - start);
+    }
+    for (u8* to = freeSlot - kSlotSize; to < slot; to += kSlotSize) {
+        PutBe16(to, GetBe16(to + kSlotSize) + size);
+    }
+    PutBe16(data + kDescNumRecords, count + 1);
+    node->modifiedLink.MoveTail(&tree->modifiedList);
+    if (node->hints != nullptr) {
+        Hints(tree, node).Insert(index, 1);
+    }
+    *gap = data + start;
+    return Plain::kDone;
+}
+
+// A record as it is to be stored. The sizes of key and data are even in the node.
+struct NewRecord {
+    const BTreeKey* key;
+    u32 keySize;  // even
+    const void* data;
+    u32 dataSize;
+    const HfsConvert* convert;
+};
+
+// Puts a record into such a node.
+Plain PutPlainRecord(CBTreeHfs* tree, HfsNode* node, u32 index, const NewRecord& record) {
+    u8* at = nullptr;
+    const u32 evenDataSize = (record.dataSize + 1) / 2 * 2;
+    const Plain result = OpenPlainGap(tree, node, index, record.keySize + evenDataSize, &at);
+    if (result != Plain::kDone) {
+        return result;
+    }
+    if (record.convert == nullptr || record.convert->KeyToDisk == nullptr) {
+        std::memmove(at, record.key, record.keySize);
+    } else {
+        record.convert->KeyToDisk(at, record.key);
+    }
+    at += record.keySize;
+    if (record.convert == nullptr || record.convert->DataToDisk == nullptr) {
+        std::memmove(at, record.data, record.dataSize);
+    } else {
+        record.convert->DataToDisk(at, record.data, record.dataSize);
+    }
+    if ((record.dataSize & 1) != 0) {
+        at[record.dataSize] = 0;
+    }
+    return Plain::kDone;
 }
 
 }  // namespace
@@ -213,6 +263,18 @@ int CBTreeHfs::_InsertKeyRecord(HfsNode* node, int index, const BTreeKey* key, u
 
     const u32 keySize = keyLength + kKeyLengthSize;
     const u32 paddedKeySize = PaddedKeySize(keyLength);
+    if (keyLen == keyLength && paddedKeySize == keySize && dataSize <= header.nodeSize) {
+        NoteChange(this);
+        const u32 place = index == -1 ? NumRecords(node) : static_cast<u32>(index);
+        const Plain result =
+            PutPlainRecord(this, node, place, {key, keySize, data, dataSize, hook});
+        if (HFS_LIKELY(result == Plain::kDone) || (result == Plain::kFull && inserted != nullptr)) {
+            if (inserted != nullptr) {
+                *inserted = result == Plain::kDone;
+            }
+            return kOk;
+        }
+    }
     const u64 recordSize = (static_cast<u64>(dataSize) + 1) / 2 * 2 + paddedKeySize;
     // A size beyond 32 bits fits no node either.
     const u32 size = recordSize > UINT32_MAX ? UINT32_MAX - 1 : static_cast<u32>(recordSize);

@@ -2,6 +2,8 @@
 // other. Neither looks at parents or sibling links.
 #include "hfs/treehfs/record_move.h"
 
+#include <cstring>
+
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/report.h"
@@ -11,29 +13,40 @@ namespace VELK {
 
 namespace {
 
-// The offset table of a node that lies in one block.
+// A node that lies in one block, as a run of records with the table of where they start.
 class Table {
 public:
     Table(const BTHeaderMem* hdr, const HfsNode* node)
-        : bytes_(hdr, node),
-          end_(node->bufs[0].data + hdr->nodeSize),
-          size_(hdr->nodeSize),
-          count_(NumRecords(node)) {}
+        : data_(node->bufs[0].data), size_(hdr->nodeSize), count_(NumRecords(node)) {}
 
-    // REQUIRES of all: the table is sound, and has room for `index`.
+    // REQUIRES of all: the table is sound, and has room for the slots named.
     u32 Count() const { return count_; }
     u32 Start(u32 index) const { return GetBe16(Slot(index)); }
     u32 Free() const { return Start(count_); }
     u32 Room() const { return size_ - kSlotSize * (count_ + 1) - Free(); }
-    void SetStart(u32 index, u32 start) const { PutBe16(Slot(index), start); }
-    u32 KeyLength(u32 index) const { return GetBe16(end_ - size_ + Start(index)); }
-    const NodeBytes& Bytes() const { return bytes_; }
+    u32 KeyLength(u32 index) const { return GetBe16(At(Start(index))); }
+    u8* At(u32 offset) const { return data_ + offset; }
+
+    void Move(u32 target, u32 source, u32 size) const {
+        std::memmove(data_ + target, data_ + source, size);
+    }
+    // Copies `count` slots of `other`, which may be this table, and moves what they say by `by`.
+    void TakeStarts(u32 at, const Table& other, u32 from, u32 count, u32 by) const {
+        u8* const slots = Slot(at + count - 1);
+        std::memmove(slots, other.Slot(from + count - 1), kSlotSize * count);
+        for (u8* slot = slots; slot < slots + kSlotSize * count; slot += kSlotSize) {
+            PutBe16(slot, GetBe16(slot) + by);
+        }
+    }
+    void ClearStarts(u32 first, u32 count) const {
+        std::memset(Slot(first + count - 1), 0, kSlotSize * count);
+    }
+    void SetCount(u32 count) const { PutBe16(data_ + kDescNumRecords, count); }
 
 private:
-    u8* Slot(u32 index) const { return end_ - kSlotSize * std::size_t{index + 1}; }
+    u8* Slot(u32 index) const { return data_ + size_ - kSlotSize * std::size_t{index + 1}; }
 
-    NodeBytes bytes_;
-    u8* end_;
+    u8* data_;
     u32 size_;
     u32 count_;
 };
@@ -44,7 +57,7 @@ void MarkAgain(CBTreeHfs* tree, HfsNode* node) {
 }
 
 // Whether the record is longer than its key, as GetKey wants it.
-bool HasWholeKey(const Table& table, u32 index) {
+[[gnu::always_inline]] inline bool HasWholeKey(const Table& table, u32 index) {
     return table.Start(index) + PaddedKeySize(table.KeyLength(index)) < table.Start(index + 1);
 }
 
@@ -53,7 +66,8 @@ bool HasWholeKey(const Table& table, u32 index) {
 bool CanMoveAtOnce(const CBTreeHfs* tree, const HfsNode* giver, const HfsNode* receiver, u32 first,
                    u32 count) {
     const BTHeaderMem* hdr = &tree->header;
-    if (hdr->blockSize != hdr->nodeSize || !giver->bufs[0].dirty || !receiver->bufs[0].dirty) {
+    if (hdr->blockSize != hdr->nodeSize || !giver->bufs[0].dirty || !receiver->bufs[0].dirty ||
+        !LieApart(hdr, giver, receiver)) {
         return false;
     }
     const Table table(hdr, giver);
@@ -98,18 +112,15 @@ void CloseFront(const Table& table, u32 count) {
     const u32 base = table.Start(0);
     const u32 free = table.Free();
     const u32 gap = table.Start(count) - base;
-    table.Bytes().Move(base, base + gap, free - base - gap);
+    table.Move(base, base + gap, free - base - gap);
     for (u32 i = count - 1; i > 0; --i) {
         const u32 before = table.Start(i) - base;
         const u32 size = table.Start(i + 1) - table.Start(i);
-        table.Bytes().Move(free - before - size, free - size, size);
+        table.Move(free - before - size, free - size, size);
     }
-    for (u32 i = count; i <= table.Count(); ++i) {
-        table.SetStart(i - count, table.Start(i) - gap);
-    }
-    for (u32 i = table.Count() - count + 1; i <= table.Count(); ++i) {
-        table.SetStart(i, 0);
-    }
+    table.TakeStarts(0, table, count, table.Count() - count + 1, 0 - gap);
+    table.ClearStarts(table.Count() - count + 1, count);
+    table.SetCount(table.Count() - count);
 }
 
 // The first `count` records of `right` behind those of `left`.
@@ -119,14 +130,11 @@ void MoveFront(const CBTreeHfs* tree, HfsNode* left, HfsNode* right, u32 count) 
     const Table to(hdr, left);
     const u32 base = from.Start(0);
     const u32 free = to.Free();
-    CopyBetween(to.Bytes(), free, from.Bytes(), base, from.Start(count) - base);
-    for (u32 i = 1; i <= count; ++i) {
-        to.SetStart(to.Count() + i, free + from.Start(i) - base);
-    }
+    std::memmove(to.At(free), from.At(base), from.Start(count) - base);
+    to.TakeStarts(to.Count() + 1, from, 1, count, free - base);
+    to.SetCount(to.Count() + count);
     CloseFront(from, count);
     MoveHints(tree, right, 0, left, to.Count(), count);
-    SetNumRecords(hdr, left, to.Count() + count);
-    SetNumRecords(hdr, right, from.Count() - count);
 }
 
 // The last `count` records of `left` in front of those of `right`.
@@ -138,20 +146,14 @@ void MoveBack(const CBTreeHfs* tree, HfsNode* right, HfsNode* left, u32 count) {
     const u32 start = from.Start(first);
     const u32 size = from.Free() - start;
     const u32 base = to.Start(0);
-    to.Bytes().Move(base + size, base, to.Free() - base);
-    CopyBetween(to.Bytes(), base, from.Bytes(), start, size);
-    for (u32 i = to.Count() + 1; i > 0; --i) {
-        to.SetStart(i - 1 + count, to.Start(i - 1) + size);
-    }
-    for (u32 i = 0; i < count; ++i) {
-        to.SetStart(i, base + from.Start(first + i) - start);
-    }
-    for (u32 i = first + 1; i <= from.Count(); ++i) {
-        from.SetStart(i, 0);
-    }
+    to.Move(base + size, base, to.Free() - base);
+    std::memmove(to.At(base), from.At(start), size);
+    to.TakeStarts(count, to, 0, to.Count() + 1, size);
+    to.TakeStarts(0, from, first, count, base - start);
+    to.SetCount(to.Count() + count);
+    from.ClearStarts(first + 1, count);
+    from.SetCount(first);
     MoveHints(tree, left, first, right, 0, count);
-    SetNumRecords(hdr, right, to.Count() + count);
-    SetNumRecords(hdr, left, first);
 }
 
 }  // namespace

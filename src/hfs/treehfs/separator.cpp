@@ -1,8 +1,13 @@
 // Building of separators. See separator.h.
 #include "hfs/treehfs/separator.h"
 
-#include "hfs/treehfs/bytes.h"
+#include <cstring>
+
+#include "hfs/treehfs/hints.h"
+#include "hfs/treehfs/own_change.h"
+#include "hfs/treehfs/plain_record.h"
 #include "hfs/treehfs/scratch.h"
+#include "hfs/treehfs/slots.h"
 #include "platform/heap.h"
 
 namespace VELK {
@@ -14,6 +19,33 @@ namespace {
 // change, its length with it, while records move in the nodes above.
 bool NodesOverlap(const CBTreeHfs* tree) {
     return tree->header.nodeSize != 1u << tree->nodeShift;
+}
+
+// The first record of a node in one block, if its key can become that of a separator as it is.
+bool FindFirst(const BTHeaderMem* hdr, const HfsNode* node, PlainRecord* first) {
+    const u32 count = NumRecords(node);
+    return count != 0 && TableFits(*hdr, count) &&
+           PlainRecords<OneBlock, AnyShape>(hdr, node, AnyShape(0, 0)).Find(0, first) &&
+           PaddedKeySize(first->keySize - kKeyLengthSize) == first->keySize &&
+           GetKeyLength(hdr, KeyOf(*first), false) + kKeyLengthSize == first->keySize;
+}
+
+// Whether the records behind record `index` can follow its end without a word: as a deletion and an
+// insertion there would look at them.
+bool CanMoveBehind(const BTHeaderMem* hdr, const HfsNode* node, const RecordSlots& slots, u32 index,
+                   u32 removed) {
+    const u8* data = node->bufs[0].data;
+    for (u32 at = slots.limit; at < SlotOffset(hdr, index); at += kSlotSize) {
+        if (GetBe16(data + at) <= removed) {
+            return false;
+        }
+    }
+    if (index + 1 == slots.count) {
+        return true;
+    }
+    const u32 nextEnd = GetBe16(data + SlotOffset(hdr, index + 2));
+    return IsInsertPoint(nextEnd, slots.free) &&
+           slots.end + PaddedKeySize(GetBe16(data + slots.end)) < nextEnd;
 }
 
 }  // namespace
@@ -58,6 +90,42 @@ void Separator::Fill(const BTHeaderMem* hdr, const BTreeKey* key, HfsNode* leads
     entry.replacesSeparator = false;
     entry.secondKeyFollows = false;
     entry.child = leadsTo;
+}
+
+bool ReplacePlainSeparator(CBTreeHfs* tree, const HfsFindData* path, int level, HfsNode* child) {
+    const BTHeaderMem* hdr = &tree->header;
+    HfsNode* parent = path->path[level].node;
+    const u32 index = static_cast<u32>(path->path[level].index);
+    const bool endsHere = index != 0 || level == hdr->treeDepth;
+    PlainRecord first;
+    RecordSlots slots;
+    if (!endsHere || Height(parent) != static_cast<u32>(level) || hdr->blockSize != hdr->nodeSize ||
+        !parent->bufs[0].dirty || !LieApart(hdr, parent, child) || !FindFirst(hdr, child, &first) ||
+        !LoadRecordSlots(hdr, parent, index, &slots)) {
+        return false;
+    }
+    u8* const data = parent->bufs[0].data;
+    const u32 removed = slots.end - slots.start;
+    const u32 size = first.keySize + kChildSize;
+    if (PaddedKeySize(GetBe16(data + slots.start)) + kChildSize != removed ||
+        slots.free - removed + size > slots.limit ||
+        !CanMoveBehind(hdr, parent, slots, index, removed)) {
+        return false;
+    }
+    NoteChange(tree);
+    tree->pathVersion += 1;
+    std::memmove(data + slots.start + size, data + slots.end, slots.free - slots.end);
+    std::memcpy(data + slots.start, first.key, first.keySize);
+    PutBe32(data + slots.start + first.keySize, child->nodeNum);
+    for (u32 at = slots.limit; at < SlotOffset(hdr, index); at += kSlotSize) {
+        PutBe16(data + at, GetBe16(data + at) + size - removed);
+    }
+    parent->modifiedLink.MoveTail(&tree->modifiedList);
+    if (parent->hints != nullptr) {
+        Hints(tree, parent).ForgetOrder(index);
+        Hints(tree, parent).SetChild(index, child);
+    }
+    return true;
 }
 
 bool WasEmptied(const BTHeaderMem* hdr, const HfsNode* node, const BTreeKey* key) {

@@ -23,6 +23,12 @@ struct Separator {
     void Fill(const BTHeaderMem* hdr, const BTreeKey* key, HfsNode* leadsTo);
 };
 
+// Gives the separator of `child`, the record at which the path stands on `level`, the key that
+// `child` has first now, as if it were deleted and a new one inserted in its place. REQUIRES: the
+// record leads to `child`. False: nothing has changed, because there is no room, or more than this
+// node to change, or something that could be refused half-way.
+bool ReplacePlainSeparator(CBTreeHfs* tree, const HfsFindData* path, int level, HfsNode* child);
+
 // Whether `key`, still to be inserted, lay in the bytes of the newly allocated `node`. A damaged
 // map can call a node free that is in use; the key would then be read from a node that was emptied
 // and refilled.
