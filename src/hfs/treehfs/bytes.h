@@ -48,12 +48,33 @@ inline u32 GetHost32(const void* bytes) {
     return value;
 }
 
+// Eight of them, one behind the other.
+using U16x8 = u16 __attribute__((vector_size(16)));
+inline U16x8 GetBe16x8(const u8* bytes) {
+    U16x8 values;
+    std::memcpy(&values, bytes, sizeof values);
+    if constexpr (std::endian::native == std::endian::little) {
+        values = values << 8 | values >> 8;
+    }
+    return values;
+}
+
 inline u32 RoundUpEven(u32 size) {
     return (size + 1) & ~1u;
 }
 // Bytes a key of this length takes in a node: length field and key, padded to even.
 inline u32 PaddedKeySize(u32 keyLength) {
     return (keyLength + 3) & ~1u;
+}
+
+// Before each write: a paranoid build stops when the block was not marked modified, as a change
+// nobody hands over would be lost.
+inline void TrapIfClean([[maybe_unused]] const HfsBcbBuf* block) {
+#ifdef TREEHFS_PARANOID
+    if (!block->dirty) {
+        __builtin_trap();
+    }
+#endif
 }
 
 class NodeBytes {
@@ -137,14 +158,8 @@ private:
     bool InOneBlock(u32 offset, u32 size) const {
         return __builtin_expect((offset >> blockShift_) < blocks_ && size <= Room(offset), true);
     }
-    // Address to write at. A paranoid build stops when the block was not marked modified: a change
-    // nobody hands over would be lost.
     u8* WriteAt(u32 offset) const {
-#ifdef TREEHFS_PARANOID
-        if (!bufs_[offset >> blockShift_].dirty) {
-            __builtin_trap();
-        }
-#endif
+        TrapIfClean(&bufs_[offset >> blockShift_]);
         return bufs_[offset >> blockShift_].data + (offset & blockMask_);
     }
     void CopyInPieces(u32 offset, const void* source, u32 size) const;
@@ -154,6 +169,48 @@ private:
     u32 blockMask_;
     u32 blockShift_;
     u32 blocks_;
+};
+
+// The bytes of a node that lies in one block, without asking for each offset where that is. The net
+// is the same.
+class PlainBytes {
+public:
+    // REQUIRES: a block is as large as a node.
+    PlainBytes(const BTHeaderMem* hdr, const HfsNode* node)
+        : block_(&node->bufs[0]), data_(node->bufs[0].data), size_(hdr->nodeSize) {}
+
+    u32 Size() const { return size_; }
+    u8* At(u32 offset) const { return data_ + offset; }
+
+    // REQUIRES of all writers: the block was marked with SetDirty.
+    void CopyIn(u32 offset, const void* source, u32 size) const {
+        if (Contains(offset, size)) {
+            std::memmove(WriteAt(offset), source, size);
+        }
+    }
+    void Fill(u32 offset, u8 value, u32 size) const {
+        if (Contains(offset, size)) {
+            std::memset(WriteAt(offset), value, size);
+        }
+    }
+    void Move(u32 target, u32 source, u32 size) const {  // overlap allowed
+        if (Contains(target, size) && Contains(source, size)) {
+            std::memmove(WriteAt(target), At(source), size);
+        }
+    }
+
+private:
+    bool Contains(u32 offset, u32 size) const {
+        return __builtin_expect(static_cast<u64>(offset) + size <= size_, true);
+    }
+    u8* WriteAt(u32 offset) const {
+        TrapIfClean(block_);
+        return data_ + offset;
+    }
+
+    const HfsBcbBuf* block_;
+    u8* data_;
+    u32 size_;
 };
 
 // Copies between two nodes; they must not be the same one.

@@ -130,15 +130,16 @@ enum class Plain {
 
 // Opens a gap of `size` bytes, an even number, for record `index` in a node that lies in one block
 // and was marked before, and counts the record.
-Plain OpenPlainGap(CBTreeHfs* tree, HfsNode* node, u32 index, u32 size, u8** gap) {
-    const u32 nodeSize = tree->header.nodeSize;
+Plain OpenPlainGap(CBTreeHfs* tree, HfsNode* node, u32 index, u32 size, u32* gap) {
+    const PlainBytes bytes(&tree->header, node);
+    const u32 nodeSize = bytes.Size();
     const u32 count = NumRecords(node);
     const u32 tableSize = kSlotSize * (count + 1);
     if (tree->header.blockSize != nodeSize || !node->bufs[0].dirty || index > count ||
         tableSize >= nodeSize) {
         return Plain::kDoubtful;
     }
-    u8* const data = node->bufs[0].data;
+    u8* const data = bytes.At(0);
     u8* const freeSlot = data + nodeSize - tableSize;
     const u32 free = GetBe16(freeSlot);
     const u32 limit = nodeSize - tableSize;
@@ -156,7 +157,7 @@ Plain OpenPlainGap(CBTreeHfs* tree, HfsNode* node, u32 index, u32 size, u8** gap
             start + PaddedKeySize(GetBe16(data + start)) >= end) {
             return Plain::kDoubtful;
         }
-        std::memmove(data + start + size, data + start, free - start);
+        bytes.Move(start + size, start, free - start);
     }
     for (u8* to = freeSlot - kSlotSize; to < slot; to += kSlotSize) {
         PutBe16(to, GetBe16(to + kSlotSize) + size);
@@ -166,7 +167,7 @@ Plain OpenPlainGap(CBTreeHfs* tree, HfsNode* node, u32 index, u32 size, u8** gap
     if (node->hints != nullptr) {
         Hints(tree, node).Insert(index, 1);
     }
-    *gap = data + start;
+    *gap = start;
     return Plain::kDone;
 }
 
@@ -181,25 +182,26 @@ struct NewRecord {
 
 // Puts a record into such a node.
 Plain PutPlainRecord(CBTreeHfs* tree, HfsNode* node, u32 index, const NewRecord& record) {
-    u8* at = nullptr;
+    u32 at = 0;
     const u32 evenDataSize = (record.dataSize + 1) / 2 * 2;
     const Plain result = OpenPlainGap(tree, node, index, record.keySize + evenDataSize, &at);
     if (result != Plain::kDone) {
         return result;
     }
+    const PlainBytes bytes(&tree->header, node);
     if (record.convert == nullptr || record.convert->KeyToDisk == nullptr) {
-        std::memmove(at, record.key, record.keySize);
+        bytes.CopyIn(at, record.key, record.keySize);
     } else {
-        record.convert->KeyToDisk(at, record.key);
+        record.convert->KeyToDisk(bytes.At(at), record.key);
     }
     at += record.keySize;
     if (record.convert == nullptr || record.convert->DataToDisk == nullptr) {
-        std::memmove(at, record.data, record.dataSize);
+        bytes.CopyIn(at, record.data, record.dataSize);
     } else {
-        record.convert->DataToDisk(at, record.data, record.dataSize);
+        record.convert->DataToDisk(bytes.At(at), record.data, record.dataSize);
     }
     if ((record.dataSize & 1) != 0) {
-        at[record.dataSize] = 0;
+        *bytes.At(at + record.dataSize) = 0;
     }
     return Plain::kDone;
 }

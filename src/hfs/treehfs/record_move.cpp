@@ -2,8 +2,6 @@
 // other. Neither looks at parents or sibling links.
 #include "hfs/treehfs/record_move.h"
 
-#include <cstring>
-
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/report.h"
@@ -17,37 +15,34 @@ namespace {
 class Table {
 public:
     Table(const BTHeaderMem* hdr, const HfsNode* node)
-        : data_(node->bufs[0].data), size_(hdr->nodeSize), count_(NumRecords(node)) {}
+        : bytes_(hdr, node), count_(NumRecords(node)) {}
 
     // REQUIRES of all: the table is sound, and has room for the slots named.
     u32 Count() const { return count_; }
     u32 Start(u32 index) const { return GetBe16(Slot(index)); }
     u32 Free() const { return Start(count_); }
-    u32 Room() const { return size_ - kSlotSize * (count_ + 1) - Free(); }
-    u32 KeyLength(u32 index) const { return GetBe16(At(Start(index))); }
-    u8* At(u32 offset) const { return data_ + offset; }
+    u32 Room() const { return SlotAt(count_) - Free(); }
+    u32 KeyLength(u32 index) const { return GetBe16(bytes_.At(Start(index))); }
+    const PlainBytes& Bytes() const { return bytes_; }
 
-    void Move(u32 target, u32 source, u32 size) const {
-        std::memmove(data_ + target, data_ + source, size);
-    }
     // Copies `count` slots of `other`, which may be this table, and moves what they say by `by`.
     void TakeStarts(u32 at, const Table& other, u32 from, u32 count, u32 by) const {
         u8* const slots = Slot(at + count - 1);
-        std::memmove(slots, other.Slot(from + count - 1), kSlotSize * count);
+        bytes_.CopyIn(SlotAt(at + count - 1), other.Slot(from + count - 1), kSlotSize * count);
         for (u8* slot = slots; slot < slots + kSlotSize * count; slot += kSlotSize) {
             PutBe16(slot, GetBe16(slot) + by);
         }
     }
     void ClearStarts(u32 first, u32 count) const {
-        std::memset(Slot(first + count - 1), 0, kSlotSize * count);
+        bytes_.Fill(SlotAt(first + count - 1), 0, kSlotSize * count);
     }
-    void SetCount(u32 count) const { PutBe16(data_ + kDescNumRecords, count); }
+    void SetCount(u32 count) const { PutBe16(bytes_.At(kDescNumRecords), count); }
 
 private:
-    u8* Slot(u32 index) const { return data_ + size_ - kSlotSize * std::size_t{index + 1}; }
+    u32 SlotAt(u32 index) const { return bytes_.Size() - kSlotSize * (index + 1); }
+    u8* Slot(u32 index) const { return bytes_.At(SlotAt(index)); }
 
-    u8* data_;
-    u32 size_;
+    PlainBytes bytes_;
     u32 count_;
 };
 
@@ -112,11 +107,11 @@ void CloseFront(const Table& table, u32 count) {
     const u32 base = table.Start(0);
     const u32 free = table.Free();
     const u32 gap = table.Start(count) - base;
-    table.Move(base, base + gap, free - base - gap);
+    table.Bytes().Move(base, base + gap, free - base - gap);
     for (u32 i = count - 1; i > 0; --i) {
         const u32 before = table.Start(i) - base;
         const u32 size = table.Start(i + 1) - table.Start(i);
-        table.Move(free - before - size, free - size, size);
+        table.Bytes().Move(free - before - size, free - size, size);
     }
     table.TakeStarts(0, table, count, table.Count() - count + 1, 0 - gap);
     table.ClearStarts(table.Count() - count + 1, count);
@@ -130,7 +125,7 @@ void MoveFront(const CBTreeHfs* tree, HfsNode* left, HfsNode* right, u32 count) 
     const Table to(hdr, left);
     const u32 base = from.Start(0);
     const u32 free = to.Free();
-    std::memmove(to.At(free), from.At(base), from.Start(count) - base);
+    to.Bytes().CopyIn(free, from.Bytes().At(base), from.Start(count) - base);
     to.TakeStarts(to.Count() + 1, from, 1, count, free - base);
     to.SetCount(to.Count() + count);
     CloseFront(from, count);
@@ -146,8 +141,8 @@ void MoveBack(const CBTreeHfs* tree, HfsNode* right, HfsNode* left, u32 count) {
     const u32 start = from.Start(first);
     const u32 size = from.Free() - start;
     const u32 base = to.Start(0);
-    to.Move(base + size, base, to.Free() - base);
-    std::memmove(to.At(base), from.At(start), size);
+    to.Bytes().Move(base + size, base, to.Free() - base);
+    to.Bytes().CopyIn(base, from.Bytes().At(start), size);
     to.TakeStarts(count, to, 0, to.Count() + 1, size);
     to.TakeStarts(0, from, first, count, base - start);
     to.SetCount(to.Count() + count);

@@ -1,8 +1,6 @@
 // Building of separators. See separator.h.
 #include "hfs/treehfs/separator.h"
 
-#include <cstring>
-
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/plain_record.h"
@@ -104,7 +102,8 @@ bool ReplacePlainSeparator(CBTreeHfs* tree, const HfsFindData* path, int level, 
         !LoadRecordSlots(hdr, parent, index, &slots)) {
         return false;
     }
-    u8* const data = parent->bufs[0].data;
+    const PlainBytes bytes(hdr, parent);
+    u8* const data = bytes.At(0);
     const u32 removed = slots.end - slots.start;
     const u32 size = first.keySize + kChildSize;
     if (PaddedKeySize(GetBe16(data + slots.start)) + kChildSize != removed ||
@@ -114,8 +113,8 @@ bool ReplacePlainSeparator(CBTreeHfs* tree, const HfsFindData* path, int level, 
     }
     NoteChange(tree);
     tree->pathVersion += 1;
-    std::memmove(data + slots.start + size, data + slots.end, slots.free - slots.end);
-    std::memcpy(data + slots.start, first.key, first.keySize);
+    bytes.Move(slots.start + size, slots.end, slots.free - slots.end);
+    bytes.CopyIn(slots.start, first.key, first.keySize);
     PutBe32(data + slots.start + first.keySize, child->nodeNum);
     for (u32 at = slots.limit; at < SlotOffset(hdr, index); at += kSlotSize) {
         PutBe16(data + at, GetBe16(data + at) + size - removed);

@@ -2,7 +2,6 @@
 #include "hfs/treehfs/slots.h"
 
 #include <bit>
-#include <cstring>
 
 #include "hfs/treehfs/node_desc.h"
 
@@ -15,29 +14,18 @@ bool CountFits(const BTHeaderMem* hdr, u32 count) {
     return kDescSize + kSlotSize * (count + 1) <= hdr->nodeSize;
 }
 
-// Starts of eight records, side by side.
-using Starts = u16 __attribute__((vector_size(16)));
-constexpr u32 kStarts = sizeof(Starts) / kSlotSize;
-
-Starts LoadStarts(const u8* slots) {
-    Starts starts;
-    std::memcpy(&starts, slots, sizeof starts);
-    if constexpr (std::endian::native == std::endian::little) {
-        starts = starts << 8 | starts >> 8;
-    }
-    return starts;
-}
+constexpr u32 kTogether = sizeof(U16x8) / kSlotSize;
 
 // Not 0 where a start is odd, or not below the one in the slot before it.
-Starts WrongStarts(const u8* slots) {
-    const Starts starts = LoadStarts(slots);
-    return (starts & 1) | reinterpret_cast<Starts>(starts >= LoadStarts(slots - kSlotSize));
+U16x8 WrongStarts(const u8* slots) {
+    const U16x8 starts = GetBe16x8(slots);
+    return (starts & 1) | reinterpret_cast<U16x8>(starts >= GetBe16x8(slots - kSlotSize));
 }
 
 // Whether the starts in `count` slots are even and fall, from that in the slot before them on.
 // Eight are looked at together; the last eight may overlap those before.
 bool StartsFall(const u8* slots, u32 count) {
-    if (count < kStarts) {
+    if (count < kTogether) {
         bool isFalling = true;
         for (const u8* slot = slots; slot < slots + kSlotSize * count; slot += kSlotSize) {
             const u32 start = GetBe16(slot);
@@ -45,14 +33,16 @@ bool StartsFall(const u8* slots, u32 count) {
         }
         return isFalling;
     }
-    const u32 last = count - kStarts;
-    Starts wrong = WrongStarts(slots + kSlotSize * last);
-    for (u32 i = 0; i < last; i += kStarts) {
+    const u32 last = count - kTogether;
+    U16x8 wrong = WrongStarts(slots + kSlotSize * last);
+    for (u32 i = 0; i < last; i += kTogether) {
         wrong |= WrongStarts(slots + kSlotSize * i);
     }
-    u64 halves[2];
-    std::memcpy(halves, &wrong, sizeof wrong);
-    return (halves[0] | halves[1]) == 0;
+    struct Halves {
+        u64 low, high;
+    };
+    const Halves halves = std::bit_cast<Halves>(wrong);
+    return (halves.low | halves.high) == 0;
 }
 
 }  // namespace
