@@ -429,6 +429,9 @@ public:
     // Create made the tree, and since then no node was read from the volume and no record came in
     // that searches have something to say of.
     bool isAllOwn = false;
+    // All nodes below are in use: the search for a free one, still the first of them, begins here.
+    // 0: not known, as when somebody else may have written into the map.
+    u32 noneFreeBelow = 0;
 };
 
 }  // namespace VELK

@@ -12,8 +12,7 @@ namespace {
 
 constexpr u32 kMostNodes = 0xFFFFFFFFu;
 
-// Walks to the piece with the map's first clear bit. First fit: nothing is remembered from call to
-// call.
+// Walks to the piece with the map's first clear bit.
 int FindFreeNode(MapWalk* walk, u64* nodeNum) {
     for (;;) {
         HFS_TRY(walk->NextNode(), 3691);
@@ -68,6 +67,7 @@ int TakeFreeNode(CBTreeHfs* tree, bool forIndex, HfsNode** node) {
     }
     HFS_TRY(MarkDirty(tree, walk.Node(), walk.PieceOffset()), 3721);
     walk.SetBit(nodeNum);
+    tree->noneFreeBelow = static_cast<u32>(nodeNum) + 1;
     header->freeNodes -= 1;
     tree->isDirty = true;
     if (walk.AtHeaderNode()) {

@@ -140,7 +140,9 @@ void MapWalk::Restart() {
 
 bool MapWalk::FindClearBit(u64* bit) const {
     const unsigned long count = static_cast<unsigned long>(bytes_) * 8;
-    const unsigned long found = GetFreeBitPosBe(bits_, 0, count);
+    const u64 known = tree_->noneFreeBelow;
+    const u64 set = known > pieceBit_ ? known - pieceBit_ : 0;
+    const unsigned long found = GetFreeBitPosBe(bits_, set < count ? set : count, count);
     *bit = pieceBit_ + found;
     return found < count;
 }
@@ -162,6 +164,9 @@ void MapWalk::ClearBit(u64 bit) {
     const u64 bitInPiece = bit - pieceBit_;
     const u32 offset = offset_ + static_cast<u32>(bitInPiece / 8);
     bytes.SetU8(offset, bytes.U8(offset) & ~u32{MaskOf(bitInPiece)});
+    if (bit < tree_->noneFreeBelow) {
+        tree_->noneFreeBelow = static_cast<u32>(bit);
+    }
 }
 
 int StoreHeader(CBTreeHfs* tree, HfsNode* node0) {

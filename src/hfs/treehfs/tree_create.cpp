@@ -88,6 +88,7 @@ int CBTreeHfs::Create(unsigned newNodeShift, unsigned char, const unsigned long 
     }
     HFS_TRY(ResizeFork(this, initialSize != nullptr ? *initialSize : header.clumpSize), 5326);
     SetGeometry(this);
+    noneFreeBelow = 0;
     const int status = BuildTree(this, initialSize);
     if (status != kOk) {
         const bool isUndone = ResizeFork(this, 0) == kOk;
