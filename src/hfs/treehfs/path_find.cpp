@@ -177,12 +177,38 @@ bool PathStillLeads(const CBTreeHfs* tree) {
     __builtin_prefetch(leaf->modifiedLink.next, 1);
 }
 
+// When the leaf beside that of the tree's own path is the last one, below the same parent, and the
+// key lies in it: moves the path there.
+bool FindOnLastLeaf(CBTreeHfs* tree, const SoughtKey& key, SearchResult* result) {
+    const BTHeaderMem& header = tree->header;
+    HfsFindLevel& leaf = tree->findData.path[1];
+    HfsFindLevel& parent = tree->findData.path[2];
+    if (header.treeDepth < 2 || FLink(leaf.node) != header.lastLeafNode || parent.index < 0) {
+        return false;
+    }
+    const u32 index = static_cast<u32>(parent.index) + 1;
+    HfsNode* last = WayDown(tree, parent.node, index).node;
+    if (last == nullptr || last->nodeNum != header.lastLeafNode ||
+        PlainChild(&header, parent.node, static_cast<s32>(index)) != last->nodeNum ||
+        Height(last) != 1 || !IsLeaf(last) || last->refCount > 2 ||
+        !SearchInside(tree, last, key, result)) {
+        return false;
+    }
+    leaf.node->refCount -= 1;
+    TakeReference(last);
+    leaf.node = last;
+    parent.index += 1;
+    return true;
+}
+
 // Records are often inserted in key order. When the tree's own path still leads where it did, and
 // the key lies between the first and the last key of its leaf, or past the last one of the last
-// leaf, the way down is the one the path holds. Counters move as they would on the way down.
-bool FindOnSameLeaf(CBTreeHfs* tree, const SoughtKey& key, SearchResult* result) {
+// leaf, the way down is the one the path holds; behind a leaf that was split it is next to that.
+// Counters move as they would on the way down.
+bool FindByOwnPath(CBTreeHfs* tree, const SoughtKey& key, SearchResult* result) {
     HfsFindData* path = &tree->findData;
-    if (!PathStillLeads(tree) || !SearchInside(tree, path->path[1].node, key, result)) {
+    if (!PathStillLeads(tree) || (!SearchInside(tree, path->path[1].node, key, result) &&
+                                  !FindOnLastLeaf(tree, key, result))) {
         return false;
     }
     path->searchCount += 1;
@@ -236,7 +262,7 @@ int CBTreeHfs::FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, 
     }
     SoughtKey searchKey(this, key, keyArg);
     SearchResult result;
-    if (path == &findData && FindOnSameLeaf(this, searchKey, &result)) {
+    if (path == &findData && FindByOwnPath(this, searchKey, &result)) {
         *found = result.found;
     } else {
         searchKey.LearnOrder();
