@@ -145,6 +145,22 @@ TEST_P(CreateTree, CreatedTreeHandsOutItsNodes) {
     EXPECT_TRUE(MapIsSound());
 }
 
+TEST_P(CreateTree, TreeThatIsCreatedAgainHandsOutItsFirstNodeFirst) {
+    MakeSmallVolume(kCatalogFileId);
+    SetCatalogConstants();
+    for (int time = 0; time < 2; ++time) {
+        ASSERT_EQ(Create(), kOk);
+        for (u32 number = 1; number < 4; ++number) {
+            HfsNode* node = nullptr;
+            ASSERT_EQ(Tree().AllocateNode(&node), kOk);
+            EXPECT_EQ(node->nodeNum, number);
+            node->refCount -= 1;
+        }
+        ASSERT_EQ(Tree().Flush(0), kOk);
+        Tree().Dtor();
+    }
+}
+
 TEST_P(CreateTree, NodeSizesOutOfRangeAreRefused) {
     for (const unsigned shift : {0u, 8u, 16u, 0xFFFFFFFFu}) {
         for (const u32 fileId : {kAttributesFileId, kCatalogFileId}) {

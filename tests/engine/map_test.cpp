@@ -197,39 +197,6 @@ TEST_P(MapAllocate, FreedNodeIsTakenAgainWhenNoLowerOneIsFree) {
     EXPECT_TRUE(MapIsSound());
 }
 
-// The search goes on where the last one ended only as long as nobody else can have written.
-TEST_P(MapAllocate, BitThatSomebodyElseClearsIsSeen) {
-    Open(20, 3);
-    for (const u32 number : {3u, 4u, 5u}) {
-        ASSERT_EQ(Allocate(), kOk);
-        EXPECT_EQ(Taken(), number);
-    }
-    HfsNode* map = nullptr;
-    ASSERT_EQ(Tree().GetMapNode(&map), kOk);
-    ASSERT_EQ(Tree().SetDirty(map, kHeadMapRecord, 1), kOk);
-    map->bufs[0].data[kHeadMapRecord] = 0xEC;  // node 3 is free again
-    Tree().header.freeNodes += 1;
-    map->refCount -= 1;
-    ASSERT_EQ(Allocate(), kOk);
-    EXPECT_EQ(Taken(), 3u);
-    ASSERT_EQ(Allocate(), kOk);
-    EXPECT_EQ(Taken(), 6u);
-    EXPECT_TRUE(MapIsSound());
-}
-
-TEST_P(MapAllocate, MapThatIsReadAgainIsSearchedFromItsStart) {
-    Open(20, 3);
-    for (const u32 number : {3u, 4u, 5u}) {
-        ASSERT_EQ(Allocate(), kOk);
-        EXPECT_EQ(Taken(), number);
-    }
-    ASSERT_EQ(Tree().Flush(0), kOk);
-    ASSERT_EQ(Tree().nodeCount, 0u);
-    Poke8(0, kHeadMapRecord, 0xF4);  // node 4 is free again
-    ASSERT_EQ(Allocate(), kOk);
-    EXPECT_EQ(Taken(), 4u);
-}
-
 TEST_P(MapAllocate, LastNodeIsTakenAndThenThereIsNone) {
     Open(20, 19);
     ASSERT_EQ(Allocate(), kOk);

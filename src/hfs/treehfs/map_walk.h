@@ -51,8 +51,8 @@ public:
     u64 PieceStart() const { return pieceBit_; }
     u64 PieceEnd() const { return pieceBit_ + u64{bytes_} * 8; }
 
-    // Number of the piece's first clear bit; those known to be set are not looked at. False: all are
-    // set.
+    // Number of the piece's first clear bit, sought behind those that are known to be set. False:
+    // all are set.
     bool FindClearBit(u64* bit) const;
 
     // REQUIRES of these: the bit lies in the piece; of the writers: the piece's block was marked.
