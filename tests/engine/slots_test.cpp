@@ -79,6 +79,57 @@ TEST_P(OffsetTable, WordsBelowItAreNoSlots) {
     EXPECT_FALSE(LoadRecordSlots(&bench_.tree.header, node->Get(), kRecords + 1, &slots));
 }
 
+// What a sound table is, start by start.
+bool IsSound(const Bytes& content) {
+    const u32 size = static_cast<u32>(content.size());
+    const u32 count = Get16(content, 10);
+    const auto start = [&](u32 record) { return Get16(content, size - 2 * (record + 1)); };
+    bool isSound = start(0) >= 14 && start(count) <= size - 2 * (count + 1);
+    for (u32 record = 0; record <= count; ++record) {
+        isSound =
+            isSound && start(record) % 2 == 0 && (record == 0 || start(record - 1) < start(record));
+    }
+    return isSound;
+}
+
+TEST_P(OffsetTable, ShortTablesAreLookedAtFromEndToEnd) {
+    for (u32 count = 1; count <= 13; ++count) {
+        content_ = LeafOf(kNodeSize, std::vector<Bytes>(count, Records()[0]));
+        for (u32 record = 0; record <= count; ++record) {
+            const u32 is = Start(record);
+            for (const u32 start : {is, is + 1, is - 2, is + 2, is + 10, is - 10, is + 12, 0u,
+                                    is | 0x8000u, 0xFFFEu, 0x7FFEu, 0x8000u}) {
+                Bytes changed = content_;
+                Put16(&changed, SlotAt(record), start);
+                EXPECT_EQ(IsSoundWith(record, start), IsSound(changed))
+                    << "record " << record << " of " << count << ": " << start;
+            }
+        }
+    }
+}
+
+// Nodes longer than the format allows open, too: starts have all of their bits.
+TEST(LongOffsetTable, StartsOfAllLengthsFall) {
+    constexpr u32 kLength = 40960;
+    NodeBench bench{Geometry{kLength, 512}};
+    const Bytes content = LeafOf(kLength, std::vector<Bytes>(5, Record({0, 2, 1, 1}, Bytes(7000))));
+    for (const auto& [record, start] :
+         {std::pair{4u, 28030u}, {4u, 28031u}, {4u, 35032u}, {5u, 40900u}, {3u, 0x8000u}}) {
+        Bytes changed = content;
+        Put16(&changed, kLength - 2 * (record + 1), start);
+        const auto node = bench.Node(changed);
+        EXPECT_EQ(TableIsSound(&bench.tree.header, node->Get()), IsSound(changed))
+            << record << " " << start;
+    }
+}
+
+TEST_P(OffsetTable, ATableBehindTheLastBlockIsRefused) {
+    const auto node = bench_.Node(content_);
+    BTHeaderMem header = bench_.tree.header;
+    header.nodeSize = kNodeSize + 2;
+    EXPECT_FALSE(TableIsSound(&header, node->Get()));
+}
+
 TEST_P(OffsetTable, AnEmptyNodeIsSound) {
     content_ = LeafOf(kNodeSize, {});
     EXPECT_TRUE(IsSoundWith(0, 14));

@@ -22,6 +22,11 @@ inline u32 GetBe32(const u8* bytes) {
     return (static_cast<u32>(bytes[0]) << 24) | (static_cast<u32>(bytes[1]) << 16) |
            (static_cast<u32>(bytes[2]) << 8) | bytes[3];
 }
+inline u64 GetBe64(const u8* bytes) {
+    u64 value;
+    std::memcpy(&value, bytes, sizeof value);
+    return std::endian::native == std::endian::little ? __builtin_bswap64(value) : value;
+}
 // In one piece: who reads a number back soon would wait for single bytes to come together.
 inline void PutBe16(u8* bytes, u32 value) {
     u16 stored = static_cast<u16>(value);
@@ -46,17 +51,6 @@ inline u32 GetHost32(const void* bytes) {
     u32 value;
     std::memcpy(&value, bytes, sizeof value);
     return value;
-}
-
-// Eight of them, one behind the other.
-using U16x8 = u16 __attribute__((vector_size(16)));
-inline U16x8 GetBe16x8(const u8* bytes) {
-    U16x8 values;
-    std::memcpy(&values, bytes, sizeof values);
-    if constexpr (std::endian::native == std::endian::little) {
-        values = values << 8 | values >> 8;
-    }
-    return values;
 }
 
 inline u32 RoundUpEven(u32 size) {

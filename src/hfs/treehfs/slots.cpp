@@ -1,8 +1,6 @@
 // Strict checks of a node's record offset table. See slots.h.
 #include "hfs/treehfs/slots.h"
 
-#include <bit>
-
 #include "hfs/treehfs/node_desc.h"
 
 namespace VELK {
@@ -14,18 +12,26 @@ bool CountFits(const BTHeaderMem* hdr, u32 count) {
     return kDescSize + kSlotSize * (count + 1) <= hdr->nodeSize;
 }
 
-constexpr u32 kTogether = sizeof(U16x8) / kSlotSize;
+// Four starts in one word, without an instruction a driver could be forbidden to use.
+constexpr u32 kTogether = sizeof(u64) / kSlotSize;
+constexpr u64 kLowBits = 0x0001000100010001;
+constexpr u64 kHighBits = kLowBits << 15;
 
-// Not 0 where a start is odd, or not below the one in the slot before it.
-U16x8 WrongStarts(const u8* slots) {
-    const U16x8 starts = GetBe16x8(slots);
-    return (starts & 1) | reinterpret_cast<U16x8>(starts >= GetBe16x8(slots - kSlotSize));
+// Not 0 where one of four starts is odd, or not below the one in the slot before it.
+// REQUIRES: none of those before has its high bit set, or one that is wrong is found besides.
+u64 WrongStarts(const u8* slots) {
+    const u64 starts = GetBe64(slots);
+    const u64 before = GetBe64(slots - kSlotSize);
+    // A high bit that no difference took away: the start is below.
+    const u64 below = (before | kHighBits) - starts - kLowBits;
+    return (starts & (kHighBits | kLowBits)) | (~below & kHighBits);
 }
 
 // Whether the starts in `count` slots are even and fall, from that in the slot before them on.
-// Eight are looked at together; the last eight may overlap those before.
+// Four are looked at together; the last four may overlap those before.
 bool StartsFall(const u8* slots, u32 count) {
-    if (count < kTogether) {
+    const bool isHigh = (slots[-static_cast<int>(kSlotSize)] & 0x80) != 0;
+    if (count < kTogether || isHigh) {
         bool isFalling = true;
         for (const u8* slot = slots; slot < slots + kSlotSize * count; slot += kSlotSize) {
             const u32 start = GetBe16(slot);
@@ -34,15 +40,11 @@ bool StartsFall(const u8* slots, u32 count) {
         return isFalling;
     }
     const u32 last = count - kTogether;
-    U16x8 wrong = WrongStarts(slots + kSlotSize * last);
+    u64 wrong = WrongStarts(slots + kSlotSize * last);
     for (u32 i = 0; i < last; i += kTogether) {
         wrong |= WrongStarts(slots + kSlotSize * i);
     }
-    struct Halves {
-        u64 low, high;
-    };
-    const Halves halves = std::bit_cast<Halves>(wrong);
-    return (halves.low | halves.high) == 0;
+    return wrong == 0;
 }
 
 }  // namespace
@@ -76,12 +78,13 @@ bool TableIsSound(const BTHeaderMem* hdr, const HfsNode* node) {
     const NodeBytes bytes(hdr, node);
     const u32 limit = SlotOffset(hdr, count);
     const u32 free = bytes.U16(limit);
-    if (free > limit || (free & 1) != 0 || bytes.U16(SlotOffset(hdr, 0)) < kDescSize) {
+    // In a node whose size is no multiple of a block's, part of the table lies in none.
+    if (!bytes.Contains(limit, hdr->nodeSize - limit) || free > limit || (free & 1) != 0 ||
+        bytes.U16(SlotOffset(hdr, 0)) < kDescSize) {
         return false;
     }
     for (u32 position = limit;;) {
-        const u32 left = hdr->nodeSize - position;
-        const u32 room = bytes.Room(position) < left ? bytes.Room(position) : left;
+        const u32 room = bytes.Room(position);
         if (!StartsFall(bytes.At(position) + kSlotSize, room / kSlotSize - 1)) {
             return false;
         }
