@@ -168,7 +168,7 @@ struct InsertKey {
     bool replacesSeparator;    // new separator of a child whose first key changed
     bool secondKeyFollows;     // a second key goes into the same node right after this one
     HfsNode* child = nullptr;  // the cached child of an index record, if it is at hand
-    bool wasRefused = false;   // the node has already said that it has no room
+    bool wasRefused = false;   // the node has said already that it has no room
 };
 
 // A reservation of nodes (space_reserve.cpp).
@@ -429,8 +429,8 @@ public:
     // Create made the tree, and since then no node was read from the volume and no record came in
     // that searches have something to say of.
     bool isAllOwn = false;
-    // All nodes below are in use: the search for a free one, still the first of them, begins here.
-    // 0: not known, as when somebody else may have written into the map.
+    // While that is so, all nodes below are in use, and the search for the first free one, still
+    // from map node to map node, looks at no bits before this one's.
     u32 noneFreeBelow = 0;
 };
 

@@ -14,6 +14,7 @@ add_executable(change_tests
   insert_test.cpp
   lockstep_test.cpp
   own_change_test.cpp
+  plain_change_test.cpp
   record_delete_test.cpp
   record_insert_test.cpp
   record_move_test.cpp

@@ -79,6 +79,25 @@ TEST_F(ShortWay, ASeparatorThatIsTooLongIsRefused) {
     ExpectAsPlainly(&bench, u"b", kErrCorrupt);
 }
 
+// A leaf that has no room is not asked a second time when that could say nothing new.
+TEST_F(ShortWay, AKeyThatIsTooLongIsSaidToBeSoAsOften) {
+    Events said[2];
+    for (const bool isAllOwn : {false, true}) {
+        Bench bench(Blocks(2048));
+        bench.Create(11, CompareCatKeysCaseIns);
+        for (const char16_t* name : {u"a", u"b", u"q"}) {
+            ASSERT_EQ(Insert(&bench, name, 400), kOk);
+        }
+        bench.capture.Take();
+        bench->isAllOwn = isAllOwn;
+        ASSERT_EQ(Insert(&bench, u"c" + std::u16string(257, u'x'), 400), kOk);
+        said[isAllOwn ? 1 : 0] = bench.capture.Take();
+        bench->findData.ClearPath();
+    }
+    EXPECT_EQ(said[0], said[1]);
+    EXPECT_GE(said[0].size(), 3u);
+}
+
 // An extents key of 12 bytes in a tree of separators of 10: asserted (1359), inserted, and nothing
 // else is said of an insertion that succeeded.
 TEST_F(ShortWay, AnInsertionThatSucceedsReportsNothing) {

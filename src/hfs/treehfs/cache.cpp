@@ -8,7 +8,6 @@
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
-#include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/prefetch.h"
 #include "hfs/treehfs/report.h"
 #include "platform/heap.h"
@@ -200,14 +199,6 @@ void EmptyExisting(CBTreeHfs* tree, HfsNode* node) {
     }
 }
 
-// A node came from the volume as it was there.
-void NoteRead(CBTreeHfs* tree, const HfsNode* node) {
-    tree->isAllOwn = false;
-    if (Kind(node) == kBTMapNode || node->nodeNum == 0) {
-        tree->noneFreeBelow = 0;
-    }
-}
-
 bool WantsEmpty(NodeUse use) {
     return use == NodeUse::kEmpty || use == NodeUse::kEmptyIndex;
 }
@@ -266,7 +257,7 @@ int LoadNode(CBTreeHfs* tree, const Place& place, u32 nodeNum, NodeUse use, HfsN
     if (makeEmpty) {
         EmptyExisting(tree, node);
     } else {
-        NoteRead(tree, node);
+        tree->isAllOwn = false;
         HFS_ASSERT(wasEmpty || GetBe16(TailOf(tree->header, node)) == kEmptyTail, 2671);
     }
     *out = node;
@@ -352,7 +343,7 @@ int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
 int CBTreeHfs::GetINode(unsigned nodeNum, HfsNode** out, bool makeEmpty) {
     const int status = FetchNode(this, nodeNum, makeEmpty ? NodeUse::kEmpty : NodeUse::kRead, out);
     if (status == kOk) {
-        NoteStranger(this);  // who asks for a node by its number may write into it
+        isAllOwn = false;  // who asks for a node by its number may write into it
         ForgetRecords(this, *out);
     }
     return status;

@@ -97,7 +97,7 @@ int MarkBytes(CBTreeHfs* tree, HfsNode* node, u32 offset, u32 length) {
 
 // Somebody else is about to write into the node.
 int CBTreeHfs::SetDirty(HfsNode* node, unsigned offset, unsigned length) {
-    NoteStranger(this);
+    isAllOwn = false;
     ForgetRecords(this, node);
     return MarkDirty(this, node, offset, length);
 }

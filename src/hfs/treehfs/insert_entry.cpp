@@ -83,28 +83,6 @@ int ReserveForSplits(CBTreeHfs* tree) {
     return kOk;
 }
 
-// A record on its own: it replaces no separator, and none follows it.
-InsertKey MakeEntry(const BTHeaderMem& hdr, const BTreeKey* key, const void* data, u32 dataSize,
-                    HfsConvert* convert, bool leaf) {
-    InsertKey entry;
-    entry.convert = convert;
-    entry.key = key;
-    entry.keyLength =
-        convert != nullptr ? GetKeyLengthLe(&hdr, key, leaf) : GetKeyLength(&hdr, key, leaf);
-    entry.data = data;
-    entry.dataSize = dataSize;
-    entry.replacesSeparator = false;
-    entry.secondKeyFollows = false;
-    return entry;
-}
-
-// Puts the record in at place `index` of the path's node at `level`, and goes up to where nothing
-// more has to be told. REQUIRES: the path leads to its node at that level.
-int InsertUpwards(CBTreeHfs* tree, HfsFindData* path, InsertKey* entry, int level, int index) {
-    HFS_TRY(tree->InsertLevel(path, entry, nullptr, path->path[level].node, index, level), 4593);
-    return kOk;
-}
-
 // After records moved and separators were replaced the tree's own path mostly leads where it did:
 // then the next search need not go down again. It does so anyway among nodes of another writer,
 // whose damage is not to be reported for this.
@@ -155,9 +133,8 @@ int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, 
         if (status != 0) {
             return status;
         }
-        InsertKey entry = MakeEntry(header, searchKey, data, dataSize, &convert, true);
-        entry.wasRefused = index > 0;
-        HFS_TRY(InsertUpwards(this, &findData, &entry, 1, index), 5092);
+        HFS_TRY(InsertTree(searchKey, data, dataSize, leaf, index, 1, false, &findData, &convert),
+                5092);
     }
     change.Done();
     isAllOwn = isAllOwn && IsOrdinary(this, key, keyLen, dataSize);
@@ -173,13 +150,25 @@ int CBTreeHfs::InsertTree(const BTreeKey* key, const void* data, unsigned dataSi
                           int index, int level, bool replacesSeparator, HfsFindData* path,
                           HfsConvert* hook) {
     path = path != nullptr ? path : &findData;
+    // In a tree that nobody else touched the path of the lookup before InsertRecord's change leads.
+    const bool isOwn = isAllOwn && path->leadsAsOf == kOwnChange;
     if (level < 1 || static_cast<u32>(level) > kMaxPathDepth || path->path[level].node != node ||
-        node == nullptr || !ParentsLeadHere(this, path, static_cast<u32>(level))) {
+        node == nullptr || (!isOwn && !ParentsLeadHere(this, path, static_cast<u32>(level)))) {
         return Fail(kErrInvalid, kReasonInvalid, 9255);
     }
-    InsertKey entry = MakeEntry(header, key, data, dataSize, hook, level == 1);
+    InsertKey entry;
+    entry.convert = hook;
+    entry.key = key;
+    entry.keyLength = hook != nullptr ? GetKeyLengthLe(&header, key, level == 1)
+                                      : GetKeyLength(&header, key, level == 1);
+    entry.data = data;
+    entry.dataSize = dataSize;
     entry.replacesSeparator = replacesSeparator;
-    return InsertUpwards(this, path, &entry, level, index);
+    entry.secondKeyFollows = false;
+    // Asked once more, the leaf would say nothing but that the key is too long.
+    entry.wasRefused = isOwn && index > 0 && entry.keyLength <= kMaxKeyLength;
+    HFS_TRY(InsertLevel(path, &entry, nullptr, node, index, level), 4593);
+    return kOk;
 }
 
 }  // namespace VELK

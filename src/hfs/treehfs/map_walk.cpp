@@ -140,7 +140,7 @@ void MapWalk::Restart() {
 
 bool MapWalk::FindClearBit(u64* bit) const {
     const unsigned long count = static_cast<unsigned long>(bytes_) * 8;
-    const u64 known = tree_->noneFreeBelow;
+    const u64 known = tree_->isAllOwn ? tree_->noneFreeBelow : 0;
     const u64 set = known > pieceBit_ ? known - pieceBit_ : 0;
     const unsigned long found = GetFreeBitPosBe(bits_, set < count ? set : count, count);
     *bit = pieceBit_ + found;

@@ -12,17 +12,9 @@ namespace VELK {
 // and changes are the engine's own.
 constexpr u64 kOwnChange = ~u64{0};
 
-// Somebody else may be about to write into a node.
-inline void NoteStranger(CBTreeHfs* tree) {
-    tree->isAllOwn = false;
-    tree->noneFreeBelow = 0;
-}
-
 // In each operation that changes records or gives nodes back.
 inline void NoteChange(CBTreeHfs* tree) {
-    if (tree->findData.leadsAsOf != kOwnChange) {
-        NoteStranger(tree);
-    }
+    tree->isAllOwn = tree->isAllOwn && tree->findData.leadsAsOf == kOwnChange;
 }
 
 // One whole change by the engine. Unless it is said to be done it was left half-way.
