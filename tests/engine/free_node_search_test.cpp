@@ -96,6 +96,25 @@ TEST_P(FreeNodeSearch, MapThatIsReadAgainIsSearchedFromItsStart) {
     EXPECT_EQ(Taken(), 4u);
 }
 
+TEST(FreeNodeSearchInChains, RecordsThatAreFullAreLeftBehind) {
+    Bench bench(Blocks(512));
+    bench.Create(9, CompareCatKeysCaseIns);
+    ASSERT_EQ(bench->ExtendBTree(2600, nullptr, nullptr), kOk);
+    u32 before = 0;
+    for (u32 n = 0; n < 2500; ++n) {
+        HfsNode* node = nullptr;
+        ASSERT_EQ(bench->AllocateNode(&node), kOk);
+        node->refCount -= 1;
+        ASSERT_GT(node->nodeNum, before);
+        ASSERT_LE(node->nodeNum, before + 2) << "one map node at most lies between";
+        before = node->nodeNum;
+    }
+    EXPECT_TRUE(bench->isAllOwn);
+    bench->Clear();
+    bench->Dtor();
+    bench.capture.Take();
+}
+
 INSTANTIATE_TEST_SUITE_P(Blocks, FreeNodeSearch, ::testing::Values(512u, 1024u));
 
 }  // namespace

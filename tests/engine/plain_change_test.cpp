@@ -31,6 +31,7 @@ std::vector<Damage> DamagesOf(const Bytes& content) {
     for (const u32 kind : {0xFFu, 0x00u, 0x01u, 0x02u, 0x03u}) {
         damages.push_back({kDescKind, kind, 1});
     }
+    damages.push_back({kDescHeight, 5, 1});
     for (const u32 other : {0u, 1u, count - 1, count + 1, 504u, 505u, 510u, 511u, 512u, 0xFFFFu}) {
         damages.push_back({kDescNumRecords, other, 2});
     }
@@ -118,7 +119,7 @@ TEST(PlainInsertion, ComesToWhatTheLongWayDoes) {
     }
 }
 
-// Takes the first record of a leaf out below a root that somebody damaged after the lookup.
+// Takes the first record of a leaf out after somebody damaged that, or the root, behind the lookup.
 constexpr u32 kKeys = 90;
 
 class FirstRecordGoes {
@@ -139,16 +140,22 @@ public:
     }
 
     Bytes Root() { return Content(bench_->header.rootNode); }
+    Bytes Leaf(u32 leaf) {
+        StandOn(leaf);
+        return Content(bench_->findData.path[1].node->nodeNum);
+    }
     u32 Leaves() { return Get16(Root(), kDescNumRecords); }
 
-    Outcome Play(u32 leaf, const Damage& damage) {
+    Outcome Play(u32 leaf, int level, const Damage& damage) {
         StandOn(leaf);
         HfsNode* root = bench_->findData.path[2].node;
+        HfsNode* damaged = bench_->findData.path[level].node;
         EXPECT_EQ(bench_->SetDirty(root, 0, kNodeSize), kOk);
+        EXPECT_EQ(bench_->SetDirty(damaged, 0, kNodeSize), kOk);
         for (u32 i = 0; i < damage.width; ++i) {
             const u32 at = damage.at + i;
             const u32 block = bench_->header.blockSize;
-            root->bufs[at / block].data[at % block] =
+            damaged->bufs[at / block].data[at % block] =
                 static_cast<u8>(damage.value >> 8 * (damage.width - 1 - i));
         }
         bench_.Forget();
@@ -191,22 +198,24 @@ private:
     Bench bench_;
 };
 
+void ExpectAlike(u32 leaf, int level, const Damage& damage) {
+    const Outcome quick = FirstRecordGoes(kNodeSize).Play(leaf, level, damage);
+    ASSERT_EQ(quick, FirstRecordGoes(kNodeSize / 2).Play(leaf, level, damage))
+        << damage << ", leaf " << leaf << ", level " << level;
+}
+
 TEST(PlainSeparator, ComesToWhatTheLongWayDoes) {
-    std::vector<Damage> damages;
-    u32 leaves = 0;
-    {
-        FirstRecordGoes sound(kNodeSize);
-        damages = DamagesOf(sound.Root());
-        leaves = sound.Leaves();
-    }
+    const u32 leaves = FirstRecordGoes(kNodeSize).Leaves();
     ASSERT_GE(leaves, 4u);
-    damages.push_back({0, 0, 1});  // none
-    for (const Damage& damage : damages) {
-        for (const u32 leaf : {0u, 1u, leaves - 2, leaves - 1}) {
-            const Outcome quick = FirstRecordGoes(kNodeSize).Play(leaf, damage);
-            ASSERT_EQ(quick, FirstRecordGoes(kNodeSize / 2).Play(leaf, damage))
-                << damage << ", leaf " << leaf;
+    for (u32 leaf = 0; leaf < leaves; ++leaf) {
+        ExpectAlike(leaf, 2, {0, 0, 1});  // none
+        for (const Damage& damage : DamagesOf(FirstRecordGoes(kNodeSize).Root())) {
+            ExpectAlike(leaf, 2, damage);
         }
+        for (const Damage& damage : DamagesOf(FirstRecordGoes(kNodeSize).Leaf(leaf))) {
+            ExpectAlike(leaf, 1, damage);
+        }
+        ASSERT_FALSE(HasFatalFailure());
     }
 }
 

@@ -79,6 +79,27 @@ TEST_F(ShortWay, ASeparatorThatIsTooLongIsRefused) {
     ExpectAsPlainly(&bench, u"b", kErrCorrupt);
 }
 
+// What InsertTree is asked for by somebody else is looked at, also in a tree nobody else touched.
+TEST_F(ShortWay, APathByHandIsLookedAt) {
+    Bench bench(Blocks(512));
+    bench.Create(9, CompareCatKeysCaseIns);
+    for (const char16_t* name : {u"a", u"b", u"d"}) {
+        ASSERT_EQ(Insert(&bench, name, 20), kOk);
+    }
+    const HostKey key = HostCatKey(5, u"c");
+    bool found = true;
+    ASSERT_EQ(bench->FindEntry(key, key.id, nullptr, &found, nullptr, nullptr, nullptr, nullptr),
+              kOk);
+    ASSERT_FALSE(found);
+    const HfsFindLevel place = bench->findData.path[1];
+    ASSERT_TRUE(bench->isAllOwn);
+    EXPECT_EQ(bench->InsertTree(key, Pattern(20, 1).data(), 20, place.node, place.index, 1, false,
+                                nullptr, &bench->convert),
+              kOk);
+    EXPECT_FALSE(bench->isAllOwn);
+    bench->findData.ClearPath();
+}
+
 // A leaf that has no room is not asked a second time when that could say nothing new.
 TEST_F(ShortWay, AKeyThatIsTooLongIsSaidToBeSoAsOften) {
     Events said[2];

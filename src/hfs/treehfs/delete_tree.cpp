@@ -61,7 +61,7 @@ int ReplaceParentKey(CBTreeHfs* tree, HfsFindData* path, HfsNode* node, int leve
     u32 child = 0;
     HFS_TRY(ChildOf(tree, parent, index, &child), 9263);
     HFS_ASSERT(child == node->nodeNum, 4960);
-    if (child != node->nodeNum || !ReplacePlainSeparator(tree, path, level + 1, node)) {
+    if (!ReplacePlainSeparator(tree, path, level + 1, node)) {
         HFS_TRY(tree->_DeleteRecord(parent, index), 4964);
         const BTreeKey* key = nullptr;
         HFS_TRY(FirstKey(tree, node, &key), 4970);

@@ -178,20 +178,18 @@ bool PathStillLeads(const CBTreeHfs* tree) {
 }
 
 // When the leaf beside that of the tree's own path is the last one, below the same parent, and the
-// key lies in it: moves the path there.
+// key lies in it: moves the path there. REQUIRES: PathStillLeads, so that a hint leads where its
+// record does.
 bool FindOnLastLeaf(CBTreeHfs* tree, const SoughtKey& key, SearchResult* result) {
     const BTHeaderMem& header = tree->header;
     HfsFindLevel& leaf = tree->findData.path[1];
     HfsFindLevel& parent = tree->findData.path[2];
-    if (header.treeDepth < 2 || FLink(leaf.node) != header.lastLeafNode || parent.index < 0) {
+    if (header.treeDepth < 2 || FLink(leaf.node) != header.lastLeafNode) {
         return false;
     }
     const u32 index = static_cast<u32>(parent.index) + 1;
     HfsNode* last = WayDown(tree, parent.node, index).node;
-    if (last == nullptr || last->nodeNum != header.lastLeafNode ||
-        PlainChild(&header, parent.node, static_cast<s32>(index)) != last->nodeNum ||
-        Height(last) != 1 || !IsLeaf(last) || last->refCount > 2 ||
-        !SearchInside(tree, last, key, result)) {
+    if (last == nullptr || last->refCount > 2 || !SearchInside(tree, last, key, result)) {
         return false;
     }
     leaf.node->refCount -= 1;

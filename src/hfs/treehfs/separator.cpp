@@ -21,8 +21,7 @@ bool NodesOverlap(const CBTreeHfs* tree) {
 
 // The first record of a node in one block, if its key can become that of a separator as it is.
 bool FindFirst(const BTHeaderMem* hdr, const HfsNode* node, PlainRecord* first) {
-    const u32 count = NumRecords(node);
-    return count != 0 && TableFits(*hdr, count) &&
+    return NumRecords(node) != 0 &&
            PlainRecords<OneBlock, AnyShape>(hdr, node, AnyShape(0, 0)).Find(0, first) &&
            PaddedKeySize(first->keySize - kKeyLengthSize) == first->keySize &&
            GetKeyLength(hdr, KeyOf(*first), false) + kKeyLengthSize == first->keySize;
