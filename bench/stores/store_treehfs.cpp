@@ -5,9 +5,11 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <vector>
 
 #include "hfs/treehfs.h"
 #include "hfs/volume/convert.h"
+#include "platform/heap.h"
 #include "store.h"
 
 namespace bench {
@@ -19,6 +21,7 @@ using namespace VELK;
 constexpr u32 kNodeSize = 4096;
 constexpr u32 kNodeShift = 12;
 constexpr u64 kBytesPerRecord = 400;  // that the tree file takes, about
+constexpr u64 kHeapPerRecord = 16;    // that its cached nodes take besides, about
 constexpr u64 kAddressSpace = u64{8} << 30;
 
 // The tree file; grows within address space that was set aside.
@@ -81,6 +84,22 @@ private:
     u8* bytes_;
 };
 
+// Lets the heap touch `bytes` now, as the volume did.
+void SupplyHeap(u64 bytes) {
+    constexpr u64 kBlock = 4096;
+    std::vector<void*> blocks;
+    for (u64 at = 0; at < bytes; at += kBlock) {
+        blocks.push_back(velk_heap_alloc(kBlock));
+        if (blocks.back() == nullptr) {
+            std::abort();
+        }
+        std::memset(blocks.back(), 0, kBlock);
+    }
+    for (void* block : blocks) {
+        velk_heap_free(block);
+    }
+}
+
 class TreehfsStore : public Store {
 public:
     TreehfsStore(const Workload& load, u32 mapBlock)
@@ -92,6 +111,7 @@ public:
         tree_.header.attributes = kBTBigKeysMask | kBTVariableIndexKeysMask;
         tree_.keyCompareType = kKeyCompareFolding;
         tree_.convert.KeyToDisk = ConvertFor(kCatalogFileId).KeyToDisk;
+        SupplyHeap(kHeapPerRecord * load.count);
         const unsigned long long size = 4u << 20;
         if (tree_.Create(kNodeShift, 0, &size) != kOk) {
             std::abort();

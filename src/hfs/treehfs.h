@@ -426,6 +426,15 @@ public:
     bool isDirty = false;          // header or map changed since the last flush
     u64 pathVersion = 1;  // raised when records move so that a stored path may no longer lead right
     HfsNode* rootHint = nullptr;  // the root when that is cached and was met; else null
+    rb_node* lastLink = nullptr;  // of the cached node with the greatest number; null: none is
+    // Cached nodes that were requested by number lately, each where its number leads; or null.
+    static constexpr u32 kLateShift = 5;
+    HfsNode* lateNodes[1u << kLateShift] = {};
+    // The node behind the initialised part of the file that was taken last: where it lies, how far
+    // from the one before, and how many bytes as far behind it have not been asked for yet.
+    std::uintptr_t newestNode = 0;
+    std::uintptr_t newDistance = 0;
+    u32 nextNodeLeft = 0;
     // Create made the tree, and since then no node was read from the volume and no record came in
     // that searches have something to say of.
     bool isAllOwn = false;

@@ -144,6 +144,52 @@ TEST_P(CacheTest, HundredsOfRequestsInAnyOrderKeepTheBooks) {
     EXPECT_GE(bench_->maxNodeCount, bench_->nodeCount);
 }
 
+// ---- nodes that are found without the red-black tree
+
+TEST_P(CacheTest, TheLastNodeIsKnownAsNodesComeAndGo) {
+    const auto last = [this] {
+        const rb_node* link = bench_->lastLink;
+        return link != nullptr ? reinterpret_cast<const HfsNode*>(link)->nodeNum : 0;
+    };
+    EXPECT_EQ(bench_->lastLink, nullptr);
+    HfsNode* fifth = Get(5);
+    EXPECT_EQ(last(), 5u);
+    HfsNode* second = Get(2);
+    EXPECT_EQ(last(), 5u);
+    HfsNode* ninth = Get(9);
+    EXPECT_EQ(last(), 9u);
+    bench_->PutINode(second, false);
+    EXPECT_EQ(last(), 9u);
+    bench_->PutINode(ninth, false);
+    EXPECT_EQ(last(), 5u);
+    bench_->PutINode(fifth, false);
+    EXPECT_EQ(bench_->lastLink, nullptr);
+    Get(3);
+    EXPECT_EQ(last(), 3u);
+}
+
+TEST_P(CacheTest, ANodeMetAgainIsRememberedUntilItLeaves) {
+    const auto isRemembered = [this](const HfsNode* node) {
+        return std::count(std::begin(bench_->lateNodes), std::end(bench_->lateNodes), node) == 1;
+    };
+    HfsNode* node = Get(2);
+    EXPECT_FALSE(isRemembered(node));  // most nodes are requested by number once
+    EXPECT_EQ(Get(2), node);
+    EXPECT_TRUE(isRemembered(node));
+    const u32 hits = bench_->hitCount;
+    EXPECT_EQ(Get(2), node);
+    EXPECT_EQ(bench_->hitCount, hits + 1);
+    EXPECT_EQ(node->refCount, 3);
+    for (int reference = 0; reference < 3; ++reference) {
+        EXPECT_TRUE(isRemembered(node));
+        bench_->PutINode(node, false);
+    }
+    EXPECT_TRUE(LedgerHolds(*bench_.tree, 0));
+    const u32 reads = bench_->readCount;
+    Get(2);
+    EXPECT_EQ(bench_->readCount, reads + 1);
+}
+
 // ---- numbers the file does not have
 
 TEST_P(CacheTest, ANumberPastTheFileIsAssertedAndRefused) {

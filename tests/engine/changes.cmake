@@ -13,6 +13,7 @@ add_executable(change_tests
   insert_refusal_test.cpp
   insert_test.cpp
   lockstep_test.cpp
+  next_node_test.cpp
   own_change_test.cpp
   plain_change_test.cpp
   record_delete_test.cpp

@@ -6,6 +6,7 @@
 // sequence comes to the same bytes after every step.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstring>
 #include <random>
 #include <sstream>
@@ -63,6 +64,7 @@ public:
         bench_.heap.FailNone();
         bench_.faults.FailNone();
         Describe();
+        EXPECT_TRUE(ShortcutsHold(*bench_.tree));
         return out_.str();
     }
 
@@ -178,6 +180,7 @@ private:
         EachNode(bench_->nodeRoot,
                  [this](HfsNode* node) { ForgetRecords(&bench_.tree.tree, node); });
         bench_->rootHint = nullptr;
+        std::fill(std::begin(bench_->lateNodes), std::end(bench_->lateNodes), nullptr);
         bench_->isAllOwn = false;
         bench_->noneFreeBelow = 0;
         bench_->findData.leadsAsOf = 0;

@@ -76,6 +76,21 @@ bool HasDirty(const CBTreeHfs& tree, const HfsNode* node) {
     return false;
 }
 
+::testing::AssertionResult ShortcutsHold(const CBTreeHfs& tree) {
+    const std::vector<const HfsNode*> nodes = CachedNodes(tree);
+    ::testing::AssertionResult failure = ::testing::AssertionFailure();
+    const rb_node* last = nodes.empty() ? nullptr : &nodes.back()->link;
+    if (tree.lastLink != last) {
+        return failure << "the link of the last node is not that";
+    }
+    for (const HfsNode* late : tree.lateNodes) {
+        if (late != nullptr && std::count(nodes.begin(), nodes.end(), late) != 1) {
+            return failure << "a node that is remembered is not cached";
+        }
+    }
+    return ::testing::AssertionSuccess();
+}
+
 ::testing::AssertionResult LedgerHolds(const CBTreeHfs& tree, u32 references) {
     const std::vector<const HfsNode*> nodes = CachedNodes(tree);
     const std::vector<const HfsNode*> listed = ListedNodes(tree);
@@ -107,7 +122,7 @@ bool HasDirty(const CBTreeHfs& tree, const HfsNode* node) {
     if (sum != static_cast<long>(references)) {
         return failure << sum << " references counted, " << references << " known";
     }
-    return ::testing::AssertionSuccess();
+    return ShortcutsHold(tree);
 }
 
 }  // namespace VELK::test

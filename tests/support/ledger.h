@@ -14,9 +14,13 @@ u32 References(const HfsFindData& path);
 
 // Holds when every cached node is in the red-black tree once and in order, nodeCount is right, the
 // references of all cached nodes add up to `references` (all that the test knows of, those of the
-// tree's own path included), and a node is on the modified list exactly when one of its blocks is
-// dirty.
+// tree's own path included), a node is on the modified list exactly when one of its blocks is
+// dirty, and shortcuts hold.
 ::testing::AssertionResult LedgerHolds(const CBTreeHfs& tree, u32 references);
+
+// Holds when the ways to cached nodes past the red-black tree lead to nodes that are in it: the
+// last link to the one with the greatest number, late nodes to any.
+::testing::AssertionResult ShortcutsHold(const CBTreeHfs& tree);
 
 // The cached nodes in ascending order.
 std::vector<const HfsNode*> CachedNodes(const CBTreeHfs& tree);

@@ -6,6 +6,7 @@
 
 #include "hfs/treehfs/bytes.h"
 #include "hfs/treehfs/hints.h"
+#include "hfs/treehfs/next_node.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/prefetch.h"
@@ -27,8 +28,20 @@ struct Place {
     u32 readCount;
 };
 
+// Where a node with this number would be remembered. Map nodes stand at multiples of what one maps:
+// the low bits alone would put them all in one place.
+HfsNode** LateNode(CBTreeHfs* tree, u32 nodeNum) {
+    constexpr u32 kSpread = 0x85EBCA6B;
+    return &tree->lateNodes[nodeNum * kSpread >> (32 - CBTreeHfs::kLateShift)];
+}
+
+// New nodes mostly have the greatest number there is.
 Place FindPlace(CBTreeHfs* tree, u32 nodeNum) {
     Place place = {nullptr, &tree->nodeRoot, tree->nodeCount, tree->readCount};
+    if (tree->lastLink != nullptr && NodeOf(tree->lastLink)->nodeNum < nodeNum) {
+        place.parent = tree->lastLink;
+        place.link = &tree->lastLink->right;
+    }
     while (*place.link != nullptr) {
         const u32 number = NodeOf(*place.link)->nodeNum;
         if (number == nodeNum) {
@@ -71,10 +84,25 @@ Place PlaceBehind(CBTreeHfs* tree, rb_node* before) {
 void LinkAt(CBTreeHfs* tree, const Place& place, HfsNode* node) {
     node->link.Link(place.parent, place.link);
     node->link.insert_color(&tree->nodeRoot);
+    if (tree->lastLink == nullptr || place.link == &tree->lastLink->right) {
+        tree->lastLink = &node->link;
+    }
     tree->nodeCount += 1;
     if (tree->nodeCount > tree->maxNodeCount) {
         tree->maxNodeCount = tree->nodeCount;
     }
+}
+
+// Takes a linked node out of the tree of cached nodes.
+void Unlink(CBTreeHfs* tree, HfsNode* node) {
+    if (tree->lastLink == &node->link) {
+        tree->lastLink = NodeBefore(&node->link);
+    }
+    if (*LateNode(tree, node->nodeNum) == node) {
+        *LateNode(tree, node->nodeNum) = nullptr;
+    }
+    node->link.remove(&tree->nodeRoot);
+    tree->nodeCount -= 1;
 }
 
 // A node whose blocks do not make up nodeSize bytes could be read past its end: no node of such a
@@ -218,9 +246,16 @@ void LinkOnce(CBTreeHfs* tree, const Place& place, HfsNode* node) {
     }
 }
 
-// Maps a node that is not cached and links it at its place, unreferenced.
+// Maps a node that is not cached and links it at its place, with its first reference.
 int LoadNode(CBTreeHfs* tree, const Place& place, u32 nodeNum, NodeUse use, HfsNode** out) {
     const bool makeEmpty = WantsEmpty(use);
+    if (!HasWholeBlocks(tree->header)) {
+        return Fail(kErrCorrupt, kReasonNode, 2615);
+    }
+    if (nodeNum != 0 && nodeNum >= tree->header.totalNodes && !makeEmpty) {
+        AssertRequest(false);
+        return kErrCorrupt;
+    }
     HfsNode* node =
         NewNode(tree, nodeNum, use == NodeUse::kReadIndex || use == NodeUse::kEmptyIndex);
     if (node == nullptr) {
@@ -240,6 +275,7 @@ int LoadNode(CBTreeHfs* tree, const Place& place, u32 nodeNum, NodeUse use, HfsN
     Prefetch(node->bufs[0].data, 1);
     Prefetch(TailOf(tree->header, node), 1);
     if (isNew) {
+        NoteNewNode(tree, node->bufs[0].data);
         AssertRequest(makeEmpty);
         status = InitialiseNew(tree, node);
         if (status != kOk) {
@@ -249,6 +285,7 @@ int LoadNode(CBTreeHfs* tree, const Place& place, u32 nodeNum, NodeUse use, HfsN
         }
         LinkOnce(tree, place, node);
         node->modifiedLink.LinkTail(&tree->modifiedList);
+        TakeReference(node);
         *out = node;
         return kOk;
     }
@@ -260,6 +297,7 @@ int LoadNode(CBTreeHfs* tree, const Place& place, u32 nodeNum, NodeUse use, HfsN
         tree->isAllOwn = false;
         HFS_ASSERT(wasEmpty || GetBe16(TailOf(tree->header, node)) == kEmptyTail, 2671);
     }
+    TakeReference(node);
     *out = node;
     return kOk;
 }
@@ -280,16 +318,14 @@ bool RelinkNode(CBTreeHfs* tree, HfsNode* node) {
         return LinkNode(tree, node);
     }
     rb_node* before = NodeBefore(&node->link);
-    node->link.remove(&tree->nodeRoot);
-    tree->nodeCount -= 1;
+    Unlink(tree, node);
     LinkAt(tree, PlaceBehind(tree, before), node);
     return true;
 }
 
 void DiscardNode(CBTreeHfs* tree, HfsNode* node) {
     if (node->link.IsLinked()) {
-        tree->nodeCount -= 1;
-        node->link.remove(&tree->nodeRoot);
+        Unlink(tree, node);
     }
     node->modifiedLink.Unlink();
     ForgetHints(tree, node);
@@ -315,25 +351,19 @@ bool HasDirtyBlock(const BTHeaderMem* hdr, const HfsNode* node) {
 
 int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out) {
     *out = nullptr;
-    const Place place = FindPlace(tree, nodeNum);
-    HfsNode* node = NodeOf(*place.link);
-    if (node != nullptr) {
-        CountHit(tree, node);
-        if (WantsEmpty(use)) {
-            EmptyExisting(tree, node);
+    HfsNode** late = LateNode(tree, nodeNum);
+    HfsNode* node = *late;
+    if (node == nullptr || node->nodeNum != nodeNum) {
+        const Place place = FindPlace(tree, nodeNum);
+        if (*place.link == nullptr) {
+            return LoadNode(tree, place, nodeNum, use, out);
         }
-    } else {
-        if (!HasWholeBlocks(tree->header)) {
-            return Fail(kErrCorrupt, kReasonNode, 2615);
-        }
-        if (nodeNum != 0 && nodeNum >= tree->header.totalNodes && !WantsEmpty(use)) {
-            AssertRequest(false);
-            return kErrCorrupt;
-        }
-        const int status = LoadNode(tree, place, nodeNum, use, &node);
-        if (status != kOk) {
-            return status;
-        }
+        node = NodeOf(*place.link);
+        *late = node;
+    }
+    CountHit(tree, node);
+    if (WantsEmpty(use)) {
+        EmptyExisting(tree, node);
     }
     TakeReference(node);
     *out = node;

@@ -3,6 +3,7 @@
 // start at any level.
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/key_shape.h"
+#include "hfs/treehfs/next_node.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
 #include "hfs/treehfs/own_change.h"
@@ -121,6 +122,7 @@ int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, 
         return Fail(kErrCorrupt, kReasonTree, 9254);
     }
 
+    PrefetchNextNode(this);
     OwnChange change(this);
     // At index 0 the leaf's first key changes, and with it the separator in the parent.
     bool inserted = false;
