@@ -6,6 +6,7 @@
 #include "hfs/volume/convert.h"
 #include "hfs/volume/make_volume.h"
 #include "hfs/volume/wire.h"
+#include "ledger.h"
 #include "small_volume.h"
 
 namespace VELK {
@@ -473,6 +474,43 @@ TEST_F(CommitTest, RandomLookupsStayWithinTheCacheBudget) {
     EXPECT_GT(whole, 8 * kBudget);
     EXPECT_GT(most, kBudget / 2);
     EXPECT_LT(most, kBudget + 16 * 1024);
+}
+
+// Whether the budget leaves room for them decides what becomes of index nodes.
+TEST_F(CommitTest, TrimCacheKeepsIndexNodesThatLeaveRoomForLeaves) {
+    constexpr u32 kRecords = 6000;
+    Make(4 << 20, test::SmallTrees());
+    for (u32 i = 0; i < kRecords; ++i) {
+        ASSERT_EQ(0, Insert(100 + i));
+    }
+    ASSERT_EQ(0, volume_->Commit(0));
+    for (const u64 budget : {u64{16} << 10, u64{256} << 10}) {
+        ReopenWithBudget(budget);
+        u32 trims = 0;
+        std::size_t fewestIndexNodes = kRecords;
+        std::size_t mostLeaves = 0;
+        for (u32 i = 0; i < kRecords; ++i) {
+            ASSERT_TRUE(Has(100 + i * 37 % kRecords));
+            const u64 before = volume_->CachedBytes();
+            volume_->TrimCache();
+            if (volume_->CachedBytes() < before) {
+                std::size_t leaves = 0;
+                for (const HfsNode* node : test::CachedNodes(*Catalog())) {
+                    leaves += node->bufs[0].data[kDescHeight] == 1 ? 1 : 0;
+                }
+                mostLeaves = std::max(mostLeaves, leaves);
+                fewestIndexNodes = std::min(fewestIndexNodes, Catalog()->nodeCount - leaves);
+                trims += 1;
+            }
+        }
+        EXPECT_GT(trims, 5u);
+        EXPECT_LE(mostLeaves, 1u);  // the one that the tree's own path holds
+        if (budget > 65536) {
+            EXPECT_GT(fewestIndexNodes, 40u);
+        } else {
+            EXPECT_LT(fewestIndexNodes, 5u);
+        }
+    }
 }
 
 }  // namespace

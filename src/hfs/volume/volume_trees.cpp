@@ -72,14 +72,29 @@ rb_node* NextOf(rb_node* node) {
     return parent;
 }
 
-// Drops the clean nodes nobody holds. Taking a node up and releasing it in full is the engine's own
-// way of letting go of one.
-void DropIdleNodes(CBTreeHfs* tree) {
+enum class Idle { kLeaves, kAll };
+
+bool IsIdle(const HfsNode* node) {
+    return node->refCount <= 0 && node->modifiedLink.next == &node->modifiedLink;
+}
+
+bool IsLeaf(const HfsNode* node) {
+    return static_cast<s8>(node->bufs[0].data[kDescKind]) == kBTLeafNode;
+}
+
+// Drops such nodes and tells how many idle ones remain. Taking a node up and releasing it in full
+// is the engine's own way of letting go of one.
+u32 DropNodes(CBTreeHfs* tree, Idle which) {
     std::vector<u32> numbers;
+    u32 kept = 0;
     for (rb_node* link = FirstOf(tree->nodeRoot); link != nullptr; link = NextOf(link)) {
         const HfsNode* node = NodeOfLink(link);
-        if (node->refCount <= 0 && node->modifiedLink.next == &node->modifiedLink) {
-            numbers.push_back(node->nodeNum);
+        if (IsIdle(node)) {
+            if (which == Idle::kAll || IsLeaf(node)) {
+                numbers.push_back(node->nodeNum);
+            } else {
+                kept += 1;
+            }
         }
     }
     for (const u32 number : numbers) {
@@ -88,6 +103,18 @@ void DropIdleNodes(CBTreeHfs* tree) {
             tree->PutINode(node, false);
         }
     }
+    return kept;
+}
+
+// The same for all open trees; tells the bytes of the idle nodes that remain.
+u64 DropNodes(std::array<TreeSlot, kTreeCount>* trees, Idle which) {
+    u64 kept = 0;
+    for (TreeSlot& slot : *trees) {
+        if (slot.isOpen) {
+            kept += u64{DropNodes(slot.Get(), which)} * slot.Get()->header.nodeSize;
+        }
+    }
+    return kept;
 }
 
 }  // namespace
@@ -287,18 +314,19 @@ u64 ImageVolume::CachedBytes() const {
     return bytes;
 }
 
-// What could not be dropped last time (nodes that are modified or held) does not count, or a long
-// run of changes would look through it again and again.
+// Index nodes are few, and nearly every lookup meets them again: they stay as long as they leave
+// room for leaves. What could not be dropped last time (nodes that are modified or held) does not
+// count, or a long run of changes would look through it again and again.
 void ImageVolume::TrimCache() {
-    if (CachedBytes() < state_->trimFloor + state_->options.cacheBudget) {
+    const u64 budget = state_->options.cacheBudget;
+    if (CachedBytes() < state_->trimFloor + budget) {
         return;
     }
-    for (TreeSlot& slot : state_->trees) {
-        if (slot.isOpen) {
-            DropIdleNodes(slot.Get());
-        }
+    u64 kept = DropNodes(&state_->trees, Idle::kLeaves);
+    if (kept > budget / 2) {
+        kept = DropNodes(&state_->trees, Idle::kAll);
     }
-    state_->trimFloor = CachedBytes();
+    state_->trimFloor = CachedBytes() - kept;
 }
 
 }  // namespace VELK
