@@ -159,6 +159,15 @@ int FreeEmptyNode(CBTreeHfs* tree, HfsNode* node) {
     return kOk;
 }
 
+// A record that is the first of its leaf takes a separator or the whole leaf along: what that
+// changes, in the tree of cached nodes and beside the leaf, is asked for before the deletion.
+void PrefetchForFirst(const CBTreeHfs* tree, const HfsFindLevel& entry) {
+    if (entry.node != nullptr && entry.index == 0) {
+        PrefetchForStep(tree, entry.node, Side::kRight);
+        PrefetchForStep(tree, entry.node, Side::kLeft);
+    }
+}
+
 // Makes sure there are nodes for separators that grow. Looks at the total of nodes, not at the
 // free ones as insertion does, on purpose.
 int ReserveForDeletion(CBTreeHfs* tree) {
@@ -217,6 +226,7 @@ int CBTreeHfs::DeleteRecord(const void* key, unsigned keyLength, bool usePath) {
     } else if (!findData.valid) {
         return Fail(kErrInvalid, kReasonInvalid, 5132);
     }
+    PrefetchForFirst(this, findData.path[1]);
     if (!StandsOnLeaf(&findData, 0) || !CanDeleteAt(this, &findData, 1)) {
         return Fail(kErrInvalid, kReasonInvalid, 9268);
     }

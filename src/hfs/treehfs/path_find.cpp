@@ -113,7 +113,7 @@ int SearchIndex(CBTreeHfs* tree, const SoughtKey& key, HfsFindLevel* entry, bool
 
 // Goes from the root to a leaf and searches each node on the way. `*found` tells of the node
 // searched last.
-int Descend(CBTreeHfs* tree, const SoughtKey& key, HfsFindData* path, bool* found,
+int Descend(CBTreeHfs* tree, const SoughtKey& key, LeafUse use, HfsFindData* path, bool* found,
             SearchResult* result) {
     u32 nodeNum = tree->header.rootNode;
     int level = tree->header.treeDepth;
@@ -121,6 +121,9 @@ int Descend(CBTreeHfs* tree, const SoughtKey& key, HfsFindData* path, bool* foun
     for (;;) {
         if (HFS_UNLIKELY(nodeNum == 0)) {
             return BadTree(2980);
+        }
+        if (level == 1) {
+            PrefetchLeaf(tree->header, way.data, use);
         }
         int status = CheckLevel(level);
         if (status == kOk) {
@@ -169,7 +172,7 @@ bool PathStillLeads(const CBTreeHfs* tree) {
     return path.path[depth].node->nodeNum == tree->header.rootNode;
 }
 
-// Who asks for a place and no record goes on from there, with a walk or with a change.
+// What a walk or a change from that place on meets first.
 [[gnu::always_inline]] inline void PrefetchFrom(const BTHeaderMem& header, const HfsNode* leaf,
                                                 u32 index) {
     PrefetchRecords(&header, leaf, NodeBytes(&header, leaf).U16(SlotOffset(&header, index)));
@@ -258,6 +261,8 @@ int CBTreeHfs::FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, 
     if (header.treeDepth == 0) {
         return kOk;
     }
+    // Who asks for a place and no record goes on from there, with a walk or with a change.
+    const bool isPlace = record == nullptr && keyOut == nullptr;
     SoughtKey searchKey(this, key, keyArg);
     SearchResult result;
     if (path == &findData && FindByOwnPath(this, searchKey, &result)) {
@@ -268,18 +273,19 @@ int CBTreeHfs::FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, 
         path->ClearPath();
         path->searchCount += 1;
         path->valid = true;
-        const int status = Descend(this, searchKey, path, found, &result);
+        const LeafUse use = isPlace ? LeafUse::kChange : LeafUse::kLookup;
+        const int status = Descend(this, searchKey, use, path, found, &result);
         if (HFS_UNLIKELY(status != kOk)) {
             return status;
         }
         path->leadsAsOf = pathVersion;
-        if (record == nullptr && keyOut == nullptr) {
+        if (isPlace) {
             PrefetchFrom(header, path->path[1].node, static_cast<u32>(result.index));
         }
     }
     path->level = 1;
     path->path[1].index = result.index;
-    if (!result.found || (record == nullptr && keyOut == nullptr)) {
+    if (!result.found || isPlace) {
         return kOk;
     }
     const HfsNode* leaf = path->path[1].node;

@@ -66,7 +66,7 @@ void PrefetchForStep(const CBTreeHfs* tree, HfsNode* node, Side side) {
         __builtin_prefetch(way.node);
         __builtin_prefetch(&way.node->bufs[0]);
         __builtin_prefetch(way.data);
-        PrefetchTail(tree->header, way.data);
+        PrefetchTail(tree->header, way.data, 1);
     }
 }
 

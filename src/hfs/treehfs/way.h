@@ -47,8 +47,9 @@ inline void TakeHinted(CBTreeHfs* tree, const HintedWay& way, NodeUse use, HfsNo
     __builtin_prefetch(way.data);
     if (use == NodeUse::kReadIndex) {
         PrefetchHints(tree, way.node);
+        PrefetchTail(tree->header, way.data, 2);
     } else {
-        PrefetchTail(tree->header, way.data);
+        PrefetchTail(tree->header, way.data, 1);
     }
     TakeCached(tree, way.node, out);
 }
