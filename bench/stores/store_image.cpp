@@ -1,4 +1,5 @@
-// The tree engine over a volume in an image file, as a program that mounts it finds it.
+// The tree engine over a volume in an image file, as a program finds it that mounts it and tells it
+// to keep little.
 #include <cstdio>
 #include <cstdlib>
 

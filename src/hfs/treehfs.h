@@ -427,11 +427,12 @@ public:
     u64 pathVersion = 1;  // raised when records move so that a stored path may no longer lead right
     HfsNode* rootHint = nullptr;  // the root when that is cached and was met; else null
     rb_node* lastLink = nullptr;  // of the cached node with the greatest number; null: none is
-    // Cached nodes that were requested by number lately, each where its number leads; or null.
+    // Cached nodes that were met again by their numbers, each where its number leads; or null.
     static constexpr u32 kLateShift = 5;
     HfsNode* lateNodes[1u << kLateShift] = {};
     // The node behind the initialised part of the file that was taken last: where it lies, how far
-    // from the one before, and how many bytes as far behind it have not been asked for yet.
+    // from the one before, and how many bytes of what lies as far behind it are still to be asked
+    // for.
     std::uintptr_t newestNode = 0;
     std::uintptr_t newDistance = 0;
     u32 nextNodeLeft = 0;

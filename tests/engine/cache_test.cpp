@@ -536,6 +536,43 @@ TEST_P(CacheTest, ANodeThatLeftMeanwhileIsNotLinkedTo) {
     EXPECT_TRUE(LedgerHolds(*bench_.tree, 2));
 }
 
+// The place behind the last node is no longer that, or no longer behind the last one.
+TEST_P(CacheTest, TheLastNodeMayChangeMeanwhile) {
+    using Numbers = std::vector<u32>;
+    struct Change {
+        bool drops;
+        u32 gets;
+        Numbers left;
+    };
+    for (const Change& change :
+         {Change{true, 1, {1, 5}}, Change{false, 7, {3, 5, 7}}, Change{false, 4, {3, 4, 5}}}) {
+        HfsNode* third = Get(3);
+        HfsNode* inner = nullptr;
+        HfsNode* outer = nullptr;
+        {
+            ReentrantVolume volume(&bench_, [&](CBTreeHfs* tree) {
+                if (change.drops) {
+                    tree->PutINode(third, false);
+                }
+                tree->GetINode(change.gets, &inner, false);
+            });
+            outer = Get(5);
+        }
+        Numbers numbers;
+        for (const HfsNode* node : CachedNodes(*bench_.tree)) {
+            numbers.push_back(node->nodeNum);
+        }
+        EXPECT_EQ(numbers, change.left);
+        EXPECT_TRUE(LedgerHolds(*bench_.tree, static_cast<u32>(numbers.size())));
+        for (HfsNode* node : {inner, outer, change.drops ? nullptr : third}) {
+            if (node != nullptr) {
+                bench_->PutINode(node, false);
+            }
+        }
+        bench_.capture.Take();
+    }
+}
+
 INSTANTIATE_GEOMETRIES(CacheTest, FewGeometries);
 
 }  // namespace

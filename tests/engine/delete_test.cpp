@@ -3,7 +3,7 @@
 #include <memory>
 #include <utility>
 
-#include "geometry.h"
+#include "hfs/treehfs/cache.h"
 #include "node_bench.h"
 #include "tree_test.h"
 
@@ -570,9 +570,9 @@ TEST(DeleteGrowth, FileWithFewerNodesThanLevelsGrowsFirst) {
 // Nodes that lost their place in the cache to another of the same number stay out.
 class DeleteRekey : public DeleteAtPath {
 protected:
+    ~DeleteRekey() override { EXPECT_TRUE(ShortcutsHold(Tree())); }
     void Displace(HfsNode* node) {
-        node->link.remove(&Tree().nodeRoot);
-        Tree().nodeCount -= 1;
+        UnlinkNode(&Tree(), node);
         HfsNode* other = nullptr;
         ASSERT_EQ(Tree().GetINode(node->nodeNum, &other, false), kOk);
         other->refCount -= 1;

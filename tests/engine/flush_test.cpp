@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "bench.h"
+#include "hfs/treehfs/cache.h"
 
 namespace VELK::test {
 namespace {
@@ -413,9 +414,9 @@ TEST_F(FlushTest, TeardownFreesNodesWhateverTheirCounts) {
 TEST_F(FlushTest, TeardownFreesAModifiedNodeThatIsNoLongerFound) {
     HfsNode* node = Get(1);
     ASSERT_EQ(kOk, bench_->SetDirty(node, 0));
-    node->link.remove(&bench_->nodeRoot);
-    bench_->nodeCount -= 1;
+    UnlinkNode(&*bench_.tree, node);
     bench_->Dtor();
+    EXPECT_TRUE(ShortcutsHold(*bench_.tree));
     EXPECT_EQ(bench_.capture.Take(), Events{Asserted(2380)});
     EXPECT_TRUE(bench_->modifiedList.IsEmpty());
     EXPECT_EQ(bench_.volume.Lent(), 0u);

@@ -1,6 +1,6 @@
 // What nodes and paths remember is there to be quick, and must not show: each sequence of calls is
-// played as it comes, and again with everything forgotten before each call. After every step the
-// two agree in all that can be seen: answers, reports, counters, calls of the volume in their
+// played as it comes, and again with all forgotten that can be before each call. After every step
+// the two agree in all that can be seen: answers, reports, counters, calls of the volume in their
 // order, references, the tree of cached nodes, the list of modified ones, and all bytes. Nodes in
 // one block are changed at once where those in several go piece by piece: played on both, a
 // sequence comes to the same bytes after every step.

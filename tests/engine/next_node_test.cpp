@@ -79,15 +79,18 @@ TEST_P(NextNode, MayLieWhereNothingIs) {
 }
 
 TEST_P(NextNode, IsAskedForByEachInsertion) {
-    for (const char16_t unit : {u'a', u'b', u'c'}) {
+    const auto insert = [this](char16_t unit) {
         const HostKey key = HostCatKey(5, std::u16string(1, unit));
-        bench_->nextNodeLeft = 4096;
-        ASSERT_EQ(bench_->InsertRecord(key, key.id, Pattern(200, unit).data(), 200), kOk);
-    }
+        return bench_->InsertRecord(key, key.id, Pattern(200, unit).data(), 200);
+    };
+    ASSERT_EQ(insert(u'a'), kOk);  // makes its leaf
+    bench_->nextNodeLeft = 4096;
+    ASSERT_EQ(insert(u'b'), kOk);
     EXPECT_EQ(Left(), 4096 - kShare);
-    const HostKey again = HostCatKey(5, u"A");
-    EXPECT_EQ(bench_->InsertRecord(again, again.id, Pattern(200, 1).data(), 200), kErrExists);
-    EXPECT_EQ(Left(), 4096 - kShare);
+    ASSERT_EQ(insert(u'c'), kOk);
+    EXPECT_EQ(Left(), 4096 - 2 * kShare);
+    EXPECT_EQ(insert(u'A'), kErrExists);
+    EXPECT_EQ(Left(), 4096 - 2 * kShare);
     bench_->findData.ClearPath();
     EXPECT_EQ(bench_->Clear(), kOk);
 }

@@ -5,6 +5,7 @@
 
 #include "bench.h"
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/separator.h"
 #include "node_bench.h"
 
 namespace VELK::test {
@@ -166,6 +167,20 @@ public:
         return outcome;
     }
 
+    // Whether the root takes the first key of a leaf at once that a damaged volume lent in the same
+    // memory.
+    bool ReplacesInOneMemory() {
+        StandOn(1);
+        HfsNode* leaf = bench_->findData.path[1].node;
+        HfsNode* root = bench_->findData.path[2].node;
+        EXPECT_EQ(bench_->SetDirty(root, 0, kNodeSize), kOk);
+        u8* const own = leaf->bufs[0].data;
+        leaf->bufs[0].data = root->bufs[0].data;
+        const bool replaces = ReplacePlainSeparator(&*bench_.tree, &bench_->findData, 2, leaf);
+        leaf->bufs[0].data = own;
+        return replaces;
+    }
+
 private:
     static HostKey Key(u32 n) {
         return HostCatKey(5, std::u16string(1 + n % 7, static_cast<char16_t>(0x4E00 + n)));
@@ -217,6 +232,13 @@ TEST(PlainSeparator, ComesToWhatTheLongWayDoes) {
         }
         ASSERT_FALSE(HasFatalFailure());
     }
+}
+
+TEST(PlainSeparator, IsNotExchangedInTheMemoryItComesFrom) {
+    FirstRecordGoes tree(kNodeSize);
+    const Bytes before = tree.Root();
+    EXPECT_FALSE(tree.ReplacesInOneMemory());
+    EXPECT_EQ(tree.Root(), before);
 }
 
 }  // namespace

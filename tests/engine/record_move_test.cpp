@@ -182,5 +182,39 @@ TEST_F(MoveRemembered, GoesRightWithTheRecords) {
               (std::vector<u64>{104, 105, 106, 200, 201, 202, 203, 204, 205, 206, 0, 0}));
 }
 
+// Two nodes that a damaged volume gives the same bytes: what one gains the other does, too.
+TEST(MoveRecordsOfOneMemory, GoOneByOneInOneBlockAndInMany) {
+    struct Outcome {
+        int status;
+        Events events;
+        Bytes bytes;
+        bool operator==(const Outcome&) const = default;
+    };
+    const auto play = [](const Geometry& geometry, bool toTheLeft) {
+        Pair pair(geometry, 7, 3);
+        CBTreeHfs& tree = pair.bench.tree;
+        HfsNode* giver = pair.giver->Get();
+        HfsNode* receiver = pair.receiver->Get();
+        HfsBcbBuf own[8];
+        for (u32 i = 0; i < geometry.Blocks(); ++i) {
+            own[i] = receiver->bufs[i];
+            receiver->bufs[i].data = giver->bufs[i].data;
+        }
+        EXPECT_EQ(tree.SetDirty(giver, 0, geometry.nodeSize), kOk);
+        EXPECT_EQ(tree.SetDirty(receiver, 0, geometry.nodeSize), kOk);
+        const int status = toTheLeft ? MoveRecordsLeft(&tree, receiver, giver, 2)
+                                     : MoveRecordsRight(&tree, receiver, giver, 2);
+        for (u32 i = 0; i < geometry.Blocks(); ++i) {
+            receiver->bufs[i].data = own[i].data;
+        }
+        return Outcome{status, pair.bench.capture.Take(), pair.giver->Content()};
+    };
+    for (const bool toTheLeft : {true, false}) {
+        const Outcome oneBlock = play({1024, 1024}, toTheLeft);
+        EXPECT_EQ(oneBlock, play({1024, 512}, toTheLeft)) << toTheLeft;
+        EXPECT_NE(oneBlock.bytes, UsedLeaf(1024, 7, 3));
+    }
+}
+
 }  // namespace
 }  // namespace VELK::test

@@ -302,5 +302,36 @@ TEST_F(ShortWay, ALeafRecordThatMovedIntoThreeBlocksIsAsserted) {
     bench.capture.Take();
 }
 
+// The leaf beside that of the tree's own path, the last one, is held more often than is expected.
+TEST_F(ShortWay, ALastLeafThatManyHoldIsAsserted) {
+    Bench bench(Blocks(1024));
+    bench.Create(10, CompareCatKeysCaseIns);
+    const std::u16string names = u"abcdefghijklmnopqrst";
+    for (const char16_t name : names) {
+        ASSERT_EQ(Insert(&bench, {name}, 100), kOk);
+    }
+    const u32 last = bench->header.lastLeafNode;
+    HfsFindData holders[3];
+    for (HfsFindData& holder : holders) {
+        alignas(8) u8 record[100];
+        unsigned size = 0;
+        ASSERT_EQ(bench->SetPos(u64{last} << 10, record, sizeof record, &size, nullptr, 0, nullptr,
+                                &holder),
+                  kOk);
+    }
+    for (const char16_t name : names) {
+        ASSERT_EQ(Find(&bench, {name}, nullptr).first, kOk);
+        if (FLink(bench->findData.path[1].node) == last) {
+            break;
+        }
+    }
+    ASSERT_TRUE(bench->isAllOwn);
+    ASSERT_EQ(FLink(bench->findData.path[1].node), last);
+    EXPECT_EQ(ExpectAsPlainly(&bench, u"t", kOk), Events{Asserted(2610)});
+    for (HfsFindData& holder : holders) {
+        holder.ClearPath();
+    }
+}
+
 }  // namespace
 }  // namespace VELK::test

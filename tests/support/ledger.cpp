@@ -84,8 +84,10 @@ bool HasDirty(const CBTreeHfs& tree, const HfsNode* node) {
         return failure << "the link of the last node is not that";
     }
     for (const HfsNode* late : tree.lateNodes) {
-        if (late != nullptr && std::count(nodes.begin(), nodes.end(), late) != 1) {
-            return failure << "a node that is remembered is not cached";
+        if (late != nullptr &&
+            (std::count(nodes.begin(), nodes.end(), late) != 1 ||
+             std::count(std::begin(tree.lateNodes), std::end(tree.lateNodes), late) != 1)) {
+            return failure << "a node that is remembered is not cached, or is so twice";
         }
     }
     return ::testing::AssertionSuccess();

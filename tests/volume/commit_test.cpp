@@ -476,6 +476,27 @@ TEST_F(CommitTest, RandomLookupsStayWithinTheCacheBudget) {
     EXPECT_LT(most, kBudget + 16 * 1024);
 }
 
+// What a long run of changes kept in the cache is gone with its commit.
+TEST_F(CommitTest, TheCacheBudgetHoldsAgainAfterACommit) {
+    constexpr u32 kRecords = 6000;
+    constexpr u64 kBudget = 64 << 10;
+    Make(4 << 20, test::SmallTrees());
+    ReopenWithBudget(kBudget);
+    for (u32 i = 0; i < kRecords; ++i) {
+        ASSERT_EQ(0, Insert(100 + i));
+        volume_->TrimCache();
+    }
+    EXPECT_GT(volume_->CachedBytes(), 4 * kBudget);
+    ASSERT_EQ(0, volume_->Commit(0));
+    u64 most = 0;
+    for (u32 i = 0; i < kRecords; ++i) {
+        ASSERT_TRUE(Has(100 + i * 37 % kRecords));
+        most = std::max(most, volume_->CachedBytes());
+        volume_->TrimCache();
+    }
+    EXPECT_LT(most, kBudget + 4096);
+}
+
 // Whether the budget leaves room for them decides what becomes of index nodes.
 TEST_F(CommitTest, TrimCacheKeepsIndexNodesThatLeaveRoomForLeaves) {
     constexpr u32 kRecords = 6000;
@@ -504,6 +525,7 @@ TEST_F(CommitTest, TrimCacheKeepsIndexNodesThatLeaveRoomForLeaves) {
             }
         }
         EXPECT_GT(trims, 5u);
+        EXPECT_LT(trims, kRecords / (budget > 65536 ? 100 : 6));
         EXPECT_LE(mostLeaves, 1u);  // the one that the tree's own path holds
         if (budget > 65536) {
             EXPECT_GT(fewestIndexNodes, 40u);

@@ -93,18 +93,6 @@ void LinkAt(CBTreeHfs* tree, const Place& place, HfsNode* node) {
     }
 }
 
-// Takes a linked node out of the tree of cached nodes.
-void Unlink(CBTreeHfs* tree, HfsNode* node) {
-    if (tree->lastLink == &node->link) {
-        tree->lastLink = NodeBefore(&node->link);
-    }
-    if (*LateNode(tree, node->nodeNum) == node) {
-        *LateNode(tree, node->nodeNum) = nullptr;
-    }
-    node->link.remove(&tree->nodeRoot);
-    tree->nodeCount -= 1;
-}
-
 // A node whose blocks do not make up nodeSize bytes could be read past its end: no node of such a
 // tree is ever handed out, although it opens.
 bool HasWholeBlocks(const BTHeaderMem& header) {
@@ -313,19 +301,30 @@ bool LinkNode(CBTreeHfs* tree, HfsNode* node) {
     return true;
 }
 
+void UnlinkNode(CBTreeHfs* tree, HfsNode* node) {
+    if (tree->lastLink == &node->link) {
+        tree->lastLink = NodeBefore(&node->link);
+    }
+    if (*LateNode(tree, node->nodeNum) == node) {
+        *LateNode(tree, node->nodeNum) = nullptr;
+    }
+    node->link.remove(&tree->nodeRoot);
+    tree->nodeCount -= 1;
+}
+
 bool RelinkNode(CBTreeHfs* tree, HfsNode* node) {
     if (!node->link.IsLinked()) {
         return LinkNode(tree, node);
     }
     rb_node* before = NodeBefore(&node->link);
-    Unlink(tree, node);
+    UnlinkNode(tree, node);
     LinkAt(tree, PlaceBehind(tree, before), node);
     return true;
 }
 
 void DiscardNode(CBTreeHfs* tree, HfsNode* node) {
     if (node->link.IsLinked()) {
-        Unlink(tree, node);
+        UnlinkNode(tree, node);
     }
     node->modifiedLink.Unlink();
     ForgetHints(tree, node);

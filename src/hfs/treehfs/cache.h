@@ -43,6 +43,8 @@ int FetchNode(CBTreeHfs* tree, u32 nodeNum, NodeUse use, HfsNode** out);
 
 // Links `node` into the tree of cached nodes by its number. False: the number is there already.
 bool LinkNode(CBTreeHfs* tree, HfsNode* node);
+// Takes a linked node out of it.
+void UnlinkNode(CBTreeHfs* tree, HfsNode* node);
 // Takes `node` out of the tree of cached nodes and puts it back under its number, which decides in
 // what order a volume gets blocks back in the end. False: another node stands there and this one
 // stays out.

@@ -159,12 +159,16 @@ int FreeEmptyNode(CBTreeHfs* tree, HfsNode* node) {
     return kOk;
 }
 
-// A record that is the first of its leaf takes a separator or the whole leaf along: what that
-// changes, in the tree of cached nodes and beside the leaf, is asked for before the deletion.
+// A leaf whose first record goes is linked anew in the tree of cached nodes, one whose only record
+// goes leaves its siblings: what that meets is asked for before the deletion.
 void PrefetchForFirst(const CBTreeHfs* tree, const HfsFindLevel& entry) {
-    if (entry.node != nullptr && entry.index == 0) {
-        PrefetchForStep(tree, entry.node, Side::kRight);
-        PrefetchForStep(tree, entry.node, Side::kLeft);
+    if (entry.node == nullptr || entry.index != 0) {
+        return;
+    }
+    PrefetchLinks(entry.node);
+    if (NumRecords(entry.node) == 1) {
+        PrefetchSibling(tree, entry.node, Side::kLeft);
+        PrefetchSibling(tree, entry.node, Side::kRight);
     }
 }
 

@@ -1,8 +1,8 @@
 // Asks for the memory of the node that will be taken next while records still go into others. A
 // node behind the initialised part of the file is zeroed in one go when it is taken, and all of its
 // lines are far away then. Volumes mostly lend the blocks of such nodes at equal distances: once
-// two of them did, the third is asked for at the same one, a few lines with each insertion. Where
-// that leads elsewhere the requests are in vain.
+// it is the same twice in a row, the next node is asked for there, a few lines with each insertion.
+// Where that leads elsewhere the requests are in vain.
 #pragma once
 
 #include "hfs/treehfs.h"

@@ -273,7 +273,7 @@ int CBTreeHfs::FindEntry(const BTreeKey* key, unsigned keyArg, HfsFindData* fd, 
         path->ClearPath();
         path->searchCount += 1;
         path->valid = true;
-        const LeafUse use = isPlace ? LeafUse::kChange : LeafUse::kLookup;
+        const LeafUse use = isPlace ? LeafUse::kPlace : LeafUse::kRecord;
         const int status = Descend(this, searchKey, use, path, found, &result);
         if (HFS_UNLIKELY(status != kOk)) {
             return status;

@@ -37,7 +37,8 @@ int EnterLeaf(CBTreeHfs* tree, u32 sibling, Side side, HfsFindData* path) {
     if (status == kOk) {
         HfsNode* leaf = path->path[1].node;
         PrefetchRecords(&tree->header, leaf, 0);
-        PrefetchForStep(tree, leaf, side);  // the one after
+        PrefetchLinks(leaf);
+        PrefetchSibling(tree, leaf, side);  // the one after
     }
     return status;
 }

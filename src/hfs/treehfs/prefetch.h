@@ -31,15 +31,16 @@ constexpr u32 kCacheLine = 64;  // bytes
     PrefetchNode(firstBlock, header.nodeSize - lines * kCacheLine, lines * kCacheLine);
 }
 
-// What goes on in a leaf on the way to it. A search meets keys at any place, each in a line that
-// nobody met lately and that says only then which is the next; a change moves what lies behind.
-// Asked for together they come in the time of two. In a larger leaf most of it would be in vain.
-enum class LeafUse { kLookup, kChange };
+// The lines of a leaf, on the way to it. A search meets keys at any place, each in a line that was
+// met long ago, and only then knows the next one; a walk or a change from there on meets what lies
+// behind. Asked for together, lines come in the time of two. In a larger leaf most would be in
+// vain.
+enum class LeafUse { kRecord, kPlace };
 [[gnu::always_inline]] inline void PrefetchLeaf(const BTHeaderMem& header, const u8* firstBlock,
                                                 LeafUse use) {
     constexpr u32 kLargestLeaf = 8192;
     if (firstBlock != nullptr && header.nodeSize <= kLargestLeaf) {
-        const u32 quarters = use == LeafUse::kChange ? 3 : 2;
+        const u32 quarters = use == LeafUse::kPlace ? 3 : 2;
         PrefetchNode(firstBlock, 0, header.nodeSize / 4 * quarters);
     }
 }

@@ -105,8 +105,7 @@ bool ReplacePlainSeparator(CBTreeHfs* tree, const HfsFindData* path, int level, 
     u8* const data = bytes.At(0);
     const u32 removed = slots.end - slots.start;
     const u32 size = first.keySize + kChildSize;
-    if (PaddedKeySize(GetBe16(data + slots.start)) + kChildSize != removed ||
-        slots.free - removed + size > slots.limit ||
+    if (slots.free - removed + size > slots.limit ||
         !CanMoveBehind(hdr, parent, slots, index, removed)) {
         return false;
     }

@@ -25,8 +25,8 @@ struct Separator {
 
 // Gives the separator of `child`, the record at which the path stands on `level`, the key that
 // `child` has first now, as if it were deleted and a new one inserted in its place. REQUIRES: the
-// record leads to `child`. False: nothing has changed, because there is no room, or more than this
-// node to change, or something that could be refused half-way.
+// record leads to `child`, as ChildOf says. False: nothing has changed, because there is no room,
+// or more than this node to change, or something that could be refused half-way.
 bool ReplacePlainSeparator(CBTreeHfs* tree, const HfsFindData* path, int level, HfsNode* child);
 
 // Whether `key`, still to be inserted, lay in the bytes of the newly allocated `node`. A damaged

@@ -57,10 +57,13 @@ int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out) {
     return FetchByWay(tree, WayBeside(tree, node, side), LinkOn(node, side), NodeUse::kRead, out);
 }
 
-void PrefetchForStep(const CBTreeHfs* tree, HfsNode* node, Side side) {
+void PrefetchLinks(const HfsNode* node) {
     __builtin_prefetch(node->link.Parent());
     __builtin_prefetch(node->link.left);
     __builtin_prefetch(node->link.right);
+}
+
+void PrefetchSibling(const CBTreeHfs* tree, HfsNode* node, Side side) {
     const HintedWay way = WayBeside(tree, node, side);
     if (way.node != nullptr) {
         __builtin_prefetch(way.node);

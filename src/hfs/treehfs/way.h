@@ -41,7 +41,7 @@ HintedWay WayBeside(const CBTreeHfs* tree, HfsNode* node, Side side);
 }
 
 // A request met by a hint. What will be needed is asked for all at once, as each may be cold: the
-// node's block entries, its descriptor, and its offset table or its hints.
+// node's block entries, its descriptor, its offset table, and its hints.
 inline void TakeHinted(CBTreeHfs* tree, const HintedWay& way, NodeUse use, HfsNode** out) {
     __builtin_prefetch(&way.node->bufs[0]);
     __builtin_prefetch(way.data);
@@ -69,8 +69,9 @@ inline int FetchByWay(CBTreeHfs* tree, const HintedWay& way, u32 nodeNum, NodeUs
 }
 // Requests the node that `node` links to on one side. REQUIRES: there is such a link.
 int FetchSibling(CBTreeHfs* tree, HfsNode* node, Side side, HfsNode** out);
-// Asks for the memory of the neighbour of `node`, if a hint leads there, and for what the removal
-// of `node` from the tree of cached nodes will meet first.
-void PrefetchForStep(const CBTreeHfs* tree, HfsNode* node, Side side);
+// Asks for what the removal of `node` from the tree of cached nodes will meet first.
+void PrefetchLinks(const HfsNode* node);
+// Asks for the memory of the neighbour of `node`, if a hint leads there.
+void PrefetchSibling(const CBTreeHfs* tree, HfsNode* node, Side side);
 
 }  // namespace VELK

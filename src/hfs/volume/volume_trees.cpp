@@ -1,5 +1,6 @@
 // The trees of a mounted volume: their forks as runs, opened on first use, their caches kept within
 // a budget.
+#include <algorithm>
 #include <cstring>
 #include <new>
 
@@ -82,11 +83,11 @@ bool IsLeaf(const HfsNode* node) {
     return static_cast<s8>(node->bufs[0].data[kDescKind]) == kBTLeafNode;
 }
 
-// Drops such nodes and tells how many idle ones remain. Taking a node up and releasing it in full
-// is the engine's own way of letting go of one.
-u32 DropNodes(CBTreeHfs* tree, Idle which) {
+// Drops such nodes and tells the bytes of the idle ones that remain. Taking a node up and releasing
+// it in full is the engine's own way of letting go of one.
+u64 DropNodes(CBTreeHfs* tree, Idle which) {
     std::vector<u32> numbers;
-    u32 kept = 0;
+    u64 kept = 0;
     for (rb_node* link = FirstOf(tree->nodeRoot); link != nullptr; link = NextOf(link)) {
         const HfsNode* node = NodeOfLink(link);
         if (IsIdle(node)) {
@@ -103,15 +104,15 @@ u32 DropNodes(CBTreeHfs* tree, Idle which) {
             tree->PutINode(node, false);
         }
     }
-    return kept;
+    return tree->nodeCount != 0 ? tree->GetMemSize(false) / tree->nodeCount * kept : 0;
 }
 
-// The same for all open trees; tells the bytes of the idle nodes that remain.
+// The same for all open trees.
 u64 DropNodes(std::array<TreeSlot, kTreeCount>* trees, Idle which) {
     u64 kept = 0;
     for (TreeSlot& slot : *trees) {
         if (slot.isOpen) {
-            kept += u64{DropNodes(slot.Get(), which)} * slot.Get()->header.nodeSize;
+            kept += DropNodes(slot.Get(), which);
         }
     }
     return kept;
@@ -314,12 +315,14 @@ u64 ImageVolume::CachedBytes() const {
     return bytes;
 }
 
-// Index nodes are few, and nearly every lookup meets them again: they stay as long as they leave
-// room for leaves. What could not be dropped last time (nodes that are modified or held) does not
-// count, or a long run of changes would look through it again and again.
+// Index nodes are few, and nearly every lookup meets them again: all but leaves stay as long as
+// they leave room for these. What could not be dropped last time (nodes that are modified or held)
+// does not count until it goes, or a long run of changes would look through it again and again.
 void ImageVolume::TrimCache() {
     const u64 budget = state_->options.cacheBudget;
-    if (CachedBytes() < state_->trimFloor + budget) {
+    const u64 cached = CachedBytes();
+    state_->trimFloor = std::min(state_->trimFloor, cached);
+    if (cached < state_->trimFloor + budget) {
         return;
     }
     u64 kept = DropNodes(&state_->trees, Idle::kLeaves);
