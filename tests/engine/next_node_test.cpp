@@ -1,6 +1,6 @@
-// The memory of the next new node is asked for once two nodes came to lie at one distance, from its
-// end to its start, some lines with each insertion. Nothing but the time tells whether it was: what
-// is looked at here is what is left to ask for.
+// The memory of the next new node is asked for once the distance between new nodes was the same
+// twice, from its end to its start, some lines with each insertion. Nothing but the time tells
+// whether it was: what is looked at here is what is left to ask for.
 #include "hfs/treehfs/next_node.h"
 
 #include <sys/mman.h>

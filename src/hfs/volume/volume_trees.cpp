@@ -83,8 +83,8 @@ bool IsLeaf(const HfsNode* node) {
     return static_cast<s8>(node->bufs[0].data[kDescKind]) == kBTLeafNode;
 }
 
-// Drops such nodes and tells the bytes of the idle ones that remain. Taking a node up and releasing
-// it in full is the engine's own way of letting go of one.
+// Drops idle nodes, which are clean and held by nobody, and tells the bytes of those that remain.
+// Taking a node up and releasing it in full is the engine's own way of letting go of one.
 u64 DropNodes(CBTreeHfs* tree, Idle which) {
     std::vector<u32> numbers;
     u64 kept = 0;
