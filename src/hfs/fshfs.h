@@ -48,7 +48,9 @@ struct HfsVolumeOps {
     // wanted: the caller overwrites all of it. All or nothing: on failure nothing is held and no
     // entry is filled. What lies at two offsets of the file is lent as two pieces of memory, also
     // when damaged extents give both the same block: a change to one node would not be announced
-    // for the other. The engine passes fork null and forkType 0: the tree file itself.
+    // for the other. The blocks of one call may lie anywhere; one behind the other in memory, they
+    // make a node that is searched and changed faster. The engine passes fork null and forkType 0:
+    // the tree file itself.
     int (*Map)(void* self, CFileSystemHfs* fs, HfsRuns* runs, HfsFork* fork, u8 forkType,
                u32 fileId, u64 byteOffset, u32 bytes, bool noRead, HfsBcbBuf* bufs);
     // Takes over the present content of a modified block for writing. Bytes changed and never

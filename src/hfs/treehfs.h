@@ -82,7 +82,7 @@ struct HfsHintTable {
     HfsHint hints[1];  // as many as there is room for
 };
 
-// A cached node. Its bytes are the blocks of `bufs` one after the other; they are not contiguous in
+// A cached node. Its bytes are the blocks of `bufs` one after the other, which may lie apart in
 // memory. Allocated with room for blocksPerNode blocks.
 struct HfsNode {
     rb_node link;            // by nodeNum; first member
@@ -92,6 +92,7 @@ struct HfsNode {
     HfsNode* hintedBy;       // the one node whose hints lead to this one; null: none
     HfsHintTable* hints;     // of an index node, in the node's own heap block; null: none
     u32 hintedAt;            // record of that hint, unless records came or left before it since
+    bool isOnePiece;         // its blocks lie one behind the other in memory
     HfsBcbBuf bufs[1];       // the blocks, in order; blocksPerNode of them
 
     // Accessors (node_access.cpp). They change nothing and return 0 or kErrCorrupt, reported with
@@ -437,8 +438,11 @@ public:
     std::uintptr_t newDistance = 0;
     u32 nextNodeLeft = 0;
     // Create made the tree, and since then no node was read from the volume and no record came in
-    // that searches have something to say of.
+    // whose key searches have something to say of.
     bool isAllOwn = false;
+    // Data of more than a block came in since Create: where it lies in three, each search that
+    // meets it has something to say.
+    bool hasLongData = false;
     // While that is so, all nodes below are in use, and the search for the first free one, still
     // from map node to map node, looks at no bits before this one's.
     u32 noneFreeBelow = 0;

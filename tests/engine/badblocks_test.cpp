@@ -26,7 +26,7 @@ TreeRecord ExtentRecord(u32 fileId, u32 startBlock, const Extents& extents,
 
 class BadBlocks : public GeometryTest {
 protected:
-    BadBlocks() : bench_(Blocks(MapBlock()), kExtentsFileId) {}
+    BadBlocks() : bench_(Blocks(GetParam()), kExtentsFileId) {}
 
     void Open(const std::vector<TreeRecord>& records, u32 recordsPerLeaf = 2) {
         TreeShape shape;

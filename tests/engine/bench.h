@@ -58,6 +58,12 @@ inline MemVolumeOptions Blocks(u32 mapBlockSize, bool hasJournal = false) {
     return options;
 }
 
+inline MemVolumeOptions Blocks(const Geometry& geometry, bool hasJournal = false) {
+    MemVolumeOptions options = Blocks(geometry.mapBlock, hasJournal);
+    options.inOnePiece = geometry.inOnePiece;
+    return options;
+}
+
 // A small tree of NthRecords: `leaves` leaves of two records each below index nodes of four.
 inline TreeImage SmallTree(u32 nodeSize, u32 leaves = 3, u32 fileId = kCatalogFileId) {
     TreeShape shape;

@@ -12,7 +12,7 @@ namespace {
 
 class CacheTest : public GeometryTest {
 protected:
-    CacheTest() : bench_(Blocks(MapBlock(), true)) { bench_.Open(SmallTree(NodeSize())); }
+    CacheTest() : bench_(Blocks(GetParam(), true)) { bench_.Open(SmallTree(NodeSize())); }
 
     HfsNode* Get(u32 nodeNum, bool makeEmpty = false) {
         HfsNode* node = nullptr;
@@ -249,7 +249,7 @@ TEST_P(CacheTest, EachBlockOfANewNodeIsOpenedJournalledAndClosedInTurn) {
 }
 
 TEST_P(CacheTest, ANewNodeWithoutAJournalNeedsNoAccess) {
-    Bench bench(Blocks(MapBlock()));
+    Bench bench(Blocks(GetParam()));
     bench.Open(SmallTree(NodeSize()));
     bench->validNodes = 5;
     HfsNode* node = nullptr;

@@ -32,7 +32,7 @@ class DeleteRecord : public GeometryTest {
 protected:
     void Open(const TreeImage& image) {
         tree_.reset();
-        tree_ = std::make_unique<TreeOnVolume>(image, MapBlock());
+        tree_ = std::make_unique<TreeOnVolume>(image, GetParam());
     }
     void ExpectTree(const std::vector<TreeRecord>& records) {
         EXPECT_TRUE(LedgerHolds(**tree_, References((*tree_)->findData)));

@@ -17,7 +17,7 @@ constexpr u32 kLeaf = 1;
 
 class FindDamage : public GeometryTest {
 protected:
-    FindDamage() : bench_(Blocks(MapBlock())), image_(SmallTree(NodeSize(), 9)) {}
+    FindDamage() : bench_(Blocks(GetParam())), image_(SmallTree(NodeSize(), 9)) {}
     ~FindDamage() override { path_.ClearPath(); }
 
     // Opens the damaged tree and looks its first record up.
@@ -189,7 +189,7 @@ TEST_P(FindDamage, AFreeSpaceOffsetOutsideTheNodeIsNotFollowed) {
 // Each Map of a lookup fails in turn.
 TEST_P(FindDamage, AnUnreadableNodeIsReportedAtEveryLevel) {
     for (u32 nth = 1; nth <= 3; ++nth) {
-        Bench bench(Blocks(MapBlock()));
+        Bench bench(Blocks(GetParam()));
         bench.Open(image_);
         HfsFindData path;
         const HostKey key = NthHostKey(4, 0);
@@ -209,7 +209,7 @@ TEST_P(FindDamage, AnUnreadableNodeIsReportedAtEveryLevel) {
 
 TEST_P(FindDamage, EveryAllocationFailsOnceAndNothingLeaks) {
     for (u32 nth = 1; nth <= 3; ++nth) {
-        Bench bench(Blocks(MapBlock()));
+        Bench bench(Blocks(GetParam()));
         bench.Open(image_);
         HfsFindData path;
         const HostKey key = NthHostKey(4, 0);
@@ -266,15 +266,17 @@ TEST_P(FindDamage, ARecordAtABlocksLastByteIsReadWithCare) {
 
 // A record that reaches to the node's last byte holds slots where its child would be.
 TEST_P(FindDamage, AnIndexRecordThatEndsWithItsNodeHasNoPlainChild) {
+    bench_.Open(image_);
+    const CBTreeHfs* tree = &bench_.tree.tree;
     const NodeImage image{
         .kind = kBTIndexNode, .height = 2, .records = {Record(DiskCatKey(7, u"a"), 5u)}};
     Bytes bytes = image.Build(NodeSize());
-    const LooseNode sound(bytes, MapBlock(), 3);
-    EXPECT_EQ(PlainChild(sound.Hdr(), sound.Get(), 0), 5u);
+    const LooseNode sound(bytes, MapBlock(), 3, false, GetParam().inOnePiece);
+    EXPECT_EQ(PlainChild(tree, sound.Get(), 0), 5u);
     Put16(&bytes, NodeSize() - 4, NodeSize());
     Put16(&bytes, 14, NodeSize() - 14 - 2 - kChildSize);
-    const LooseNode wide(bytes, MapBlock(), 3);
-    EXPECT_EQ(PlainChild(wide.Hdr(), wide.Get(), 0), 0u);
+    const LooseNode wide(bytes, MapBlock(), 3, false, GetParam().inOnePiece);
+    EXPECT_EQ(PlainChild(tree, wide.Get(), 0), 0u);
 }
 
 // A node that counts more records than it has room for, with a record where its links are.
@@ -286,9 +288,9 @@ TEST_P(FindDamage, LinksAreNoSlots) {
         Put16(&bytes, 0, 28);  // would be its end, and the next word its start
         Put16(&bytes, 2, 14);
         Put16(&bytes, kDescNumRecords, 0xFFFF);
-        const LooseNode node(bytes, MapBlock(), 3);
+        const LooseNode node(bytes, MapBlock(), 3, false, GetParam().inOnePiece);
         const s32 index = static_cast<s32>(NodeSize() / 2 - 2);
-        EXPECT_EQ(PlainChild(node.Hdr(), node.Get(), index), 0u);
+        EXPECT_EQ(PlainChild(&bench_.tree.tree, node.Get(), index), 0u);
         RecordView record;
         EXPECT_FALSE(ViewPlain(&bench_.tree.tree, node.Get(), static_cast<u32>(index), &record));
     }

@@ -18,7 +18,7 @@ u32 LeafOf(u32 record) {
 
 class FindTest : public GeometryTest {
 protected:
-    FindTest() : bench_(Blocks(MapBlock())) { bench_.Open(SmallTree(NodeSize(), kLeaves)); }
+    FindTest() : bench_(Blocks(GetParam())) { bench_.Open(SmallTree(NodeSize(), kLeaves)); }
     ~FindTest() override { path_.ClearPath(); }
 
     bool Find(const HostKey& key) {

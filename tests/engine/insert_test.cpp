@@ -42,7 +42,7 @@ protected:
 };
 
 TEST_P(InsertRecord, FirstRecordMakesALeafThatIsTheRoot) {
-    TreeOnVolume tree(Image(NodeSize(), 0), MapBlock());
+    TreeOnVolume tree(Image(NodeSize(), 0), GetParam());
     EXPECT_EQ(tree.InsertNth(5, 20), kOk);
     EXPECT_EQ(tree->header.treeDepth, 1);
     EXPECT_EQ(tree->header.leafRecords, 1u);
@@ -59,7 +59,7 @@ TEST_P(InsertRecord, FirstRecordMakesALeafThatIsTheRoot) {
 }
 
 TEST_P(InsertRecord, FirstRecordGrowsAFileWithoutFreeNodes) {
-    TreeOnVolume tree(Image(NodeSize(), 0, 0, 0, 0), MapBlock());
+    TreeOnVolume tree(Image(NodeSize(), 0, 0, 0, 0), GetParam());
     EXPECT_EQ(tree.InsertNth(5, 20), kOk);
     EXPECT_EQ(tree.Volume().Count(Call::kResize), 1u);
     EXPECT_EQ(tree->header.totalNodes, 2u);
@@ -67,7 +67,7 @@ TEST_P(InsertRecord, FirstRecordGrowsAFileWithoutFreeNodes) {
 }
 
 TEST_P(InsertRecord, ExistingKeyChangesNothing) {
-    TreeOnVolume tree(Image(NodeSize(), Fit()), MapBlock());
+    TreeOnVolume tree(Image(NodeSize(), Fit()), GetParam());
     EXPECT_EQ(tree.InsertNth(2, 20), kErrExists);
     EXPECT_TRUE(ModifiedNodes(*tree).empty());
     EXPECT_FALSE(tree->isDirty);
@@ -76,7 +76,7 @@ TEST_P(InsertRecord, ExistingKeyChangesNothing) {
 }
 
 TEST_P(InsertRecord, RoomBehindTheFirstRecordTouchesTheLeafOnly) {
-    TreeOnVolume tree(Image(NodeSize(), 2 * Fit() - 2, Fit() - 1), MapBlock());
+    TreeOnVolume tree(Image(NodeSize(), 2 * Fit() - 2, Fit() - 1), GetParam());
     EXPECT_EQ(tree.InsertNth(1, kData, true), kOk);
     EXPECT_EQ(ModifiedNodes(*tree), std::vector<u32>{1});
     EXPECT_EQ(tree->header.leafRecords, 2 * Fit() - 1);
@@ -87,7 +87,7 @@ TEST_P(InsertRecord, RoomBehindTheFirstRecordTouchesTheLeafOnly) {
 }
 
 TEST_P(InsertRecord, KeyBeforeAllReplacesTheSeparatorsOfEveryLevel) {
-    TreeOnVolume tree(Image(NodeSize(), 20, 2, 3), MapBlock());
+    TreeOnVolume tree(Image(NodeSize(), 20, 2, 3), GetParam());
     EXPECT_EQ(tree.Insert(HostCatKey(1, u"first"), Pattern(8, 1)), kOk);
     EXPECT_EQ(ModifiedNodes(*tree).size(), tree->header.treeDepth);
     const FlatTree flat = tree.Flushed();
@@ -100,7 +100,7 @@ TEST_P(InsertRecord, KeyBeforeAllReplacesTheSeparatorsOfEveryLevel) {
 TEST_P(InsertRecord, RootLeafSplitsAtEveryIndex) {
     const TreeImage image = Image(NodeSize(), Fit());
     for (u32 n = 0; n <= Fit(); ++n) {
-        TreeOnVolume tree(image, MapBlock());
+        TreeOnVolume tree(image, GetParam());
         const u32 dataSize = std::min(NodeSize() / 4, 480u);
         std::vector<TreeRecord> expected;
         if (n == Fit()) {
@@ -150,7 +150,7 @@ TEST_P(InsertRecord, LeftSiblingWithRoomTakesRecordsBeforeASplit) {
     image.SetNode(3, root.Build(NodeSize()));
     image.Patch32(0, kHeadLeafRecords, Fit() + 2);
 
-    TreeOnVolume tree(image, MapBlock());
+    TreeOnVolume tree(image, GetParam());
     EXPECT_EQ(tree.InsertNth(Fit(), kData, true), kOk);
     const FlatTree flat = tree.Flushed();
     EXPECT_TRUE(IsSound(flat));
@@ -161,7 +161,7 @@ TEST_P(InsertRecord, LeftSiblingWithRoomTakesRecordsBeforeASplit) {
 }
 
 TEST_P(InsertRecord, FullLeavesSplitAndRelink) {
-    TreeOnVolume tree(Image(NodeSize(), 3 * Fit()), MapBlock());
+    TreeOnVolume tree(Image(NodeSize(), 3 * Fit()), GetParam());
     EXPECT_EQ(tree.InsertNth(Fit() + 1, kData, true), kOk);  // in the middle leaf
     const FlatTree flat = tree.Flushed();
     EXPECT_TRUE(IsSound(flat));
@@ -170,7 +170,7 @@ TEST_P(InsertRecord, FullLeavesSplitAndRelink) {
 }
 
 TEST_P(InsertRecord, SplitOfTheLastLeafMakesTheNewOneTheLast) {
-    TreeOnVolume tree(Image(NodeSize(), 3 * Fit()), MapBlock());
+    TreeOnVolume tree(Image(NodeSize(), 3 * Fit()), GetParam());
     EXPECT_EQ(tree.InsertNth(3 * Fit(), kData), kOk);
     EXPECT_EQ(tree->header.lastLeafNode, 5u);
     EXPECT_EQ(tree->header.firstLeafNode, 1u);
@@ -178,7 +178,7 @@ TEST_P(InsertRecord, SplitOfTheLastLeafMakesTheNewOneTheLast) {
 }
 
 TEST_P(InsertRecord, OddDataIsPaddedAndReadExactly) {
-    TreeOnVolume tree(Image(NodeSize(), 3), MapBlock());
+    TreeOnVolume tree(Image(NodeSize(), 3), GetParam());
     const HostKey key = HostCatKey(900, u"odd");
     const std::unique_ptr<u8[]> data(new u8[5]{1, 2, 3, 4, 5});
     EXPECT_EQ(tree->InsertRecord(key.Get(), key.id, data.get(), 5), kOk);
@@ -186,7 +186,7 @@ TEST_P(InsertRecord, OddDataIsPaddedAndReadExactly) {
 }
 
 TEST_P(InsertRecord, TooFewFreeNodesGrowTheFileFirst) {
-    TreeOnVolume tree(Image(NodeSize(), 3 * Fit(), 0, 0, 1), MapBlock());
+    TreeOnVolume tree(Image(NodeSize(), 3 * Fit(), 0, 0, 1), GetParam());
     const u32 total = tree->header.totalNodes;
     EXPECT_EQ(tree.InsertNth(0, kData, true), kOk);
     EXPECT_EQ(tree.Volume().Count(Call::kResize), 1u);
@@ -196,14 +196,14 @@ TEST_P(InsertRecord, TooFewFreeNodesGrowTheFileFirst) {
 }
 
 TEST_P(InsertRecord, EnoughFreeNodesDoNotGrowTheFile) {
-    TreeOnVolume tree(Image(NodeSize(), 3 * Fit(), 0, 0, 3), MapBlock());
+    TreeOnVolume tree(Image(NodeSize(), 3 * Fit(), 0, 0, 3), GetParam());
     EXPECT_EQ(tree.InsertNth(0, kData, true), kOk);
     EXPECT_EQ(tree.Volume().Count(Call::kResize), 0u);
     EXPECT_TRUE(IsSound(tree.Flushed()));
 }
 
 TEST_P(InsertRecord, ARecordThatFitsGrowsNoFile) {
-    TreeOnVolume tree(Image(NodeSize(), 9, 3, 0, 0), MapBlock());
+    TreeOnVolume tree(Image(NodeSize(), 9, 3, 0, 0), GetParam());
     ASSERT_EQ(tree->header.freeNodes, 0u);
     EXPECT_EQ(tree.InsertNth(4, kData, true), kOk);
     EXPECT_EQ(tree.Volume().Count(Call::kResize), 0u);
@@ -220,7 +220,7 @@ TEST_P(FullTree, InsertionBehindEveryFewRecords) {
     const TreeImage image = Image(NodeSize(), records, 0, 0, 16);
     ASSERT_GE(image.depth, 3u);
     for (u32 n = 0; n < records; n += records / 23) {
-        TreeOnVolume tree(image, MapBlock());
+        TreeOnVolume tree(image, GetParam());
         ASSERT_EQ(tree.InsertNth(n, 100, true), kOk);
         ASSERT_TRUE(LedgerHolds(*tree, References(tree->findData)));
         const FlatTree flat = tree.Flushed();
@@ -238,7 +238,7 @@ TEST_P(FullTree, BothSeparatorsAtOnce) {
     const u32 longest = NodeSize() == 512 ? 50 : 110;
     u32 indexSplits = 0;
     for (u32 length = 1; length <= longest; length += 3) {
-        TreeOnVolume tree(image, MapBlock());
+        TreeOnVolume tree(image, GetParam());
         const std::u16string name(length, u'x');
         ASSERT_EQ(tree.Insert(HostCatKey(2, name), Pattern(100, 1)), kOk);
         const FlatTree flat = tree.Flushed();

@@ -10,7 +10,7 @@ namespace {
 // The SmallTree of nine leaves: leaf n (1 .. 9) holds records 2n - 2 and 2n - 1. 22 nodes.
 class IterateDamage : public GeometryTest {
 protected:
-    IterateDamage() : bench_(Blocks(MapBlock())), image_(SmallTree(NodeSize(), 9)) {}
+    IterateDamage() : bench_(Blocks(GetParam())), image_(SmallTree(NodeSize(), 9)) {}
     ~IterateDamage() override { path_.ClearPath(); }
 
     void StandOn(u32 n) {

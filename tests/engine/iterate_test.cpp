@@ -11,7 +11,7 @@ constexpr u32 kRecords = 18;
 
 class IterateTest : public GeometryTest {
 protected:
-    IterateTest() : bench_(Blocks(MapBlock())) { bench_.Open(SmallTree(NodeSize(), 9)); }
+    IterateTest() : bench_(Blocks(GetParam())) { bench_.Open(SmallTree(NodeSize(), 9)); }
     ~IterateTest() override { path_.ClearPath(); }
 
     void StandOn(u32 n, bool between = false) {
@@ -329,7 +329,7 @@ TEST_P(IterateOutput, ASmallRecordBufferIsAssertedAndFilled) {
 }
 
 TEST_P(IterateOutput, AttributesAreCutWithoutAnAssertion) {
-    Bench bench(Blocks(MapBlock()), kAttributesFileId);
+    Bench bench(Blocks(GetParam()), kAttributesFileId);
     bench.Open(SmallTree(NodeSize(), 3, kAttributesFileId));
     HfsFindData path;
     const HostKey key = NthHostKey(8, 3);
@@ -372,7 +372,7 @@ TEST(IterateFullNodes, AllRecordsOfAllTreesInOrder) {
     for (const Geometry& geometry : AllGeometries()) {
         for (const u32 fileId : {3u, 4u, 8u}) {
             SCOPED_TRACE(::testing::Message() << geometry << " file " << fileId);
-            Bench bench(Blocks(geometry.mapBlock), fileId);
+            Bench bench(Blocks(geometry), fileId);
             TreeShape shape;
             shape.fileId = fileId;
             shape.nodeSize = geometry.nodeSize;

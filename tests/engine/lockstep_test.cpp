@@ -3,7 +3,8 @@
 // the two agree in all that can be seen: answers, reports, counters, calls of the volume in their
 // order, references, the tree of cached nodes, the list of modified ones, and all bytes. Nodes in
 // one block are changed at once where those in several go piece by piece: played on both, a
-// sequence comes to the same bytes after every step.
+// sequence comes to the same bytes after every step. So are nodes whose blocks lie one behind the
+// other: where these lie must not show in anything.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -28,6 +29,7 @@ struct Game {
     bool forgets;
     // Nothing that depends on how many blocks a node has: no faults, no data in three of them.
     bool inAnyBlocks = false;
+    bool inOnePiece = false;  // the blocks of a node lie one behind the other
 };
 
 template <typename Visit>
@@ -44,7 +46,9 @@ constexpr u32 kLeastBlock = 512;
 class Player {
 public:
     explicit Player(const Game& game)
-        : game_(game), random_(game.seed), bench_(Blocks(game.mapBlock, true)) {
+        : game_(game),
+          random_(game.seed),
+          bench_(Blocks({1u << game.nodeShift, game.mapBlock, game.inOnePiece}, true)) {
         bench_.Create(game.nodeShift, CompareCatKeysCaseIns);
     }
     ~Player() {
@@ -294,6 +298,15 @@ TEST_P(Lockstep, NodesInOneBlockAndInManyHaveTheSameBytes) {
     const u32 block = others == Others::kDamage ? 1u << (nodeShift - 1) : kLeastBlock;
     ExpectAlike({seed, nodeShift, 1u << nodeShift, others, false, true},
                 {seed, nodeShift, block, others, false, true});
+}
+
+TEST_P(Lockstep, NothingShowsOfWhereBlocksLie) {
+    constexpr std::pair<u32, u32> kShapes[] = {{10, 512}, {11, 512}, {12, 512}, {12, 2048}};
+    const u32 seed = GetParam();
+    const auto [nodeShift, mapBlock] = kShapes[seed % std::size(kShapes)];
+    const Others others = static_cast<Others>(seed / std::size(kShapes) % 3);
+    ExpectAlike({seed, nodeShift, mapBlock, others, false, false, true},
+                {seed, nodeShift, mapBlock, others, false});
 }
 
 INSTANTIATE_TEST_SUITE_P(Seeds, Lockstep, ::testing::Range(0u, 72u));

@@ -17,9 +17,10 @@ namespace VELK::test {
 
 constexpr int kRefused = 0x5A5A;
 
-// Geometries of the tests of changes: one block, two, many.
+// Geometries of the tests of changes: one block, two, many, and these in one piece.
 inline std::vector<Geometry> ChangeGeometries() {
-    return {{512, 512}, {1024, 512}, {4096, 4096}, {4096, 1024}, {4096, 512}, {8192, 4096}};
+    return {{512, 512},  {1024, 512},  {1024, 512, true}, {4096, 4096},      {4096, 1024},
+            {4096, 512}, {8192, 4096}, {4096, 512, true}, {8192, 4096, true}};
 }
 
 // Record n of the catalog tree, and one between it and the next.
@@ -53,7 +54,8 @@ public:
     ~NodeBench() { velk_heap_free(tree.scratch); }
 
     std::unique_ptr<LooseNode> Node(const Bytes& content, u32 number = 1) const {
-        return std::make_unique<LooseNode>(content, geometry_.mapBlock, number);
+        return std::make_unique<LooseNode>(content, geometry_.mapBlock, number, false,
+                                           geometry_.inOnePiece);
     }
 
     // The nth request for write access from now on is refused.

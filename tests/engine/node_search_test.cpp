@@ -102,7 +102,7 @@ TEST_P(FencedNode, ARecordThatBeginsOnABlocksLastByteIsReadWithCare) {
             EXPECT_TRUE(result.found);
             EXPECT_EQ(result.index, static_cast<s32>(odd));
             EXPECT_FALSE(ViewPlain(&bench_.tree, node_->Get(), odd, &result.record));
-            EXPECT_EQ(PlainChild(&bench_.tree.header, node_->Get(), static_cast<s32>(odd)), 0u);
+            EXPECT_EQ(PlainChild(&bench_.tree, node_->Get(), static_cast<s32>(odd)), 0u);
             EXPECT_EQ(bench_.capture.Take(), Events{});
         }
     }

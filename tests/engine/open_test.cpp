@@ -8,7 +8,7 @@ namespace {
 
 class OpenGeometry : public GeometryTest {
 protected:
-    OpenGeometry() : bench_(Blocks(MapBlock())) {}
+    OpenGeometry() : bench_(Blocks(GetParam())) {}
     Bench bench_;
 };
 

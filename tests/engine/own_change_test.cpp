@@ -136,7 +136,7 @@ std::vector<NewRecord> NewRecords() {
         {"catalogNameBehindTheKey", false, kCat, With(cat, kCatKeyNameLength, 3)},
         {"catalogKeyLongerThanAny", false, kCat, HostCatKey(7, std::u16string(258, u'x'))},
         {"dataOfOneBlock", true, kCat, cat, 512},
-        {"dataOfMore", false, kCat, cat, 514},
+        {"dataOfMore", true, kCat, cat, 514},
         {"extents", true, kExt, ext},
         {"extentsUnderAnotherId", false, kExt, OfAnother(ext)},
         {"extentsKeyThatIsShort", false, kExt, With(ext, 0, 8)},
@@ -170,6 +170,7 @@ TEST_P(NewRecordInOwnTree, EndsItUnlessItIsOrdinary) {
         EXPECT_EQ(bench->InsertRecord(record.key.Get(), record.key.id, data.data(), record.size),
                   kOk);
         EXPECT_EQ(bench->isAllOwn, record.isOrdinary) << isFirst;
+        EXPECT_EQ(bench->hasLongData, record.size > 512) << isFirst;
         bench->findData.ClearPath();
         bench.capture.Take();
     }

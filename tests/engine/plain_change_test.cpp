@@ -1,6 +1,6 @@
-// Changes done in one go, in a node of one block, against the long way that nodes of two blocks go:
-// with whatever damage to the bytes they go by, both give the same answer, say the same and leave
-// the same bytes.
+// Changes done in one go, in a node of one block or of two in one piece, against the long way that
+// nodes of two blocks go: with whatever damage to the bytes they go by, all give the same answer,
+// say the same and leave the same bytes.
 #include <memory>
 
 #include "bench.h"
@@ -14,6 +14,7 @@ namespace {
 constexpr u32 kNodeSize = 1024;
 constexpr Geometry kOneBlock = {kNodeSize, kNodeSize};
 constexpr Geometry kTwoBlocks = {kNodeSize, kNodeSize / 2};
+constexpr Geometry kOnePiece = {kNodeSize, kNodeSize / 2, true};
 
 struct Damage {
     u32 at;  // node offset
@@ -112,9 +113,12 @@ TEST(PlainInsertion, ComesToWhatTheLongWayDoes) {
         Apply(damage, &damaged);
         for (const int index : {-1, 0, 1, 2, 3, 4}) {
             for (const Form form : {Form::kDisk, Form::kHost, Form::kHookOfKeys, Form::kNoHooks}) {
-                ASSERT_EQ(Insert(kOneBlock, damaged, index, form),
-                          Insert(kTwoBlocks, damaged, index, form))
-                    << damage << ", record " << index << ", form " << static_cast<int>(form);
+                const Outcome expected = Insert(kTwoBlocks, damaged, index, form);
+                for (const Geometry& geometry : {kOneBlock, kOnePiece}) {
+                    ASSERT_EQ(Insert(geometry, damaged, index, form), expected)
+                        << damage << ", record " << index << ", form " << static_cast<int>(form)
+                        << ", " << geometry;
+                }
             }
         }
     }
@@ -125,7 +129,7 @@ constexpr u32 kKeys = 90;
 
 class FirstRecordGoes {
 public:
-    explicit FirstRecordGoes(u32 mapBlock) : bench_(Blocks(mapBlock)) {
+    explicit FirstRecordGoes(const Geometry& geometry) : bench_(Blocks(geometry)) {
         bench_.Create(10, CompareCatKeysCaseIns);
         for (u32 n = 0; n < kKeys; ++n) {
             const HostKey key = Key(n);
@@ -214,20 +218,22 @@ private:
 };
 
 void ExpectAlike(u32 leaf, int level, const Damage& damage) {
-    const Outcome quick = FirstRecordGoes(kNodeSize).Play(leaf, level, damage);
-    ASSERT_EQ(quick, FirstRecordGoes(kNodeSize / 2).Play(leaf, level, damage))
-        << damage << ", leaf " << leaf << ", level " << level;
+    const Outcome expected = FirstRecordGoes(kTwoBlocks).Play(leaf, level, damage);
+    for (const Geometry& geometry : {kOneBlock, kOnePiece}) {
+        ASSERT_EQ(FirstRecordGoes(geometry).Play(leaf, level, damage), expected)
+            << damage << ", leaf " << leaf << ", level " << level << ", " << geometry;
+    }
 }
 
 TEST(PlainSeparator, ComesToWhatTheLongWayDoes) {
-    const u32 leaves = FirstRecordGoes(kNodeSize).Leaves();
+    const u32 leaves = FirstRecordGoes(kOneBlock).Leaves();
     ASSERT_GE(leaves, 4u);
     for (u32 leaf = 0; leaf < leaves; ++leaf) {
         ExpectAlike(leaf, 2, {0, 0, 1});  // none
-        for (const Damage& damage : DamagesOf(FirstRecordGoes(kNodeSize).Root())) {
+        for (const Damage& damage : DamagesOf(FirstRecordGoes(kOneBlock).Root())) {
             ExpectAlike(leaf, 2, damage);
         }
-        for (const Damage& damage : DamagesOf(FirstRecordGoes(kNodeSize).Leaf(leaf))) {
+        for (const Damage& damage : DamagesOf(FirstRecordGoes(kOneBlock).Leaf(leaf))) {
             ExpectAlike(leaf, 1, damage);
         }
         ASSERT_FALSE(HasFatalFailure());
@@ -235,7 +241,7 @@ TEST(PlainSeparator, ComesToWhatTheLongWayDoes) {
 }
 
 TEST(PlainSeparator, IsNotExchangedInTheMemoryItComesFrom) {
-    FirstRecordGoes tree(kNodeSize);
+    FirstRecordGoes tree(kOneBlock);
     const Bytes before = tree.Root();
     EXPECT_FALSE(tree.ReplacesInOneMemory());
     EXPECT_EQ(tree.Root(), before);

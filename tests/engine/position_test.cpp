@@ -10,7 +10,7 @@ namespace {
 
 class PositionTest : public GeometryTest {
 protected:
-    PositionTest() : bench_(Blocks(MapBlock())) { bench_.Open(SmallTree(NodeSize(), 9)); }
+    PositionTest() : bench_(Blocks(GetParam())) { bench_.Open(SmallTree(NodeSize(), 9)); }
     ~PositionTest() override { path_.ClearPath(); }
 
     void StandOn(u32 n) {

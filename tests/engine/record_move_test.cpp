@@ -212,6 +212,7 @@ TEST(MoveRecordsOfOneMemory, GoOneByOneInOneBlockAndInMany) {
     for (const bool toTheLeft : {true, false}) {
         const Outcome oneBlock = play({1024, 1024}, toTheLeft);
         EXPECT_EQ(oneBlock, play({1024, 512}, toTheLeft)) << toTheLeft;
+        EXPECT_EQ(oneBlock, play({1024, 512, true}, toTheLeft)) << toTheLeft;
         EXPECT_NE(oneBlock.bytes, UsedLeaf(1024, 7, 3));
     }
 }

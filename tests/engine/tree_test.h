@@ -7,6 +7,7 @@
 
 #include "capture.h"
 #include "flat_tree.h"
+#include "geometry.h"
 #include "heap_guard.h"
 #include "keys.h"
 #include "ledger.h"
@@ -17,7 +18,9 @@ namespace VELK::test {
 class TreeOnVolume {
 public:
     TreeOnVolume(const TreeImage& image, u32 mapBlock, bool hasJournal = true)
-        : volume_(Options(mapBlock, hasJournal)) {
+        : TreeOnVolume(image, Geometry{image.shape.nodeSize, mapBlock}, hasJournal) {}
+    TreeOnVolume(const TreeImage& image, const Geometry& geometry, bool hasJournal = true)
+        : volume_(Options(geometry, hasJournal)) {
         volume_.LoadTree(image);
         volume_.fs.ForkOf(image.shape.fileId)->clumpSize = image.shape.clumpSize;
         tree_ = std::make_unique<TestTree>(&volume_, image.shape.fileId);
@@ -69,10 +72,11 @@ public:
     }
 
 private:
-    static MemVolumeOptions Options(u32 mapBlock, bool hasJournal) {
+    static MemVolumeOptions Options(const Geometry& geometry, bool hasJournal) {
         MemVolumeOptions options;
-        options.mapBlockSize = mapBlock;
-        options.allocBlockSize = mapBlock;
+        options.mapBlockSize = geometry.mapBlock;
+        options.allocBlockSize = geometry.mapBlock;
+        options.inOnePiece = geometry.inOnePiece;
         options.totalBlocks = 1u << 17;
         options.hasJournal = hasJournal;
         return options;

@@ -24,7 +24,7 @@ protected:
 
     void Open(u32 records, u32 dataSize) {
         tree_.reset();
-        tree_ = std::make_unique<TreeOnVolume>(Image(NodeSize(), records, dataSize), MapBlock());
+        tree_ = std::make_unique<TreeOnVolume>(Image(NodeSize(), records, dataSize), GetParam());
     }
     void Find(u32 n) {
         const HostKey key = NthHostKey(kCatalogFileId, n);

@@ -30,7 +30,7 @@ ENGINE_PUBLIC = {"bytes.h": "big-endian loads and stores of the whole project"}
 
 # Inside the engine, lowest first.
 LINES = [
-    "bytes node_desc prefetch report noderef own_change",
+    "bytes node_desc one_piece prefetch report noderef own_change",
     "node_access keys_compare header_record slots hints",
     "cache cache_dirty key_shape next_node scratch",
     "map_walk path_level path_find path_deliver path_check plain_record node_child node_search way",

@@ -70,6 +70,7 @@ u32 Runner::DataSize(u32 size) const {
 void Runner::Start() {
     MemVolumeOptions options;
     options.mapBlockSize = setup_.geometry.mapBlock;
+    options.inOnePiece = setup_.geometry.inOnePiece;
     options.allocBlockSize = 1024;
     options.totalBlocks = 1u << 20;
     options.defaultClumpSize = 4 * setup_.geometry.nodeSize;

@@ -14,12 +14,14 @@ namespace VELK::test {
 struct Geometry {
     u32 nodeSize;
     u32 mapBlock;
+    bool inOnePiece = false;  // the blocks of a node lie one behind the other in memory
 
     u32 Blocks() const { return nodeSize / mapBlock; }
 };
 
 inline std::ostream& operator<<(std::ostream& out, const Geometry& geometry) {
-    return out << geometry.nodeSize << " in blocks of " << geometry.mapBlock;
+    return out << geometry.nodeSize << " in blocks of " << geometry.mapBlock
+               << (geometry.inOnePiece ? ", in one piece" : "");
 }
 
 // Every pair a volume can have.
@@ -33,9 +35,10 @@ inline std::vector<Geometry> AllGeometries() {
     return all;
 }
 
-// One block, two, many, and the two extremes.
+// One block, two, many, many in one piece, and the two extremes.
 inline std::vector<Geometry> FewGeometries() {
-    return {{512, 512}, {1024, 512}, {4096, 512}, {4096, 4096}, {8192, 2048}, {32768, 512}};
+    return {{512, 512},   {1024, 512},  {4096, 512}, {4096, 512, true},
+            {4096, 4096}, {8192, 2048}, {32768, 512}};
 }
 
 class GeometryTest : public ::testing::TestWithParam<Geometry> {
@@ -45,7 +48,8 @@ protected:
 };
 
 inline std::string GeometryName(const ::testing::TestParamInfo<Geometry>& info) {
-    return std::to_string(info.param.nodeSize) + "by" + std::to_string(info.param.mapBlock);
+    return std::to_string(info.param.nodeSize) + "by" + std::to_string(info.param.mapBlock) +
+           (info.param.inOnePiece ? "inOnePiece" : "");
 }
 
 #define INSTANTIATE_GEOMETRIES(suite, geometries)                                \

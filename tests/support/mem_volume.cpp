@@ -182,12 +182,18 @@ int MemVolume::OnMap(void* self, CFileSystemHfs* fs, HfsRuns* /*runs*/, HfsFork*
     if (byteOffset > file.size() || bytes > file.size() - byteOffset) {
         return kMemNoRange;
     }
-    for (u32 b = 0; b < bytes / blockSize; ++b) {
+    const u32 misalign = volume->options.misalign;
+    const u32 pieceSize = volume->options.inOnePiece ? bytes : blockSize;
+    std::shared_ptr<u8[]> piece;
+    for (u32 at = 0, b = 0; at < bytes; at += blockSize, ++b) {
+        if (at % pieceSize == 0) {
+            piece.reset(new u8[pieceSize + misalign]);
+        }
         auto block = std::make_unique<Block>();
-        block->memory.reset(new u8[blockSize + volume->options.misalign]);
-        block->data = block->memory.get() + volume->options.misalign;
+        block->memory = piece;
+        block->data = piece.get() + misalign + at % pieceSize;
         block->fileId = fileId;
-        block->offset = byteOffset + static_cast<u64>(b) * blockSize;
+        block->offset = byteOffset + at;
         if (noRead) {
             std::memset(block->data, 0xA5, blockSize);
         } else {

@@ -1,6 +1,7 @@
 // A volume in memory that fills the engine's service tables and is as unkind as the contract
 // allows: every mapped map block is a heap block of its own of exactly mapBlockSize bytes (an
-// access past it is seen by the sanitizer), it is a copy of the "disk" taken at Map, and only what
+// access past it is seen by the sanitizer; blocks of one Map can be lent in one piece instead, as
+// other volumes do), it is a copy of the "disk" taken at Map, and only what
 // DirtyMeta hands over gets back there. Breaches of the contract (a block released twice, a handle
 // it never gave, a block handed over without journal access ...) are collected in `breaches` and
 // fail the test at the end.
@@ -59,6 +60,7 @@ struct MemVolumeOptions {
     u64 maxFileSize = ~0ull;  // Resize beyond fails
     u8 stale = 0xE5;          // what freshly allocated disk bytes hold
     u32 misalign = 0;         // bytes every block is off its alignment
+    bool inOnePiece = false;  // blocks of one Map lie one behind the other
     bool listsCalls = true;   // for TakeCalls; otherwise they are only counted
 };
 
@@ -97,7 +99,7 @@ public:
 
 private:
     struct Block {
-        std::unique_ptr<u8[]> memory;
+        std::shared_ptr<u8[]> memory;
         u8* data;
         u32 fileId;
         u64 offset;

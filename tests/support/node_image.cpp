@@ -67,7 +67,7 @@ BTHeaderMem GeometryHeader(u32 nodeSize, u32 mapBlockSize) {
     return header;
 }
 
-LooseNode::LooseNode(const Bytes& bytes, u32 mapBlockSize, u32 nodeNum, bool dirty)
+LooseNode::LooseNode(const Bytes& bytes, u32 mapBlockSize, u32 nodeNum, bool dirty, bool inOnePiece)
     : header(GeometryHeader(static_cast<u32>(bytes.size()), mapBlockSize)) {
     const std::size_t blocks = bytes.size() / mapBlockSize;
     const std::size_t size = sizeof(HfsNode) + blocks * sizeof(HfsBcbBuf);
@@ -77,10 +77,16 @@ LooseNode::LooseNode(const Bytes& bytes, u32 mapBlockSize, u32 nodeNum, bool dir
     node_->refCount = 1;
     node_->link.MarkUnlinked();
     node_->modifiedLink.Init();
+    node_->isOnePiece = inOnePiece;
+    const std::size_t pieceSize = inOnePiece ? bytes.size() : mapBlockSize;
     for (std::size_t b = 0; b < blocks; ++b) {
-        blocks_.push_back(std::make_unique<u8[]>(mapBlockSize));
-        std::memcpy(blocks_[b].get(), bytes.data() + b * mapBlockSize, mapBlockSize);
-        node_->bufs[b].data = blocks_[b].get();
+        const std::size_t at = b * mapBlockSize;
+        if (at % pieceSize == 0) {
+            pieces_.push_back(std::make_unique<u8[]>(pieceSize));
+        }
+        blocks_.push_back(pieces_.back().get() + at % pieceSize);
+        std::memcpy(blocks_[b], bytes.data() + at, mapBlockSize);
+        node_->bufs[b].data = blocks_[b];
         node_->bufs[b].dirty = dirty;
     }
 }
@@ -92,14 +98,14 @@ LooseNode::~LooseNode() {
 
 Bytes LooseNode::Content() const {
     Bytes content;
-    for (const auto& block : blocks_) {
-        content.insert(content.end(), block.get(), block.get() + header.blockSize);
+    for (const u8* block : blocks_) {
+        content.insert(content.end(), block, block + header.blockSize);
     }
     return content;
 }
 
 u8* LooseNode::At(u32 offset) const {
-    return blocks_.at(offset / header.blockSize).get() + offset % header.blockSize;
+    return blocks_.at(offset / header.blockSize) + offset % header.blockSize;
 }
 
 }  // namespace VELK::test

@@ -30,10 +30,12 @@ Bytes Record(const Bytes& key, u32 child);
 u32 UsedBytes(const std::vector<Bytes>& records);
 
 // A node that belongs to no tree: every map block is a heap block of its own, so that an access one
-// byte past it is seen. Blocks are marked dirty as wanted, so that writers accept them.
+// byte past it is seen, unless the node is to lie in one piece. Blocks are marked dirty as wanted,
+// so that writers accept them.
 class LooseNode {
 public:
-    LooseNode(const Bytes& bytes, u32 mapBlockSize, u32 nodeNum = 1, bool dirty = false);
+    LooseNode(const Bytes& bytes, u32 mapBlockSize, u32 nodeNum = 1, bool dirty = false,
+              bool inOnePiece = false);
     ~LooseNode();
     LooseNode(const LooseNode&) = delete;
     LooseNode& operator=(const LooseNode&) = delete;
@@ -48,7 +50,8 @@ public:
 
 private:
     std::unique_ptr<u8[]> memory_;
-    std::vector<std::unique_ptr<u8[]>> blocks_;
+    std::vector<std::unique_ptr<u8[]>> pieces_;
+    std::vector<u8*> blocks_;
     HfsNode* node_;
 };
 

@@ -165,18 +165,21 @@ private:
     u32 blocks_;
 };
 
-// The bytes of a node that lies in one block, without asking for each offset where that is. The net
+// The bytes of a node that lies in one piece, without asking for each offset where that is. The net
 // is the same.
 class PlainBytes {
 public:
-    // REQUIRES: a block is as large as a node.
+    // REQUIRES: IsOnePiece.
     PlainBytes(const BTHeaderMem* hdr, const HfsNode* node)
-        : block_(&node->bufs[0]), data_(node->bufs[0].data), size_(hdr->nodeSize) {}
+        : bufs_(node->bufs),
+          data_(node->bufs[0].data),
+          size_(hdr->nodeSize),
+          blockShift_(hdr->blockShift) {}
 
     u32 Size() const { return size_; }
     u8* At(u32 offset) const { return data_ + offset; }
 
-    // REQUIRES of all writers: the block was marked with SetDirty.
+    // REQUIRES of all writers: the blocks written were marked with SetDirty.
     void CopyIn(u32 offset, const void* source, u32 size) const {
         if (Contains(offset, size)) {
             std::memmove(WriteAt(offset), source, size);
@@ -198,13 +201,14 @@ private:
         return __builtin_expect(static_cast<u64>(offset) + size <= size_, true);
     }
     u8* WriteAt(u32 offset) const {
-        TrapIfClean(block_);
+        TrapIfClean(&bufs_[offset >> blockShift_]);
         return data_ + offset;
     }
 
-    const HfsBcbBuf* block_;
+    const HfsBcbBuf* bufs_;
     u8* data_;
     u32 size_;
+    u32 blockShift_;
 };
 
 // Copies between two nodes; they must not be the same one.

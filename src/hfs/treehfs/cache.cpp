@@ -128,6 +128,15 @@ void FreeNodeMemory(CBTreeHfs* tree, HfsNode* node) {
     velk_heap_free(node);
 }
 
+bool LieTogether(const BTHeaderMem& header, const HfsBcbBuf* blocks) {
+    for (u32 i = 1; i < header.blocksPerNode; ++i) {
+        if (blocks[i].data != blocks[i - 1].data + header.blockSize) {
+            return false;
+        }
+    }
+    return true;
+}
+
 u8* TailOf(const BTHeaderMem& header, HfsNode* node) {
     return node->bufs[header.blocksPerNode - 1].data + header.blockSize - kSlotSize;
 }
@@ -259,6 +268,7 @@ int LoadNode(CBTreeHfs* tree, const Place& place, u32 nodeNum, NodeUse use, HfsN
         return status;
     }
     tree->readCount += 1;
+    node->isOnePiece = LieTogether(tree->header, node->bufs);
     // The descriptor and the offset table: needed once the node is linked.
     Prefetch(node->bufs[0].data, 1);
     Prefetch(TailOf(tree->header, node), 1);

@@ -21,23 +21,28 @@ bool HoldsName(const u8* key, const KeyShape& shape) {
            (shape.nameLength == 0 || shape.fixed + 2 * GetHost16(key + shape.nameLength) <= length);
 }
 
-// Whether no search that meets the record will find anything to say of it, there and as a
+// Whether no search that meets the record's key will find anything to say of it, there and as a
 // separator, and whether its key was looked up by the ID it carries: another one leads it to a
 // place where no lookup expects what is stored. False also for a comparator whose keys are not
 // known.
-bool IsOrdinary(const CBTreeHfs* tree, const void* key, u32 id, u32 dataSize) {
+bool IsOrdinary(const CBTreeHfs* tree, const void* key, u32 id) {
     const BTHeaderMem& hdr = tree->header;
     const u8* bytes = static_cast<const u8*>(key);
     const u32 length = GetHost16(bytes);
     const bool isIndexSize =
         (hdr.attributes & kBTVariableIndexKeysMask) != 0 || length == hdr.maxKeyLength;
-    // Data of more than a block can come to lie in three.
-    if (length > kMaxKeyLength || dataSize > hdr.blockSize || !isIndexSize) {
+    if (length > kMaxKeyLength || !isIndexSize) {
         return false;
     }
     KeyShape shape;
     return ShapeOf(tree->compareKeys, &shape) && HoldsName(bytes, shape) &&
            GetHost32(bytes + shape.id) == id;
+}
+
+// Keeps the books of whose changes the tree knows, after a record came in by its key.
+void NoteRecord(CBTreeHfs* tree, const void* key, u32 id, u32 dataSize) {
+    tree->isAllOwn = tree->isAllOwn && IsOrdinary(tree, key, id);
+    tree->hasLongData = tree->hasLongData || dataSize > tree->header.blockSize;
 }
 
 // Makes the first leaf, which is also the root, of a record. A failure leaves the leaf allocated.
@@ -63,7 +68,7 @@ int InsertFirst(CBTreeHfs* tree, const BTreeKey* key, u32 id, const void* data, 
     hdr->lastLeafNode = leaf->nodeNum;
     tree->isDirty = true;
     change.Done();
-    tree->isAllOwn = tree->isAllOwn && IsOrdinary(tree, key, id, dataSize);
+    NoteRecord(tree, key, id, dataSize);
     return kOk;
 }
 
@@ -139,7 +144,7 @@ int CBTreeHfs::InsertRecord(const void* key, unsigned keyLen, const void* data, 
                 5092);
     }
     change.Done();
-    isAllOwn = isAllOwn && IsOrdinary(this, key, keyLen, dataSize);
+    NoteRecord(this, key, keyLen, dataSize);
     if (!inserted) {
         RenewPath(this);
     }

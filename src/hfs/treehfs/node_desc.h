@@ -1,8 +1,6 @@
 // The node descriptor: links, kind, height and record count of a node, read and written in place.
 #pragma once
 
-#include <cstdint>
-
 #include "hfs/treehfs/bytes.h"
 
 namespace VELK {
@@ -43,14 +41,6 @@ inline void SetHeight(const BTHeaderMem* hdr, HfsNode* node, u32 value) {
 }
 inline void SetNumRecords(const BTHeaderMem* hdr, HfsNode* node, u32 value) {
     NodeBytes(hdr, node).SetU16(kDescNumRecords, value);
-}
-
-// Whether changes in the first block of one node leave that of the other alone: a damaged volume
-// can give two nodes the same bytes.
-inline bool LieApart(const BTHeaderMem* hdr, const HfsNode* one, const HfsNode* other) {
-    const std::uintptr_t a = reinterpret_cast<std::uintptr_t>(one->bufs[0].data);
-    const std::uintptr_t b = reinterpret_cast<std::uintptr_t>(other->bufs[0].data);
-    return (a > b ? a - b : b - a) >= hdr->blockSize;
 }
 
 // Node offset of the slot of record `index`. REQUIRES: 2 x (index + 1) <= nodeSize.

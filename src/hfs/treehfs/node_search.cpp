@@ -240,10 +240,11 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doubt dou
 }
 
 template <typename Blocks, typename Shape>
-int SearchPlain(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doubt doubt,
-                SearchResult* result) {
+[[gnu::always_inline]] inline int SearchPlain(CBTreeHfs* tree, const HfsNode* node, Blocks blocks,
+                                              Shape shape, const SoughtKey& key, Doubt doubt,
+                                              SearchResult* result) {
     const u32 count = NumRecords(node);
-    const PlainRecords<Blocks, Shape> keys(&tree->header, node, Shape(key));
+    const PlainRecords keys(&tree->header, blocks, shape);
     if (HasQuickKeys(tree->header, key, count)) {
         PrefetchFor(keys, Height(node), static_cast<s32>(count) - 1);
     }
@@ -251,10 +252,11 @@ int SearchPlain(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doub
 }
 
 template <typename Blocks>
-int SearchKnown(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doubt doubt,
-                SearchResult* result) {
+[[gnu::always_inline]] inline int SearchKnown(CBTreeHfs* tree, const HfsNode* node, Blocks blocks,
+                                              const SoughtKey& key, Doubt doubt,
+                                              SearchResult* result) {
     const u32 count = NumRecords(node);
-    const PlainRecords<Blocks, FoldedKeys> keys(&tree->header, node, FoldedKeys(key));
+    const PlainRecords keys(&tree->header, blocks, FoldedKeys(key));
     const Hints hints(tree, node);
     if (hints.Order(count / 2) == 0 && HasQuickKeys(tree->header, key, count)) {
         PrefetchFor(keys, Height(node), static_cast<s32>(count) - 1);
@@ -262,19 +264,11 @@ int SearchKnown(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doub
     return Search(tree, node, key, doubt, keys, KnownSeparators(hints), result);
 }
 
-template <typename Blocks>
-int SearchFolded(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doubt doubt,
-                 SearchResult* result) {
-    return node->hints != nullptr && key.HasOrder()
-               ? SearchKnown<Blocks>(tree, node, key, doubt, result)
-               : SearchPlain<Blocks, FoldedKeys>(tree, node, key, doubt, result);
-}
-
 // SearchInside without the search proper. True: the key lies between the first and the last.
 template <typename Blocks>
-bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SoughtKey& key, u32 count,
+bool LiesInside(const BTHeaderMem* hdr, Blocks blocks, const SoughtKey& key, u32 count,
                 bool* isBehindAll) {
-    const PlainRecords<Blocks, OtherKeys> keys(&tree->header, leaf, OtherKeys(key));
+    const PlainRecords keys(hdr, blocks, OtherKeys(key));
     PlainRecord record;
     if (!keys.Find(count - 1, &record)) {
         return false;
@@ -286,21 +280,24 @@ bool LiesInside(CBTreeHfs* tree, const HfsNode* leaf, const SoughtKey& key, u32 
     return keys.Find(0, &record) && key.Compare(KeyOf(record)) >= 0;
 }
 
+template <typename Blocks>
 int SearchByShape(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doubt doubt,
                   SearchResult* result) {
-    const bool isWhole = tree->header.blocksPerNode == 1;
-    if (key.IsFolded()) {
-        return isWhole ? SearchFolded<OneBlock>(tree, node, key, doubt, result)
-                       : SearchFolded<ManyBlocks>(tree, node, key, doubt, result);
+    const Blocks blocks(tree, node);
+    if (!key.IsFolded()) {
+        return SearchPlain(tree, node, blocks, OtherKeys(key), key, doubt, result);
     }
-    return isWhole ? SearchPlain<OneBlock, OtherKeys>(tree, node, key, doubt, result)
-                   : SearchPlain<ManyBlocks, OtherKeys>(tree, node, key, doubt, result);
+    return node->hints != nullptr && key.HasOrder()
+               ? SearchKnown(tree, node, blocks, key, doubt, result)
+               : SearchPlain(tree, node, blocks, FoldedKeys(key), key, doubt, result);
 }
 
 }  // namespace
 
 int SearchNode(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, SearchResult* result) {
-    return SearchByShape(tree, node, key, Doubt::kSettle, result);
+    return WithBlocks(tree, node, [&](auto blocks) {
+        return SearchByShape<decltype(blocks)>(tree, node, key, Doubt::kSettle, result);
+    });
 }
 
 bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SoughtKey& key,
@@ -309,16 +306,19 @@ bool SearchInside(CBTreeHfs* tree, const HfsNode* leaf, const SoughtKey& key,
     if (count == 0 || !HasQuickKeys(tree->header, key, count)) {
         return false;
     }
-    bool isBehindAll = false;
-    const bool isInside = tree->header.blocksPerNode == 1
-                              ? LiesInside<OneBlock>(tree, leaf, key, count, &isBehindAll)
-                              : LiesInside<ManyBlocks>(tree, leaf, key, count, &isBehindAll);
-    if (isBehindAll && FLink(leaf) == 0) {
-        result->found = false;
-        result->index = static_cast<s32>(count);
-        return true;
-    }
-    return isInside && SearchByShape(tree, leaf, key, Doubt::kGiveUp, result) == kOk;
+    return WithBlocks(tree, leaf, [&](auto blocks) {
+        bool isBehindAll = false;
+        const bool isInside = LiesInside(&tree->header, blocks, key, count, &isBehindAll);
+        const bool isNew = isBehindAll && FLink(leaf) == 0;
+        if (isNew && !tree->hasLongData) {
+            result->found = false;
+            result->index = static_cast<s32>(count);
+            return true;
+        }
+        // On its way to the end a search may meet data in three blocks.
+        return (isInside || isNew) &&
+               SearchByShape<decltype(blocks)>(tree, leaf, key, Doubt::kGiveUp, result) == kOk;
+    });
 }
 
 }  // namespace VELK

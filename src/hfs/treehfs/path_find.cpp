@@ -98,7 +98,7 @@ int SearchIndex(CBTreeHfs* tree, const SoughtKey& key, HfsFindLevel* entry, bool
     entry->index = !result->found && result->index > 0 ? result->index - 1 : result->index;
     *way = WayDown(tree, entry->node, static_cast<u32>(entry->index));
     if (way->node != nullptr) {
-        *child = PlainChild(&tree->header, entry->node, entry->index);
+        *child = PlainChild(tree, entry->node, entry->index);
         if (HFS_LIKELY(*child == way->node->nodeNum)) {
             return kOk;
         }

@@ -4,6 +4,7 @@
 #pragma once
 
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/one_piece.h"
 #include "hfs/treehfs/path_deliver.h"
 #include "hfs/treehfs/report.h"
 
@@ -13,8 +14,8 @@ namespace VELK {
 // asking for each offset which block holds it.
 class OneBlock {
 public:
-    OneBlock(const BTHeaderMem* hdr, const HfsNode* node)
-        : data_(node->bufs[0].data), slots_(data_ + hdr->nodeSize) {}
+    OneBlock(const CBTreeHfs* tree, const HfsNode* node)
+        : data_(node->bufs[0].data), slots_(data_ + tree->header.nodeSize) {}
 
     const u8* At(u32 offset) const { return data_ + offset; }
     // Slot of record `index` in the lower half, that of the next record in the upper one.
@@ -32,19 +33,11 @@ private:
     const u8* slots_;  // end of the table
 };
 
-class ManyBlocks {
+// Where the blocks of a node end, if it has several.
+class BlockEnds {
 public:
-    ManyBlocks(const BTHeaderMem* hdr, const HfsNode* node)
-        : bufs_(node->bufs),
-          nodeSize_(hdr->nodeSize),
-          mask_(hdr->blockMask),
-          shift_(hdr->blockShift) {}
+    explicit BlockEnds(const BTHeaderMem* hdr) : mask_(hdr->blockMask), shift_(hdr->blockShift) {}
 
-    const u8* At(u32 offset) const { return bufs_[offset >> shift_].data + (offset & mask_); }
-    u32 SlotPair(u32 index) const {
-        const u32 slot = nodeSize_ - kSlotSize * (index + 1);
-        return GetBe16(At(slot)) | u32{GetBe16(At(slot - kSlotSize))} << 16;
-    }
     bool IsWhole(u32 offset, u32 size) const { return (offset & mask_) + size <= mask_ + 1; }
     bool IsShort(u32 start, u32 end) const {
         return ((end - 1) >> shift_) - (start >> shift_) <= 1;
@@ -52,12 +45,56 @@ public:
     bool FitsBlock(u32 size) const { return size <= mask_ + 1; }
     u32 Room(u32 offset) const { return mask_ + 1 - (offset & mask_); }
 
-private:
-    const HfsBcbBuf* bufs_;
-    u32 nodeSize_;
+protected:
     u32 mask_;
     u32 shift_;
 };
+
+// Several blocks in one piece. What lies over the end of a block can be read where it is, instead
+// of being gathered in the scratch buffer; but only where there is one, as who has no memory for it
+// is to be told.
+class OnePiece : public BlockEnds {
+public:
+    OnePiece(const CBTreeHfs* tree, const HfsNode* node)
+        : BlockEnds(&tree->header), bytes_(tree, node), canGather_(tree->scratch != nullptr) {}
+
+    const u8* At(u32 offset) const { return bytes_.At(offset); }
+    u32 SlotPair(u32 index) const { return bytes_.SlotPair(index); }
+    bool IsWhole(u32 offset, u32 size) const {
+        return canGather_ || BlockEnds::IsWhole(offset, size);
+    }
+    u32 Room(u32 offset) const { return canGather_ ? ~0u : BlockEnds::Room(offset); }
+
+private:
+    OneBlock bytes_;
+    bool canGather_;
+};
+
+class ManyPieces : public BlockEnds {
+public:
+    ManyPieces(const CBTreeHfs* tree, const HfsNode* node)
+        : BlockEnds(&tree->header), bufs_(node->bufs), nodeSize_(tree->header.nodeSize) {}
+
+    const u8* At(u32 offset) const { return bufs_[offset >> shift_].data + (offset & mask_); }
+    u32 SlotPair(u32 index) const {
+        const u32 slot = nodeSize_ - kSlotSize * (index + 1);
+        return GetBe16(At(slot)) | u32{GetBe16(At(slot - kSlotSize))} << 16;
+    }
+
+private:
+    const HfsBcbBuf* bufs_;
+    u32 nodeSize_;
+};
+
+// Calls `body` with the class that knows best where the bytes of the node are.
+template <typename Body>
+[[gnu::always_inline]] inline auto WithBlocks(const CBTreeHfs* tree, const HfsNode* node,
+                                              Body body) {
+    if (HFS_LIKELY(tree->header.blocksPerNode == 1)) {
+        return body(OneBlock(tree, node));
+    }
+    return node->isOnePiece ? body(OnePiece(tree, node)) : body(ManyPieces(tree, node));
+}
 
 // What fixed part the keys of a comparator have, and where their name length stands (0: no name).
 // That of catalog keys, by far the most frequent, is known to the compiler.
@@ -94,8 +131,8 @@ inline const BTreeKey* KeyOf(const PlainRecord& record) {
 template <typename Blocks, typename Shape>
 class PlainRecords {
 public:
-    PlainRecords(const BTHeaderMem* hdr, const HfsNode* node, Shape shape)
-        : blocks_(hdr, node), shape_(shape), nodeSize_(hdr->nodeSize) {}
+    PlainRecords(const BTHeaderMem* hdr, Blocks blocks, Shape shape)
+        : blocks_(blocks), shape_(shape), nodeSize_(hdr->nodeSize) {}
 
     // Record `index`. False: something about it is out of the ordinary.
     // REQUIRES of all: the slots of record `index` and the next lie inside the node.
@@ -154,18 +191,6 @@ inline bool TableFits(const BTHeaderMem& header, u32 count) {
     return kSlotSize * (count + 1) < header.nodeSize;
 }
 
-template <typename Blocks>
-[[gnu::always_inline]] inline bool ViewIn(const BTHeaderMem* hdr, const HfsNode* leaf, u32 index,
-                                          RecordView* record) {
-    const PlainRecords<Blocks, CatalogShape> records(hdr, leaf, CatalogShape());
-    PlainRecord plain;
-    if (!records.Find(index, &plain)) {
-        return false;
-    }
-    *record = records.View(plain);
-    return true;
-}
-
 // FetchKey of a leaf whose keys are in folded order. False, nothing reported: something about the
 // record is out of the ordinary, or its key lies in two blocks.
 [[gnu::always_inline]] inline bool ViewPlain(const CBTreeHfs* tree, const HfsNode* leaf, u32 index,
@@ -176,8 +201,15 @@ template <typename Blocks>
         HFS_UNLIKELY(!TableFits(*hdr, count)) || HFS_UNLIKELY(leaf->nodeNum == 0)) {
         return false;
     }
-    return hdr->blocksPerNode == 1 ? ViewIn<OneBlock>(hdr, leaf, index, record)
-                                   : ViewIn<ManyBlocks>(hdr, leaf, index, record);
+    return WithBlocks(tree, leaf, [hdr, index, record](auto blocks) {
+        const PlainRecords records(hdr, blocks, CatalogShape());
+        PlainRecord plain;
+        if (!records.Find(index, &plain)) {
+            return false;
+        }
+        *record = records.View(plain);
+        return true;
+    });
 }
 
 }  // namespace VELK

@@ -2,6 +2,7 @@
 #pragma once
 
 #include "hfs/treehfs/bytes.h"
+#include "hfs/treehfs/one_piece.h"
 
 namespace VELK {
 
@@ -53,7 +54,7 @@ enum class LeafUse { kRecord, kPlace };
     const NodeBytes bytes(hdr, node);
     const u8* from = bytes.At(offset);
     if (from != nullptr) {
-        const u32 room = bytes.Room(offset);
+        const u32 room = IsOnePiece(hdr, node) ? hdr->nodeSize - offset : bytes.Room(offset);
         Prefetch(from, room < kMost ? room : kMost);
     }
 }

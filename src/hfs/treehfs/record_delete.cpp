@@ -2,6 +2,7 @@
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/one_piece.h"
 #include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/slots.h"
@@ -46,14 +47,15 @@ int CloseSlots(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 ind
     return kOk;
 }
 
-// CloseGap in a node that lies in one block and was marked before: no step can be refused. False:
+// CloseGap in a node that lies in one piece and was marked before: no step can be refused. False:
 // nothing has changed.
 bool ClosePlainGap(CBTreeHfs* tree, HfsNode* node, const RecordSlots& slots, u32 index) {
-    if (tree->header.blockSize != tree->header.nodeSize || !node->bufs[0].dirty) {
+    if (!IsMarkedPiece(&tree->header, node)) {
         return false;
     }
-    u8* const data = node->bufs[0].data;
-    NodeBytes(&tree->header, node).Move(slots.start, slots.end, slots.free - slots.end);
+    const PlainBytes bytes(&tree->header, node);
+    u8* const data = bytes.At(0);
+    bytes.Move(slots.start, slots.end, slots.free - slots.end);
     const u32 removed = slots.end - slots.start;
     PutBe16(data + slots.limit, 0);
     CloseRun(data + slots.limit + kSlotSize, data + SlotOffset(&tree->header, index), slots.free,

@@ -4,6 +4,7 @@
 #include "hfs/treehfs/cache.h"
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/one_piece.h"
 #include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/scratch.h"
@@ -128,15 +129,15 @@ enum class Plain {
     kDoubtful,  // the long way round has to tell, and nothing has changed
 };
 
-// Opens a gap of `size` bytes, an even number, for record `index` in a node that lies in one block
+// Opens a gap of `size` bytes, an even number, for record `index` in a node that lies in one piece
 // and was marked before, and counts the record.
 Plain OpenPlainGap(CBTreeHfs* tree, HfsNode* node, u32 index, u32 size, u32* gap) {
-    const PlainBytes bytes(&tree->header, node);
+    const BTHeaderMem* hdr = &tree->header;
+    const PlainBytes bytes(hdr, node);
     const u32 nodeSize = bytes.Size();
     const u32 count = NumRecords(node);
     const u32 tableSize = kSlotSize * (count + 1);
-    if (tree->header.blockSize != nodeSize || !node->bufs[0].dirty || index > count ||
-        tableSize >= nodeSize) {
+    if (!IsMarkedPiece(hdr, node) || index > count || tableSize >= nodeSize) {
         return Plain::kDoubtful;
     }
     u8* const data = bytes.At(0);
@@ -153,8 +154,11 @@ Plain OpenPlainGap(CBTreeHfs* tree, HfsNode* node, u32 index, u32 size, u32* gap
     const u32 start = GetBe16(slot);
     if (index < count) {
         const u32 end = GetBe16(slot - kSlotSize);
-        if (!IsInsertPoint(start, free) || !IsInsertPoint(end, free) || Kind(node) > kBTIndexNode ||
-            start + PaddedKeySize(GetBe16(data + start)) >= end) {
+        if (!IsInsertPoint(start, free) || !IsInsertPoint(end, free) || Kind(node) > kBTIndexNode) {
+            return Plain::kDoubtful;
+        }
+        const u32 dataStart = start + PaddedKeySize(GetBe16(data + start));
+        if (dataStart >= end || !StaysInTwoBlocks(hdr, end - dataStart)) {
             return Plain::kDoubtful;
         }
         bytes.Move(start + size, start, free - start);

@@ -4,6 +4,7 @@
 
 #include "hfs/treehfs/hints.h"
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/one_piece.h"
 #include "hfs/treehfs/report.h"
 #include "hfs/treehfs/slots.h"
 
@@ -11,7 +12,7 @@ namespace VELK {
 
 namespace {
 
-// A node that lies in one block, as a run of records with the table of where they start.
+// A node that lies in one piece, as a run of records with the table of where they start.
 class Table {
 public:
     Table(const BTHeaderMem* hdr, const HfsNode* node)
@@ -51,9 +52,11 @@ void MarkAgain(CBTreeHfs* tree, HfsNode* node) {
     node->modifiedLink.MoveTail(&tree->modifiedList);
 }
 
-// Whether the record is longer than its key, as GetKey wants it.
-[[gnu::always_inline]] inline bool HasWholeKey(const Table& table, u32 index) {
-    return table.Start(index) + PaddedKeySize(table.KeyLength(index)) < table.Start(index + 1);
+// Whether GetKey has nothing to say of the record, wherever it lies.
+[[gnu::always_inline]] inline bool IsPlain(const BTHeaderMem* hdr, const Table& table, u32 index) {
+    const u32 data = table.Start(index) + PaddedKeySize(table.KeyLength(index));
+    const u32 end = table.Start(index + 1);
+    return data < end && StaysInTwoBlocks(hdr, end - data);
 }
 
 // Whether records first .. first + count - 1 of `giver` can go to `receiver` in one go: nothing on
@@ -61,7 +64,7 @@ void MarkAgain(CBTreeHfs* tree, HfsNode* node) {
 bool CanMoveAtOnce(const CBTreeHfs* tree, const HfsNode* giver, const HfsNode* receiver, u32 first,
                    u32 count) {
     const BTHeaderMem* hdr = &tree->header;
-    if (hdr->blockSize != hdr->nodeSize || !giver->bufs[0].dirty || !receiver->bufs[0].dirty ||
+    if (!IsMarkedPiece(hdr, giver) || !IsMarkedPiece(hdr, receiver) ||
         !LieApart(hdr, giver, receiver)) {
         return false;
     }
@@ -71,7 +74,7 @@ bool CanMoveAtOnce(const CBTreeHfs* tree, const HfsNode* giver, const HfsNode* r
         return false;
     }
     for (u32 i = first; i < first + count; ++i) {
-        if (!HasWholeKey(table, i)) {
+        if (!IsPlain(hdr, table, i)) {
             return false;
         }
     }
@@ -82,7 +85,7 @@ bool CanMoveAtOnce(const CBTreeHfs* tree, const HfsNode* giver, const HfsNode* r
 // REQUIRES: CanMoveAtOnce.
 bool CanMoveInFront(const CBTreeHfs* tree, const HfsNode* receiver) {
     const Table table(&tree->header, receiver);
-    return table.Count() == 0 || HasWholeKey(table, 0);
+    return table.Count() == 0 || IsPlain(&tree->header, table, 0);
 }
 
 // What the nodes remember of `count` records that went from place `first` of one to place `at` of

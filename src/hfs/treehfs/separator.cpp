@@ -2,6 +2,7 @@
 #include "hfs/treehfs/separator.h"
 
 #include "hfs/treehfs/hints.h"
+#include "hfs/treehfs/one_piece.h"
 #include "hfs/treehfs/own_change.h"
 #include "hfs/treehfs/plain_record.h"
 #include "hfs/treehfs/scratch.h"
@@ -19,19 +20,20 @@ bool NodesOverlap(const CBTreeHfs* tree) {
     return tree->header.nodeSize != 1u << tree->nodeShift;
 }
 
-// The first record of a node in one block, if its key can become that of a separator as it is.
-bool FindFirst(const BTHeaderMem* hdr, const HfsNode* node, PlainRecord* first) {
+// The first record of a node, if its key lies in one block and can become that of a separator as it
+// is. REQUIRES: the node lies in one piece.
+bool FindFirst(const CBTreeHfs* tree, const HfsNode* node, PlainRecord* first) {
+    const BTHeaderMem* hdr = &tree->header;
     return NumRecords(node) != 0 &&
-           PlainRecords<OneBlock, AnyShape>(hdr, node, AnyShape(0, 0)).Find(0, first) &&
+           PlainRecords(hdr, OnePiece(tree, node), AnyShape(0, 0)).Find(0, first) &&
            PaddedKeySize(first->keySize - kKeyLengthSize) == first->keySize &&
            GetKeyLength(hdr, KeyOf(*first), false) + kKeyLengthSize == first->keySize;
 }
 
 // Whether the records behind record `index` can follow its end without a word: as a deletion and an
-// insertion there would look at them.
-bool CanMoveBehind(const BTHeaderMem* hdr, const HfsNode* node, const RecordSlots& slots, u32 index,
+// insertion there would look at them. `data` are the bytes of the node.
+bool CanMoveBehind(const BTHeaderMem* hdr, const u8* data, const RecordSlots& slots, u32 index,
                    u32 removed) {
-    const u8* data = node->bufs[0].data;
     for (u32 at = slots.limit; at < SlotOffset(hdr, index); at += kSlotSize) {
         if (GetBe16(data + at) <= removed) {
             return false;
@@ -41,8 +43,9 @@ bool CanMoveBehind(const BTHeaderMem* hdr, const HfsNode* node, const RecordSlot
         return true;
     }
     const u32 nextEnd = GetBe16(data + SlotOffset(hdr, index + 2));
-    return IsInsertPoint(nextEnd, slots.free) &&
-           slots.end + PaddedKeySize(GetBe16(data + slots.end)) < nextEnd;
+    const u32 nextData = slots.end + PaddedKeySize(GetBe16(data + slots.end));
+    return IsInsertPoint(nextEnd, slots.free) && nextData < nextEnd &&
+           StaysInTwoBlocks(hdr, nextEnd - nextData);
 }
 
 }  // namespace
@@ -96,9 +99,9 @@ bool ReplacePlainSeparator(CBTreeHfs* tree, const HfsFindData* path, int level, 
     const bool endsHere = index != 0 || level == hdr->treeDepth;
     PlainRecord first;
     RecordSlots slots;
-    if (!endsHere || Height(parent) != static_cast<u32>(level) || hdr->blockSize != hdr->nodeSize ||
-        !parent->bufs[0].dirty || !LieApart(hdr, parent, child) || !FindFirst(hdr, child, &first) ||
-        !LoadRecordSlots(hdr, parent, index, &slots)) {
+    if (!endsHere || Height(parent) != static_cast<u32>(level) || !IsMarkedPiece(hdr, parent) ||
+        !IsOnePiece(hdr, child) || !LieApart(hdr, parent, child) ||
+        !FindFirst(tree, child, &first) || !LoadRecordSlots(hdr, parent, index, &slots)) {
         return false;
     }
     const PlainBytes bytes(hdr, parent);
@@ -106,7 +109,7 @@ bool ReplacePlainSeparator(CBTreeHfs* tree, const HfsFindData* path, int level, 
     const u32 removed = slots.end - slots.start;
     const u32 size = first.keySize + kChildSize;
     if (slots.free - removed + size > slots.limit ||
-        !CanMoveBehind(hdr, parent, slots, index, removed)) {
+        !CanMoveBehind(hdr, data, slots, index, removed)) {
         return false;
     }
     NoteChange(tree);

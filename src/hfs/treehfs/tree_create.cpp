@@ -96,6 +96,7 @@ int CBTreeHfs::Create(unsigned newNodeShift, unsigned char, const unsigned long 
         return status;
     }
     isAllOwn = true;
+    hasLongData = false;
     velk_heap_free(scratch);
     scratch = nullptr;
     return EnsureScratch(this);

@@ -47,7 +47,7 @@ int FetchAndHint(CBTreeHfs* tree, HfsNode* parent, u32 index, u32 nodeNum, NodeU
     }
     const int status = FetchNode(tree, nodeNum, use, out);
     if (status == kOk && parent != nullptr &&
-        PlainChild(&tree->header, parent, static_cast<s32>(index)) == nodeNum) {
+        PlainChild(tree, parent, static_cast<s32>(index)) == nodeNum) {
         Hints(tree, parent).SetChild(index, *out);
     }
     return status;
