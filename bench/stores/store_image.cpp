@@ -17,7 +17,7 @@ constexpr u64 kSmallestVolume = u64{64} << 20;
 constexpr u32 kClump = 4u << 20;
 // Leaves that are met once need not stay: what they leave behind is warm, fresh memory is cleared
 // by the system first.
-constexpr u64 kCache = u64{3} << 19;
+constexpr u64 kCache = u64{800} << 10;
 constexpr u32 kBatch = 100000;  // records of a commit while the image is filled
 
 [[noreturn]] void Fail(const char* what, const std::string& text) {

@@ -1,9 +1,12 @@
 // Devices against a plain array of bytes; what a failing device does to a volume above it.
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstdio>
+#include <fstream>
 #include <random>
 
 #include "capture.h"
@@ -107,6 +110,49 @@ TEST(Devices, AFileOpenForWritingIsOursAlone) {
     EXPECT_EQ('k', bytes[0]);
     EXPECT_EQ(4096u, reader->Size());
     std::remove(path.c_str());
+}
+
+timespec TimeOfAccess(const std::string& path) {
+    struct stat info {};
+    EXPECT_EQ(0, stat(path.c_str(), &info));
+    return info.st_atim;
+}
+
+// Who images a disk for evidence wants the file to be as it was, its time of access included.
+TEST(Devices, ReadingLeavesTheTimeOfAccess) {
+    const std::string path = testing::TempDir() + "access_test.img";
+    Problem problem;
+    ASSERT_NE(nullptr, FileDevice::Open(path, FileDevice::Mode::kCreate, 4096, &problem));
+    constexpr timespec kOld[2] = {{1'000'000'000, 5}, {1'000'000'000, 7}};  // of access, of change
+    ASSERT_EQ(0, utimensat(AT_FDCWD, path.c_str(), kOld, 0));
+    auto device = FileDevice::Open(path, FileDevice::Mode::kRead, 0, &problem);
+    ASSERT_NE(nullptr, device) << problem.Text();
+    u8 bytes[512];
+    ASSERT_TRUE(device->Read(0, bytes, sizeof bytes).Ok());
+    EXPECT_EQ(kOld[0].tv_sec, TimeOfAccess(path).tv_sec);
+    EXPECT_EQ(kOld[0].tv_nsec, TimeOfAccess(path).tv_nsec);
+
+    std::ifstream(path, std::ios::binary).read(reinterpret_cast<char*>(bytes), sizeof bytes);
+    const bool isKept = TimeOfAccess(path).tv_sec == kOld[0].tv_sec;
+    std::remove(path.c_str());
+    if (isKept) {
+        GTEST_SKIP() << "this file system keeps no times of access";
+    }
+}
+
+// That is for a file's owner only; everybody else reads it all the same.
+TEST(Devices, AFileOfSomebodyElseIsRead) {
+    constexpr uid_t kNobody = 65534;
+    const uid_t own = geteuid();
+    if (own == 0) {
+        ASSERT_EQ(0, seteuid(kNobody));
+    }
+    Problem problem;
+    const auto device = FileDevice::Open("/etc/passwd", FileDevice::Mode::kRead, 0, &problem);
+    ASSERT_EQ(0, seteuid(own));
+    ASSERT_NE(nullptr, device) << problem.Text();
+    u8 byte = 0;
+    EXPECT_TRUE(device->Read(0, &byte, 1).Ok());
 }
 
 // A file that is cut short while it is open gives an error, not a fault.

@@ -128,6 +128,16 @@ Problem OpenProblem(int error, bool isBlockDevice) {
                                            : CannotOpen(error);
 }
 
+// Opens a file to be read without leaving a trace of that, its time of access, where the system
+// lets us: it is for who owns the file.
+int OpenUntouched([[maybe_unused]] const std::string& path, [[maybe_unused]] int flags) {
+#if defined(O_NOATIME)
+    return open(path.c_str(), flags | O_NOATIME);
+#else
+    return -1;
+#endif
+}
+
 constexpr u64 kWorthStarting = u64{256} << 10;
 
 // Lets the medium begin with what it will be asked for at the next sync. Nothing depends on it.
@@ -159,7 +169,10 @@ std::unique_ptr<FileDevice> FileDevice::Open(const std::string& path, Mode mode,
             return nullptr;
         }
     }
-    const int handle = open(path.c_str(), flags, 0666);
+    int handle = mode == Mode::kRead ? OpenUntouched(path, flags) : -1;
+    if (handle < 0) {
+        handle = open(path.c_str(), flags, 0666);
+    }
     if (handle < 0) {
         *problem = OpenProblem(errno, isBlockDevice);
         return nullptr;

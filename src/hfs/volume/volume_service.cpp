@@ -16,7 +16,8 @@ namespace VELK {
 namespace {
 
 // What a buffer_head of this volume points at. Those of a node stand side by side in one heap
-// block, the bytes of all of them behind the last one.
+// block, the bytes of all of them behind the last one, from the next line of the processor's cache
+// on: they are copied and searched faster there.
 struct alignas(16) MapBuffer {
     HfsRuns* runs;
     u64 offset;  // of the block in its fork
@@ -27,6 +28,8 @@ struct alignas(16) MapBuffer {
     u32 size;
     bool isOpen;  // for change, where there is a journal
 };
+
+constexpr u64 kLine = 64;  // bytes
 
 MapBuffer* BufferOf(buffer_head* bh) {
     return reinterpret_cast<MapBuffer*>(bh);
@@ -127,7 +130,7 @@ int Map(void* self, CFileSystemHfs*, HfsRuns* runs, HfsFork*, u8, u32 fileId, u6
     ImageVolume::State* state = StateOf(self);
     const u32 blockSize = state->fs.mapBlockSize;
     const u32 count = bytes / blockSize;
-    const u64 headSize = u64{count} * sizeof(MapBuffer);
+    const u64 headSize = (u64{count} * sizeof(MapBuffer) + kLine - 1) / kLine * kLine;
     void* memory = velk_heap_alloc(static_cast<std::size_t>(headSize + bytes));
     if (memory == nullptr) {
         return kErrNoMemory;

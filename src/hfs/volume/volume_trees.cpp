@@ -316,8 +316,9 @@ u64 ImageVolume::CachedBytes() const {
 }
 
 // Index nodes are few, and nearly every lookup meets them again: all but leaves stay as long as
-// they leave room for these. What could not be dropped last time (nodes that are modified or held)
-// does not count until it goes, or a long run of changes would look through it again and again.
+// they leave a quarter of the room for these. What could not be dropped last time (nodes that are
+// modified or held) does not count until it goes, or a long run of changes would look through it
+// again and again.
 void ImageVolume::TrimCache() {
     const u64 budget = state_->options.cacheBudget;
     const u64 cached = CachedBytes();
@@ -326,7 +327,7 @@ void ImageVolume::TrimCache() {
         return;
     }
     u64 kept = DropNodes(&state_->trees, Idle::kLeaves);
-    if (kept > budget / 2) {
+    if (kept > budget - budget / 4) {
         kept = DropNodes(&state_->trees, Idle::kAll);
     }
     state_->trimFloor = CachedBytes() - kept;

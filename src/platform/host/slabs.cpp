@@ -22,7 +22,10 @@ void* MapSpace(std::size_t bytes, int access) {
     return space == MAP_FAILED ? nullptr : space;
 }
 
-// Small pages that all come in at once cost less than one after the other.
+// Small pages that come in together cost less than one after the other; those that nobody comes to
+// need cost nothing.
+constexpr u32 kSupply = u32{32} << 10;  // bytes
+
 void Supply([[maybe_unused]] void* space, [[maybe_unused]] std::size_t bytes) {
 #if defined(MADV_POPULATE_WRITE)
     madvise(space, bytes, MADV_POPULATE_WRITE);
@@ -39,6 +42,7 @@ struct Slabs::Span {
     void* freed;            // blocks given back, each holding the address of the next one
     std::size_t blockSize;  // bytes
     u32 untouched;          // offset of the first block that was never used
+    u32 supplied;           // offset of the first byte whose page may still have to come in
     u32 count;              // blocks in use
 };
 
@@ -93,6 +97,7 @@ bool Slabs::OpenRegion() {
 
 Slabs::Span* Slabs::NewSpan(std::size_t blockSize) {
     Span* span = empty_;
+    u32 supplied = kSpanSize;
     if (span != nullptr) {
         Unlink(&empty_, span);
         emptyCount_ -= 1;
@@ -101,12 +106,10 @@ Slabs::Span* Slabs::NewSpan(std::size_t blockSize) {
             return nullptr;
         }
         span = &spans_[taken_ >> kSpanShift];
-        if (taken_ < kSmallSpace) {
-            Supply(BlocksOf(span), kSpanSize);
-        }
+        supplied = taken_ < kSmallSpace ? 0 : kSpanSize;
         taken_ += kSpanSize;
     }
-    *span = {nullptr, nullptr, nullptr, blockSize, 0, 0};
+    *span = {nullptr, nullptr, nullptr, blockSize, 0, supplied, 0};
     return span;
 }
 
@@ -153,8 +156,12 @@ void* Slabs::Alloc(std::size_t size) {
     if (block != nullptr) {
         std::memcpy(&span->freed, block, sizeof span->freed);
     } else {
-        block = static_cast<u8*>(BlocksOf(span)) + span->untouched;
+        u8* const blocks = static_cast<u8*>(BlocksOf(span));
+        block = blocks + span->untouched;
         span->untouched += static_cast<u32>(span->blockSize);
+        for (; span->supplied < span->untouched; span->supplied += kSupply) {
+            Supply(blocks + span->supplied, kSupply);
+        }
     }
     span->count += 1;
     if (span->freed == nullptr && span->untouched + span->blockSize > kSpanSize) {
