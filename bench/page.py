@@ -19,6 +19,9 @@ PICTURES = DOCS / "pictures"
 GOALS = {"load in key order": 0.9, "load in random order": 1.1, "lookup, existing": 1.15,
          "lookup, absent": 1.15, "full scan": 1.4, "folder listing": 1.4, "update in place": 1.3,
          "delete half": 1.4, "delete the rest": 1.4, "delete all": 1.4}
+# What nodes of several blocks may lose, wherever these lie in memory.
+BLOCK_LIMITS = {"treehfs-2blocks": 0.15, "treehfs-8blocks": 0.40,
+                "treehfs-2apart": 0.15, "treehfs-8apart": 0.40}
 COLOURS = ("#1f4e79", "#b04a2f", "#4d7d3a", "#7a5195", "#8a6d1d")
 
 
@@ -46,6 +49,26 @@ def stores_table(name):
         cells = (f"{statistics.median(result[key] for result in results) / unit:,.0f}"
                  for results in stores.values())
         lines.append(f"| {title} | " + " | ".join(cells) + " | | |")
+    return "\n".join(lines)
+
+
+def blocks_table(names):
+    """What nodes of several blocks lose of what nodes of one do, in percent."""
+    figures = [read(name) for name in names]
+    kinds = [store for store in figures[0]["stores"] if store != "treehfs"]
+    lines = ["| Lost, percent | " + " | ".join(f"{kind.removeprefix('treehfs-')}, "
+                                               f"{one['records']:,}"
+                                               for one in figures for kind in kinds) + " |",
+             "|---|" + "---:|" * (len(kinds) * len(figures))]
+    for operation in GOALS:
+        cells = []
+        for one in figures:
+            base = rate(one["stores"]["treehfs"], operation)[0]
+            for kind in kinds:
+                lost = 1 - rate(one["stores"][kind], operation)[0] / base
+                limit = BLOCK_LIMITS[kind]
+                cells.append(f"{100 * lost:.0f}" + (" (missed)" if lost > limit else ""))
+        lines.append(f"| {operation} | " + " | ".join(cells) + " |")
     return "\n".join(lines)
 
 
@@ -120,6 +143,7 @@ def main():
     parts = {"stores-1000000": stores_table("stores-1000000.json"),
              "stores-100000": stores_table("stores-100000.json"),
              "stores-10000000": stores_table("stores-10000000.json"),
+             "blocks": blocks_table(("blocks-100000.json", "blocks-1000000.json")),
              "open": opening_table(("open-100000.json", "open-1000000.json")),
              "engine-records": engine_table("engine-records.json", "records"),
              "engine-nodes": engine_table("engine-nodes.json", "node size")}

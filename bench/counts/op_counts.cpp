@@ -30,7 +30,7 @@ class Counted {
 public:
     Counted(std::uint32_t records, std::uint32_t calls)
         : load_(bench::MakeWorkload(records, 1)),
-          store_(bench::MakeTreehfs(load_, 1)),
+          store_(bench::MakeTreehfs(load_, 1, bench::Lending::kInOnePiece)),
           order_(bench::Shuffled(records, 7)),
           calls_(std::min(calls, records)) {}
 

@@ -5,6 +5,15 @@
 
 namespace bench {
 
+namespace {
+
+// The digit in the name of such a store.
+std::uint32_t BlocksIn(const std::string& name) {
+    return static_cast<std::uint32_t>(name[name.find('-') + 1] - '0');
+}
+
+}  // namespace
+
 std::unique_ptr<Store> MakeStore(const std::string& name, const Workload& load,
                                  const std::string& folder) {
     std::filesystem::remove_all(folder);
@@ -15,13 +24,13 @@ std::unique_ptr<Store> MakeStore(const std::string& name, const Workload& load,
 std::unique_ptr<Store> OpenStore(const std::string& name, const Workload& load,
                                  const std::string& folder) {
     if (name == "treehfs") {
-        return MakeTreehfs(load, 1);
+        return MakeTreehfs(load, 1, Lending::kInOnePiece);
     }
-    if (name == "treehfs-2blocks") {
-        return MakeTreehfs(load, 2);
+    if (name == "treehfs-2blocks" || name == "treehfs-8blocks") {
+        return MakeTreehfs(load, BlocksIn(name), Lending::kInOnePiece);
     }
-    if (name == "treehfs-8blocks") {
-        return MakeTreehfs(load, 8);
+    if (name == "treehfs-2apart" || name == "treehfs-8apart") {
+        return MakeTreehfs(load, BlocksIn(name), Lending::kApart);
     }
     if (name == "treehfs-image") {
         return MakeImage(load, folder);

@@ -35,16 +35,21 @@ public:
     virtual bool Less(std::uint32_t a, std::uint32_t b) const = 0;
 };
 
-// Known names: treehfs, treehfs-2blocks, treehfs-8blocks (map blocks per node), treehfs-image,
-// lmdb, lmdb-append (told when records ascend), bdb, sqlite, leveldb, absl. Null: none of them.
-// `folder` is emptied for the store to keep files in.
+// How the volume lends the map blocks of a node: one behind the other in memory, or not.
+enum class Lending { kInOnePiece, kApart };
+
+// Known names: treehfs, treehfs-2blocks, treehfs-8blocks (map blocks per node), treehfs-2apart,
+// treehfs-8apart (the same where these lie apart in memory), treehfs-image, lmdb, lmdb-append (told
+// when records ascend), bdb, sqlite, leveldb, absl. Null: none of them. `folder` is emptied for the
+// store to keep files in.
 std::unique_ptr<Store> MakeStore(const std::string& name, const Workload& load,
                                  const std::string& folder);
 // The same on what the folder holds, of those that keep files.
 std::unique_ptr<Store> OpenStore(const std::string& name, const Workload& load,
                                  const std::string& folder);
 
-std::unique_ptr<Store> MakeTreehfs(const Workload& load, std::uint32_t blocksPerNode);
+std::unique_ptr<Store> MakeTreehfs(const Workload& load, std::uint32_t blocksPerNode,
+                                   Lending lending);
 std::unique_ptr<Store> MakeImage(const Workload& load, const std::string& folder);
 std::unique_ptr<Store> MakeLmdb(const Workload& load, const std::string& folder, bool appends);
 std::unique_ptr<Store> MakeBdb(const Workload& load, const std::string& folder);

@@ -28,7 +28,7 @@ constexpr u64 kAddressSpace = u64{8} << 30;
 class RamVolume {
 public:
     // `supplied` bytes are touched now: what the system needs to supply memory is not measured.
-    RamVolume(u32 mapBlock, u64 supplied) {
+    RamVolume(u32 mapBlock, Lending lending, u64 supplied) : lending_(lending) {
         void* space = mmap(nullptr, kAddressSpace, PROT_READ | PROT_WRITE,
                            MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
         if (space == MAP_FAILED) {
@@ -63,7 +63,9 @@ private:
             return kErrInvalid;
         }
         for (u32 at = 0; at < bytes; at += fs->mapBlockSize, ++bufs) {
-            bufs->data = volume->bytes_ + offset + at;
+            const u32 place =
+                volume->lending_ == Lending::kInOnePiece ? at : bytes - fs->mapBlockSize - at;
+            bufs->data = volume->bytes_ + offset + place;
             bufs->bh = reinterpret_cast<buffer_head*>(bufs->data);
         }
         return kOk;
@@ -82,6 +84,7 @@ private:
     static constexpr HfsCacheOps kCacheOps = {Release, Modify, Modify};
 
     u8* bytes_;
+    Lending lending_;  // apart: a node's blocks lie in reverse order
 };
 
 // Lets the heap touch `bytes` now, as the volume did.
@@ -102,8 +105,8 @@ void SupplyHeap(u64 bytes) {
 
 class TreehfsStore : public Store {
 public:
-    TreehfsStore(const Workload& load, u32 mapBlock)
-        : load_(load), volume_(mapBlock, kBytesPerRecord * load.count) {
+    TreehfsStore(const Workload& load, u32 mapBlock, Lending lending)
+        : load_(load), volume_(mapBlock, lending, kBytesPerRecord * load.count) {
         tree_.volume = &volume_.fs;
         tree_.fileId = kCatalogFileId;
         tree_.compareKeys = CompareCatKeysCaseIns;
@@ -200,8 +203,9 @@ private:
 
 }  // namespace
 
-std::unique_ptr<Store> MakeTreehfs(const Workload& load, std::uint32_t blocksPerNode) {
-    return std::make_unique<TreehfsStore>(load, kNodeSize / blocksPerNode);
+std::unique_ptr<Store> MakeTreehfs(const Workload& load, std::uint32_t blocksPerNode,
+                                   Lending lending) {
+    return std::make_unique<TreehfsStore>(load, kNodeSize / blocksPerNode, lending);
 }
 
 }  // namespace bench
