@@ -455,5 +455,37 @@ TEST(FindNameless, DataBehindTheKeyIsNoName) {
     }
 }
 
+// Nodes on two levels, wherever these are: a gap between them is asserted, and a reference too few.
+TEST(ClearPath, AssertsGapsAndReferencesOnEachLevel) {
+    Capture capture;
+    const Bytes content = NodeImage{}.Build(512);
+    const LooseNode lower(content, 512, 1);
+    const LooseNode upper(content, 512, 2);
+    for (u32 low = 0; low <= kMaxPathDepth; ++low) {
+        for (u32 high = low; high <= kMaxPathDepth; ++high) {
+            for (const s32 references : {1, 0}) {
+                HfsFindData path;
+                lower->refCount = 1;
+                upper->refCount = references;
+                path.path[low].node = lower.Get();
+                path.path[high].node = upper.Get();  // alone when they are one level
+                path.ClearPath();
+                Events expected;
+                if (high > low + 1) {
+                    expected.push_back(Asserted(752));
+                }
+                if (references == 0) {
+                    expected.push_back(Asserted(755));
+                }
+                EXPECT_EQ(capture.Take(), expected) << low << " " << high << " " << references;
+                EXPECT_EQ(upper->refCount, references - 1);
+                EXPECT_EQ(lower->refCount, high > low ? 0 : 1);
+                EXPECT_EQ(path.path[low].node, nullptr);
+                EXPECT_EQ(path.path[high].node, nullptr);
+            }
+        }
+    }
+}
+
 }  // namespace
 }  // namespace VELK::test

@@ -7,6 +7,7 @@
 #include <unistd.h>
 
 #include "bench.h"
+#include "hfs/treehfs/cache.h"
 
 namespace VELK::test {
 namespace {
@@ -96,6 +97,21 @@ TEST_P(NextNode, IsAskedForByEachInsertion) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Blocks, NextNode, ::testing::Values(512u, 4096u));
+
+// Each node that is taken behind the initialised part of the file is noted where the cache maps it.
+TEST(NewNode, IsNotedWhereTheCacheMapsIt) {
+    Bench bench(Blocks(512));
+    bench.Create(9, CompareCatKeysCaseIns);
+    for (u32 n = 0; n < 30; ++n) {
+        const HostKey key = NthHostKey(kCatalogFileId, n);
+        ASSERT_EQ(bench->InsertRecord(key.Get(), key.id, Pattern(60, n).data(), 60), kOk);
+        const HfsNode* last = NodeOf(bench->lastLink);
+        EXPECT_EQ(bench->newestNode, reinterpret_cast<std::uintptr_t>(last->bufs[0].data)) << n;
+    }
+    EXPECT_GT(bench->nodeCount, 4u);
+    bench->findData.ClearPath();
+    bench.capture.Take();
+}
 
 }  // namespace
 }  // namespace VELK::test

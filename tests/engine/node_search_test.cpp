@@ -10,6 +10,7 @@
 #include <cstring>
 
 #include "hfs/treehfs/hints.h"
+#include "hfs/treehfs/scratch.h"
 #include "node_bench.h"
 
 namespace VELK::test {
@@ -112,6 +113,147 @@ INSTANTIATE_TEST_SUITE_P(Searches, FencedNode,
                          ::testing::Values(Search{CompareCatKeysCaseIns, false},
                                            Search{CompareCatKeysCaseIns, true},
                                            Search{CompareCatKeysCaseBin, false}));
+
+// A node of two blocks in one piece, with a record over the end of the first.
+class NodeInOnePiece : public ::testing::TestWithParam<CompareKeysFn> {
+protected:
+    NodeInOnePiece() {
+        bench_.tree.nodeShift = 10;
+        bench_.tree.compareKeys = GetParam();
+    }
+
+    // Three records, the middle one at node offset `start`.
+    void Make(s8 kind, u32 start) {
+        NodeImage image{.kind = kind};
+        const u32 before = start - 14 - kKeySize;
+        image.records.push_back(Record(DiskCatKey(7, u"b"), Pattern(before, 1)));
+        image.records.push_back(Record(DiskCatKey(7, u"c"), 0x1234u));
+        image.records.push_back(Record(DiskCatKey(7, u"d"), 0x5678u));
+        node_ = bench_.Node(image.Build(kNodeSize), 3);
+    }
+    // Where the record's key is told to be by a search.
+    const u8* KeyFound() {
+        const HostKey host = HostCatKey(7, u"c");
+        SearchResult result{};
+        EXPECT_EQ(
+            SearchNode(&bench_.tree, node_->Get(), SoughtKey(&bench_.tree, host, host.id), &result),
+            kOk);
+        EXPECT_TRUE(result.found);
+        EXPECT_EQ(result.index, 1);
+        EXPECT_EQ(std::memcmp(result.record.key, DiskCatKey(7, u"c").data(), kKeySize), 0);
+        return reinterpret_cast<const u8*>(result.record.key);
+    }
+    bool IsInside() {
+        const HostKey host = HostCatKey(7, u"c");
+        SearchResult result{};
+        return SearchInside(&bench_.tree, node_->Get(), SoughtKey(&bench_.tree, host, host.id),
+                            &result);
+    }
+    bool View(RecordView* record) { return ViewPlain(&bench_.tree, node_->Get(), 1, record); }
+    u32 Child() { return PlainChild(&bench_.tree, node_->Get(), 1); }
+
+    NodeBench bench_{Geometry{kNodeSize, kBlockSize, true}};
+    std::unique_ptr<LooseNode> node_;
+};
+
+// Nobody is to find a tree usable without memory that finds it unusable where blocks lie apart.
+TEST_P(NodeInOnePiece, AKeyOverABlocksEndIsReadWhereItLiesIfItCouldBeGathered) {
+    Make(kBTLeafNode, kBlockSize - 4);
+    RecordView record;
+    EXPECT_FALSE(IsInside());
+    EXPECT_FALSE(View(&record));
+    EXPECT_EQ(bench_.tree.scratch, nullptr);
+    bench_.heap.FailNth(1);
+    const HostKey host = HostCatKey(7, u"c");
+    SearchResult result{};
+    EXPECT_EQ(
+        SearchNode(&bench_.tree, node_->Get(), SoughtKey(&bench_.tree, host, host.id), &result),
+        kErrNoMemory);
+    bench_.heap.FailNone();
+    EXPECT_EQ(KeyFound(), bench_.tree.scratch);
+
+    std::memset(bench_.tree.scratch, 0xEE, kNodeSize);
+    EXPECT_EQ(KeyFound(), node_->At(kBlockSize - 4));
+    EXPECT_TRUE(IsInside());
+    if (GetParam() == CompareCatKeysCaseIns) {
+        EXPECT_TRUE(View(&record));
+        EXPECT_EQ(reinterpret_cast<const u8*>(record.key), node_->At(kBlockSize - 4));
+    }
+    EXPECT_EQ(Bytes(bench_.tree.scratch, bench_.tree.scratch + kNodeSize), Bytes(kNodeSize, 0xEE));
+    EXPECT_EQ(bench_.capture.Take(), Events{});
+}
+
+TEST_P(NodeInOnePiece, DataOverABlocksEndIsInOnePieceIfItCouldBeGathered) {
+    Make(kBTIndexNode, kBlockSize - kKeySize - 2);
+    RecordView record;
+    const bool isFolded = GetParam() == CompareCatKeysCaseIns;
+    EXPECT_EQ(View(&record), isFolded);
+    if (isFolded) {
+        EXPECT_EQ(record.dataFirstBytes, 2u);
+    }
+    EXPECT_EQ(Child(), 0u);
+    EXPECT_EQ(KeyFound(), node_->At(kBlockSize - kKeySize - 2));
+    ASSERT_EQ(EnsureScratch(&bench_.tree), kOk);
+    EXPECT_EQ(View(&record), isFolded);
+    if (isFolded) {
+        EXPECT_GE(record.dataFirstBytes, kChildSize);
+    }
+    EXPECT_EQ(Child(), 0x1234u);
+}
+
+// Data of more than a block lies in two now and could come to lie in three, where each search that
+// meets it has something to say: the order of its key is not remembered.
+TEST(NodeWithLongData, IsSearchedAgainWhereItLies) {
+    constexpr u32 kSize = 2048;
+    for (const u32 dataSize : {kBlockSize, kBlockSize + 2}) {
+        for (const bool inOnePiece : {false, true}) {
+            NodeBench bench(Geometry{kSize, kBlockSize, inOnePiece});
+            bench.tree.nodeShift = 11;
+            bench.tree.compareKeys = CompareCatKeysCaseIns;
+            const NodeImage image{.kind = kBTIndexNode,
+                                  .records = {Record(DiskCatKey(7, u"c"), Pattern(dataSize, 1))}};
+            const auto node = bench.Node(image.Build(kSize), 3);
+            alignas(HfsHintTable) u8 memory[offsetof(HfsHintTable, hints) + 64 * sizeof(HfsHint)]{};
+            node->Get()->hints = reinterpret_cast<HfsHintTable*>(memory);
+            const HostKey host = HostCatKey(7, u"c");
+            SoughtKey key(&bench.tree, host, host.id);
+            key.LearnOrder();
+            SearchResult result{};
+            EXPECT_EQ(SearchNode(&bench.tree, node->Get(), key, &result), kOk);
+            EXPECT_TRUE(result.found);
+            EXPECT_EQ(Hints(&bench.tree, node->Get()).Order(0) != 0, dataSize == kBlockSize);
+            EXPECT_EQ(bench.capture.Take(), Events{});
+            node->Get()->hints = nullptr;
+        }
+    }
+}
+
+// That there is no memory for a key is for whoever asked: no fault of the node, also in one that
+// remembers what searches met.
+TEST(NodeWithoutMemory, ReportsNothingOfAKeyOverABlocksEnd) {
+    for (const bool inOnePiece : {false, true}) {
+        NodeBench bench(Geometry{kNodeSize, kBlockSize, inOnePiece});
+        bench.tree.nodeShift = 10;
+        bench.tree.compareKeys = CompareCatKeysCaseIns;
+        const NodeImage image{.kind = kBTIndexNode,
+                              .records = {Record(DiskCatKey(7, std::u16string(255, u'c')), 5u)}};
+        const auto node = bench.Node(image.Build(kNodeSize), 3);
+        alignas(HfsHintTable) u8 memory[offsetof(HfsHintTable, hints) + 32 * sizeof(HfsHint)]{};
+        node->Get()->hints = reinterpret_cast<HfsHintTable*>(memory);
+        const HostKey host = HostCatKey(7, u"c");
+        SoughtKey key(&bench.tree, host, host.id);
+        key.LearnOrder();
+        SearchResult result{};
+        bench.heap.FailNth(1);
+        EXPECT_EQ(SearchNode(&bench.tree, node->Get(), key, &result), kErrNoMemory);
+        bench.heap.FailNone();
+        EXPECT_EQ(bench.capture.Take(), Events{});
+        node->Get()->hints = nullptr;
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Orders, NodeInOnePiece,
+                         ::testing::Values(CompareCatKeysCaseIns, CompareCatKeysCaseBin));
 
 }  // namespace
 }  // namespace VELK::test

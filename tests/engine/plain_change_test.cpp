@@ -1,10 +1,14 @@
 // Changes done in one go, in a node of one block or of two in one piece, against the long way that
 // nodes of two blocks go: with whatever damage to the bytes they go by, all give the same answer,
 // say the same and leave the same bytes.
+#include <algorithm>
+#include <bit>
 #include <memory>
 
 #include "bench.h"
+#include "damages.h"
 #include "hfs/treehfs/node_desc.h"
+#include "hfs/treehfs/record_move.h"
 #include "hfs/treehfs/separator.h"
 #include "node_bench.h"
 
@@ -15,55 +19,6 @@ constexpr u32 kNodeSize = 1024;
 constexpr Geometry kOneBlock = {kNodeSize, kNodeSize};
 constexpr Geometry kTwoBlocks = {kNodeSize, kNodeSize / 2};
 constexpr Geometry kOnePiece = {kNodeSize, kNodeSize / 2, true};
-
-struct Damage {
-    u32 at;  // node offset
-    u32 value;
-    u32 width;  // bytes
-};
-std::ostream& operator<<(std::ostream& out, const Damage& damage) {
-    return out << damage.value << " in " << damage.width << " bytes at " << damage.at;
-}
-
-// Kinds, counts, starts and key lengths that lead out of the ordinary, and some that do not.
-std::vector<Damage> DamagesOf(const Bytes& content) {
-    const u32 size = static_cast<u32>(content.size());
-    const u32 count = Get16(content, kDescNumRecords);
-    std::vector<Damage> damages;
-    for (const u32 kind : {0xFFu, 0x00u, 0x01u, 0x02u, 0x03u}) {
-        damages.push_back({kDescKind, kind, 1});
-    }
-    damages.push_back({kDescHeight, 5, 1});
-    for (const u32 other : {0u, 1u, count - 1, count + 1, 504u, 505u, 510u, 511u, 512u, 0xFFFFu}) {
-        damages.push_back({kDescNumRecords, other, 2});
-    }
-    const u32 free = Get16(content, size - 2 * (count + 1));
-    for (u32 record = 0; record <= count; ++record) {
-        const u32 slot = size - 2 * (record + 1);
-        const u32 start = Get16(content, slot);
-        for (const u32 other :
-             {0u, 2u, 12u, 13u, 14u, start - 2, start - 1, start + 1, start + 2, start + 30, free,
-              free + 2, slot, size - 2, size, 0x8000u, 0xFFFEu}) {
-            damages.push_back({slot, other & 0xFFFF, 2});
-        }
-        if (record < count) {
-            const u32 length = Get16(content, start);
-            for (const u32 other : {0u, 1u, 5u, 6u, length - 2, length - 1, length + 1, length + 2,
-                                    length + 20, 516u, 520u, 521u, 0xFFFFu}) {
-                damages.push_back({start, other & 0xFFFF, 2});
-            }
-        }
-    }
-    return damages;
-}
-
-void Apply(const Damage& damage, Bytes* content) {
-    if (damage.width == 1) {
-        (*content)[damage.at] = static_cast<u8>(damage.value);
-    } else {
-        Put16(content, damage.at, damage.value);
-    }
-}
 
 struct Outcome {
     int status = kOk;
@@ -125,13 +80,14 @@ TEST(PlainInsertion, ComesToWhatTheLongWayDoes) {
 }
 
 // Takes the first record of a leaf out after somebody damaged that, or the root, behind the lookup.
-constexpr u32 kKeys = 90;
+constexpr u32 kKeys = 90;  // to a KiB of a node: several leaves below a root
 
 class FirstRecordGoes {
 public:
-    explicit FirstRecordGoes(const Geometry& geometry) : bench_(Blocks(geometry)) {
-        bench_.Create(10, CompareCatKeysCaseIns);
-        for (u32 n = 0; n < kKeys; ++n) {
+    explicit FirstRecordGoes(const Geometry& geometry)
+        : nodeSize_(geometry.nodeSize), keys_(kKeys * nodeSize_ / 1024), bench_(Blocks(geometry)) {
+        bench_.Create(static_cast<u32>(std::countr_zero(nodeSize_)), CompareCatKeysCaseIns);
+        for (u32 n = 0; n < keys_; ++n) {
             const HostKey key = Key(n);
             EXPECT_EQ(bench_->InsertRecord(key, key.id, Pattern(30, n).data(), 30), kOk);
         }
@@ -155,8 +111,8 @@ public:
         StandOn(leaf);
         HfsNode* root = bench_->findData.path[2].node;
         HfsNode* damaged = bench_->findData.path[level].node;
-        EXPECT_EQ(bench_->SetDirty(root, 0, kNodeSize), kOk);
-        EXPECT_EQ(bench_->SetDirty(damaged, 0, kNodeSize), kOk);
+        EXPECT_EQ(bench_->SetDirty(root, 0, nodeSize_), kOk);
+        EXPECT_EQ(bench_->SetDirty(damaged, 0, nodeSize_), kOk);
         for (u32 i = 0; i < damage.width; ++i) {
             const u32 at = damage.at + i;
             const u32 block = bench_->header.blockSize;
@@ -171,13 +127,33 @@ public:
         return outcome;
     }
 
+    // Whether the root takes the first key of a leaf at once, when they lie in one piece or do not.
+    bool ReplacesFromLeaf(bool isRootOnePiece, bool isLeafOnePiece) {
+        StandOn(1);
+        HfsNode* leaf = bench_->findData.path[1].node;
+        EXPECT_EQ(bench_->SetDirty(bench_->findData.path[2].node, 0, nodeSize_), kOk);
+        bench_->findData.path[2].node->isOnePiece = isRootOnePiece;
+        leaf->isOnePiece = isLeafOnePiece;
+        return ReplacePlainSeparator(&*bench_.tree, &bench_->findData, 2, leaf);
+    }
+
+    // The same while one of the root's blocks is not marked.
+    bool ReplacesWithout(u32 block) {
+        StandOn(1);
+        HfsNode* root = bench_->findData.path[2].node;
+        EXPECT_EQ(bench_->SetDirty(root, 0, nodeSize_), kOk);
+        root->bufs[block].dirty = false;
+        return ReplacePlainSeparator(&*bench_.tree, &bench_->findData, 2,
+                                     bench_->findData.path[1].node);
+    }
+
     // Whether the root takes the first key of a leaf at once that a damaged volume lent in the same
     // memory.
     bool ReplacesInOneMemory() {
         StandOn(1);
         HfsNode* leaf = bench_->findData.path[1].node;
         HfsNode* root = bench_->findData.path[2].node;
-        EXPECT_EQ(bench_->SetDirty(root, 0, kNodeSize), kOk);
+        EXPECT_EQ(bench_->SetDirty(root, 0, nodeSize_), kOk);
         u8* const own = leaf->bufs[0].data;
         leaf->bufs[0].data = root->bufs[0].data;
         const bool replaces = ReplacePlainSeparator(&*bench_.tree, &bench_->findData, 2, leaf);
@@ -191,7 +167,7 @@ private:
     }
     // Puts the tree's own path on the first record of the nth leaf.
     void StandOn(u32 leaf) {
-        for (u32 n = 0; n < kKeys; ++n) {
+        for (u32 n = 0; n < keys_; ++n) {
             const HostKey key = Key(n);
             bool found = false;
             EXPECT_EQ(
@@ -207,13 +183,15 @@ private:
     Bytes Content(u32 number) {
         const HfsNode* node = CachedNode(*bench_.tree, number);
         Bytes bytes;
-        for (u32 at = 0; at < kNodeSize; ++at) {
+        for (u32 at = 0; at < nodeSize_; ++at) {
             const u32 block = bench_->header.blockSize;
             bytes.push_back(node->bufs[at / block].data[at % block]);
         }
         return bytes;
     }
 
+    u32 nodeSize_;
+    u32 keys_;
     Bench bench_;
 };
 
@@ -238,6 +216,72 @@ TEST(PlainSeparator, ComesToWhatTheLongWayDoes) {
         }
         ASSERT_FALSE(HasFatalFailure());
     }
+}
+
+// Blocks that were not marked are asked for, whatever was marked of the others.
+TEST(PlainChange, IsNotForNodesOfWhichPartIsMarked) {
+    constexpr Geometry kFourBlocks = {2048, 512, true};
+    const Bytes content = LeafOf(2048, SomeRecords(3, 30));
+    const Bytes key = DiskCatKey(7, u"middle");
+    const auto play = [&](u32 unmarked, int what) {
+        NodeBench bench(kFourBlocks);
+        const auto node = bench.Node(content, 11);
+        const auto other = bench.Node(content, 12);
+        for (HfsNode* each : {node->Get(), other->Get()}) {
+            EXPECT_EQ(bench.tree.SetDirty(each, 0, 2048), kOk);
+        }
+        node->Get()->bufs[unmarked].dirty = false;
+        bench.RefuseAccess(1);
+        int status = kOk;
+        if (what == 0) {
+            status = bench.tree._InsertKeyRecord(node->Get(), 0,
+                                                 reinterpret_cast<const BTreeKey*>(key.data()), 0,
+                                                 "data", 4, nullptr);
+        } else if (what == 1) {
+            status = bench.tree._DeleteRecord(node->Get(), 0);
+        } else if (what == 2) {
+            status = MoveRecordsLeft(&bench.tree, node->Get(), other->Get(), 2);
+        } else {
+            status = MoveRecordsRight(&bench.tree, other->Get(), node->Get(), 2);
+        }
+        bench.capture.Take();
+        return status;
+    };
+    for (int what = 0; what < 4; ++what) {
+        EXPECT_EQ(play(0, what), kRefused) << what;  // records and their count
+        EXPECT_EQ(play(3, what), kRefused) << what;  // the table
+    }
+}
+
+TEST(PlainSeparator, IsNotExchangedInANodeOfWhichPartIsMarked) {
+    for (u32 unmarked = 0; unmarked < 4; ++unmarked) {
+        FirstRecordGoes tree({2048, 512, true});
+        EXPECT_FALSE(tree.ReplacesWithout(unmarked)) << unmarked;
+    }
+}
+
+// The record behind the separator reaches into a third block, of which each look at it tells.
+TEST(PlainSeparator, IsNotExchangedInFrontOfDataInThreeBlocks) {
+    constexpr Geometry kApart = {2048, 512};
+    constexpr Geometry kTogether = {2048, 512, true};
+    const Bytes root = FirstRecordGoes(kApart).Root();
+    const u32 count = Get16(root, kDescNumRecords);
+    const u32 freeSlot = 2048 - 2 * (count + 1);
+    const Damage damage = {freeSlot, Get16(root, freeSlot) + 1024u, 2};
+    const Outcome expected = FirstRecordGoes(kApart).Play(count - 2, 2, damage);
+    EXPECT_NE(std::find(expected.events.begin(), expected.events.end(), Asserted(505)),
+              expected.events.end());
+    EXPECT_EQ(FirstRecordGoes(kTogether).Play(count - 2, 2, damage), expected);
+}
+
+// A volume may lend one node in one piece and the next one not.
+TEST(PlainSeparator, IsExchangedBetweenNodesInOnePieceOnly) {
+    FirstRecordGoes tree(kOnePiece);
+    const Bytes before = tree.Root();
+    EXPECT_FALSE(tree.ReplacesFromLeaf(true, false));
+    EXPECT_FALSE(tree.ReplacesFromLeaf(false, true));
+    EXPECT_EQ(tree.Root(), before);
+    EXPECT_TRUE(tree.ReplacesFromLeaf(true, true));
 }
 
 TEST(PlainSeparator, IsNotExchangedInTheMemoryItComesFrom) {

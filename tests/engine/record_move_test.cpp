@@ -217,5 +217,40 @@ TEST(MoveRecordsOfOneMemory, GoOneByOneInOneBlockAndInMany) {
     }
 }
 
+// Nodes of two blocks in one piece, the second block of the giver being the first of the receiver:
+// the first record that comes lands on the giver's table. So it does where blocks lie anywhere.
+TEST(MoveRecordsOfOneMemory, GoOneByOneWhereOneBlockIsShared) {
+    constexpr u32 kTable = 16;  // of the giver
+    struct Outcome {
+        int status;
+        Events events;
+        Bytes bytes;
+        bool operator==(const Outcome&) const = default;
+    };
+    const auto play = [](bool inOnePiece) {
+        NodeBench bench(Geometry{1024, 512});
+        const u32 room = 512 - kTable - 14 - static_cast<u32>(NthRecord(40, 0).size());
+        const Bytes given = UsedLeaf(1024, kTable / 2 - 1, 3);
+        const Bytes received = LeafOf(1024, {NthRecord(40, room - 20)});
+        Bytes memory(3 * 512);
+        std::copy(given.begin(), given.end(), memory.begin());
+        std::copy(received.begin(), received.end(), memory.begin() + 512);
+        std::copy(given.end() - kTable, given.end(), memory.begin() + 1024 - kTable);
+        const auto giver = bench.Node(given, 11);
+        const auto receiver = bench.Node(received, 12);
+        u32 block = 0;
+        for (HfsNode* node : {giver->Get(), receiver->Get()}) {
+            node->isOnePiece = inOnePiece;
+            node->bufs[0].data = memory.data() + block * 512;
+            node->bufs[1].data = memory.data() + (block + 1) * 512;
+            EXPECT_EQ(bench.tree.SetDirty(node, 0, 1024), kOk);
+            block += 1;
+        }
+        const int status = MoveRecordsLeft(&bench.tree, receiver->Get(), giver->Get(), 3);
+        return Outcome{status, bench.capture.Take(), memory};
+    };
+    EXPECT_EQ(play(true), play(false));
+}
+
 }  // namespace
 }  // namespace VELK::test

@@ -355,6 +355,16 @@ TEST_F(Mount, TruncatedImageIsReadAsFarAsItGoes) {
     EXPECT_EQ(kErrVolumeTruncated, tree->GetINode(1, &node, false));
     EXPECT_EQ("image ends at 12,388, catalog node 1 (0x3000) lies behind that",
               volume_->LastIoProblem().Text());
+    // A node of eight blocks, read at once: what is told is where it stops being there.
+    options_.mapBlockSize = 512;
+    disk.resize(test::CatalogOffset(shape) + 4096 + 2 * 512 + 100);
+    ASSERT_TRUE(Open(disk)) << problem_.Text();
+    tree = volume_->Tree(kCatalogFileId, &problem_);
+    ASSERT_NE(nullptr, tree) << problem_.Text();
+    EXPECT_EQ(kErrVolumeTruncated, tree->GetINode(1, &node, false));
+    EXPECT_EQ("image ends at 13,412, catalog node 1 (0x3400) lies behind that",
+              volume_->LastIoProblem().Text());
+    options_.mapBlockSize = 0;
     disk.resize(test::CatalogOffset(shape) + 10);
     ASSERT_TRUE(Open(disk)) << problem_.Text();
     EXPECT_EQ("catalog tree: image ends at 8202, catalog file (0x2000) lies behind that",

@@ -182,17 +182,17 @@ public:
     // REQUIRES of all writers: the blocks written were marked with SetDirty.
     void CopyIn(u32 offset, const void* source, u32 size) const {
         if (Contains(offset, size)) {
-            std::memmove(WriteAt(offset), source, size);
+            std::memmove(WriteAt(offset, size), source, size);
         }
     }
     void Fill(u32 offset, u8 value, u32 size) const {
         if (Contains(offset, size)) {
-            std::memset(WriteAt(offset), value, size);
+            std::memset(WriteAt(offset, size), value, size);
         }
     }
     void Move(u32 target, u32 source, u32 size) const {  // overlap allowed
         if (Contains(target, size) && Contains(source, size)) {
-            std::memmove(WriteAt(target), At(source), size);
+            std::memmove(WriteAt(target, size), At(source), size);
         }
     }
 
@@ -200,8 +200,12 @@ private:
     bool Contains(u32 offset, u32 size) const {
         return __builtin_expect(static_cast<u64>(offset) + size <= size_, true);
     }
-    u8* WriteAt(u32 offset) const {
-        TrapIfClean(&bufs_[offset >> blockShift_]);
+    u8* WriteAt(u32 offset, [[maybe_unused]] u32 size) const {
+#ifdef TREEHFS_PARANOID
+        for (u32 at = offset; at < offset + size; at = ((at >> blockShift_) + 1) << blockShift_) {
+            TrapIfClean(&bufs_[at >> blockShift_]);
+        }
+#endif
         return data_ + offset;
     }
 

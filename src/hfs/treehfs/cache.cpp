@@ -9,6 +9,7 @@
 #include "hfs/treehfs/next_node.h"
 #include "hfs/treehfs/node_desc.h"
 #include "hfs/treehfs/noderef.h"
+#include "hfs/treehfs/one_piece.h"
 #include "hfs/treehfs/prefetch.h"
 #include "hfs/treehfs/report.h"
 #include "platform/heap.h"
@@ -126,15 +127,6 @@ void FreeNodeMemory(CBTreeHfs* tree, HfsNode* node) {
         tree->header.cache->Release(node->bufs[i].bh, 0);
     }
     velk_heap_free(node);
-}
-
-bool LieTogether(const BTHeaderMem& header, const HfsBcbBuf* blocks) {
-    for (u32 i = 1; i < header.blocksPerNode; ++i) {
-        if (blocks[i].data != blocks[i - 1].data + header.blockSize) {
-            return false;
-        }
-    }
-    return true;
 }
 
 u8* TailOf(const BTHeaderMem& header, HfsNode* node) {
@@ -268,7 +260,7 @@ int LoadNode(CBTreeHfs* tree, const Place& place, u32 nodeNum, NodeUse use, HfsN
         return status;
     }
     tree->readCount += 1;
-    node->isOnePiece = LieTogether(tree->header, node->bufs);
+    node->isOnePiece = LieTogether(&tree->header, node->bufs);
     // The descriptor and the offset table: needed once the node is linked.
     Prefetch(node->bufs[0].data, 1);
     Prefetch(TailOf(tree->header, node), 1);

@@ -5,7 +5,7 @@
 
 namespace VELK {
 
-// The child of a record of which length field and child lie in one block each; 0: the record is not
+// The child of a record of which length field and child lie in one piece each; 0: the record is not
 // so plain.
 template <typename Blocks>
 [[gnu::always_inline]] inline u32 PlainChildIn(const CBTreeHfs* tree, const HfsNode* node,

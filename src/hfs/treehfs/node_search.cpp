@@ -1,4 +1,4 @@
-// Search in a node. Nearly every probe meets a sound record whose key lies in one block; that case
+// Search in a node. Nearly every probe meets a sound record whose key lies in one piece; that case
 // is decided here, without a call and with the memory of the next probes already asked for. Any
 // doubt goes the careful way of FetchKey, which also reports what is wrong.
 #include "hfs/treehfs/node_search.h"
@@ -73,14 +73,13 @@ bool MakeOrder(u32 parent, u32 length, Unit unit, u64* order) {
 class NothingKnown {
 public:
     static bool Decide(u32, const SoughtKey&, int*) { return false; }
-    template <typename Keys>
-    static void Learn(u32, const PlainRecord&, const Keys&) {}
+    static void Learn(u32, const PlainRecord&) {}
 };
 
 // In an index node of folded keys: their order in one number.
 class KnownSeparators {
 public:
-    explicit KnownSeparators(const Hints& hints) : hints_(hints) {}
+    KnownSeparators(const BTHeaderMem* hdr, const Hints& hints) : hdr_(hdr), hints_(hints) {}
 
     bool Decide(u32 index, const SoughtKey& key, int* order) const {
         const u64 known = hints_.Order(index);
@@ -92,9 +91,8 @@ public:
     }
     // Only of a record that can move without coming to lie in three blocks: each search that meets
     // such data has something to say.
-    template <typename Keys>
-    void Learn(u32 index, const PlainRecord& record, const Keys& keys) const {
-        if (HFS_UNLIKELY(!keys.StaysShort(record))) {
+    void Learn(u32 index, const PlainRecord& record) const {
+        if (HFS_UNLIKELY(!StaysInTwoBlocks(hdr_, record.DataSize()))) {
             return;
         }
         const u8* key = record.key;
@@ -107,6 +105,7 @@ public:
     }
 
 private:
+    const BTHeaderMem* hdr_;
     Hints hints_;
 };
 
@@ -204,7 +203,7 @@ int Search(CBTreeHfs* tree, const HfsNode* node, const SoughtKey& key, Doubt dou
         if (!known.Decide(index, key, &order)) {
             PlainRecord record;
             if (HFS_LIKELY(quick && keys.Find(index, &record))) {
-                known.Learn(index, record, keys);
+                known.Learn(index, record);
                 order = Shape::Compare(key, KeyOf(record));
                 if (order == 0) {
                     result->record = keys.View(record);
@@ -261,7 +260,7 @@ template <typename Blocks>
     if (hints.Order(count / 2) == 0 && HasQuickKeys(tree->header, key, count)) {
         PrefetchFor(keys, Height(node), static_cast<s32>(count) - 1);
     }
-    return Search(tree, node, key, doubt, keys, KnownSeparators(hints), result);
+    return Search(tree, node, key, doubt, keys, KnownSeparators(&tree->header, hints), result);
 }
 
 // SearchInside without the search proper. True: the key lies between the first and the last.

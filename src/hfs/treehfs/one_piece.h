@@ -9,8 +9,18 @@
 
 namespace VELK {
 
+// What HfsNode::isOnePiece says of the blocks of a node.
+inline bool LieTogether(const BTHeaderMem* hdr, const HfsBcbBuf* blocks) {
+    for (u32 i = 1; i < hdr->blocksPerNode; ++i) {
+        if (blocks[i].data != blocks[i - 1].data + hdr->blockSize) {
+            return false;
+        }
+    }
+    return true;
+}
+
 inline bool IsOnePiece(const BTHeaderMem* hdr, const HfsNode* node) {
-    return hdr->blocksPerNode == 1 || node->isOnePiece;
+    return hdr->blockSize == hdr->nodeSize || node->isOnePiece;
 }
 
 inline bool IsMarked(const BTHeaderMem* hdr, const HfsNode* node) {
@@ -33,10 +43,16 @@ inline bool LieApart(const BTHeaderMem* hdr, const HfsNode* one, const HfsNode* 
     return (a > b ? a - b : b - a) >= hdr->nodeSize;
 }
 
-// Whether a reader can follow data of that size wherever it lies: in three blocks it is asserted
-// each time its record is looked at.
+// Whether data of that size lies in no more than two blocks wherever it is moved: in three it is
+// asserted each time its record is looked at.
 inline bool StaysInTwoBlocks(const BTHeaderMem* hdr, u32 dataSize) {
     return dataSize <= hdr->blockSize;
+}
+
+// Whether there is nothing to say of a record whose data lies from `data` to `end`, wherever it is
+// moved.
+inline bool CanMoveData(const BTHeaderMem* hdr, u32 data, u32 end) {
+    return data < end && StaysInTwoBlocks(hdr, end - data);
 }
 
 }  // namespace VELK

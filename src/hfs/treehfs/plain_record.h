@@ -1,4 +1,4 @@
-// Records where they lie in their nodes. Nearly every record is sound and has its key in one block;
+// Records where they lie in their nodes. Nearly every record is sound and has its key in one piece;
 // that case is decided here, without a call. In any doubt a caller goes the careful way of
 // FetchKey, which also reports what is wrong.
 #pragma once
@@ -20,12 +20,11 @@ public:
     const u8* At(u32 offset) const { return data_ + offset; }
     // Slot of record `index` in the lower half, that of the next record in the upper one.
     u32 SlotPair(u32 index) const { return GetBe32(slots_ - kSlotSize * std::size_t{index + 2}); }
-    // Whether the `size` bytes from `offset` on lie in one block, those from `start` to `end` in at
-    // most two. REQUIRES of both: they lie inside the node.
+    // Whether the `size` bytes from `offset` on can be read in one piece, and whether those from
+    // `start` to `end` lie in two blocks at most. REQUIRES of both: they lie inside the node.
     static bool IsWhole(u32, u32) { return true; }
     static bool IsShort(u32, u32) { return true; }
-    static bool FitsBlock(u32) { return true; }
-    // Bytes from `offset` to the end of its block, or more when a node has but one.
+    // Bytes from `offset` on that can be read in one piece, or more when the whole node can.
     static u32 Room(u32) { return ~0u; }
 
 private:
@@ -42,7 +41,6 @@ public:
     bool IsShort(u32 start, u32 end) const {
         return ((end - 1) >> shift_) - (start >> shift_) <= 1;
     }
-    bool FitsBlock(u32 size) const { return size <= mask_ + 1; }
     u32 Room(u32 offset) const { return mask_ + 1 - (offset & mask_); }
 
 protected:
@@ -168,10 +166,6 @@ public:
         return {KeyOf(record), blocks_.At(record.data),  record.keySize, record.DataSize(),
                 record.data,   blocks_.Room(record.data)};
     }
-    // Whether the record's data fits into one block.
-    bool StaysShort(const PlainRecord& record) const {
-        return blocks_.FitsBlock(record.DataSize());
-    }
 
     [[gnu::always_inline]] void Prefetch(u32 index) const {
         const u32 start = blocks_.SlotPair(index) & 0xFFFF;
@@ -192,7 +186,7 @@ inline bool TableFits(const BTHeaderMem& header, u32 count) {
 }
 
 // FetchKey of a leaf whose keys are in folded order. False, nothing reported: something about the
-// record is out of the ordinary, or its key lies in two blocks.
+// record is out of the ordinary, or its key in more than one piece.
 [[gnu::always_inline]] inline bool ViewPlain(const CBTreeHfs* tree, const HfsNode* leaf, u32 index,
                                              RecordView* record) {
     const BTHeaderMem* hdr = &tree->header;

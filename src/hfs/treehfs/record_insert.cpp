@@ -158,7 +158,7 @@ Plain OpenPlainGap(CBTreeHfs* tree, HfsNode* node, u32 index, u32 size, u32* gap
             return Plain::kDoubtful;
         }
         const u32 dataStart = start + PaddedKeySize(GetBe16(data + start));
-        if (dataStart >= end || !StaysInTwoBlocks(hdr, end - dataStart)) {
+        if (!CanMoveData(hdr, dataStart, end)) {
             return Plain::kDoubtful;
         }
         bytes.Move(start + size, start, free - start);

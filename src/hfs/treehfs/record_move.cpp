@@ -55,8 +55,7 @@ void MarkAgain(CBTreeHfs* tree, HfsNode* node) {
 // Whether GetKey has nothing to say of the record, wherever it lies.
 [[gnu::always_inline]] inline bool IsPlain(const BTHeaderMem* hdr, const Table& table, u32 index) {
     const u32 data = table.Start(index) + PaddedKeySize(table.KeyLength(index));
-    const u32 end = table.Start(index + 1);
-    return data < end && StaysInTwoBlocks(hdr, end - data);
+    return CanMoveData(hdr, data, table.Start(index + 1));
 }
 
 // Whether records first .. first + count - 1 of `giver` can go to `receiver` in one go: nothing on
@@ -156,7 +155,7 @@ void MoveBack(const CBTreeHfs* tree, HfsNode* right, HfsNode* left, u32 count) {
 
 }  // namespace
 
-// Records go one by one only as long as that may be refused: with the first one both nodes are
+// Records go one by one only as long as that may be refused: until all blocks of both nodes are
 // announced as changed.
 int MoveRecordsLeft(CBTreeHfs* tree, HfsNode* left, HfsNode* right, u32 count) {
     for (; count > 0; --count) {

@@ -20,7 +20,7 @@ bool NodesOverlap(const CBTreeHfs* tree) {
     return tree->header.nodeSize != 1u << tree->nodeShift;
 }
 
-// The first record of a node, if its key lies in one block and can become that of a separator as it
+// The first record of a node, if its key lies in one piece and can become that of a separator as it
 // is. REQUIRES: the node lies in one piece.
 bool FindFirst(const CBTreeHfs* tree, const HfsNode* node, PlainRecord* first) {
     const BTHeaderMem* hdr = &tree->header;
@@ -44,8 +44,7 @@ bool CanMoveBehind(const BTHeaderMem* hdr, const u8* data, const RecordSlots& sl
     }
     const u32 nextEnd = GetBe16(data + SlotOffset(hdr, index + 2));
     const u32 nextData = slots.end + PaddedKeySize(GetBe16(data + slots.end));
-    return IsInsertPoint(nextEnd, slots.free) && nextData < nextEnd &&
-           StaysInTwoBlocks(hdr, nextEnd - nextData);
+    return IsInsertPoint(nextEnd, slots.free) && CanMoveData(hdr, nextData, nextEnd);
 }
 
 }  // namespace

@@ -140,7 +140,7 @@ bool IsNodeSize(u32 size) {
 }
 
 // The map block is the smallest node size of the volume's trees, so that nearly every node is one
-// piece in memory whatever the allocation block.
+// block whatever the allocation block.
 Problem ChooseMapBlock(ImageVolume::State* state) {
     u32 smallest = 0;
     for (std::size_t i = 0; i < kTreeCount; ++i) {

@@ -44,7 +44,7 @@ int ImageVolume::State::IoStatus(const IoResult& result, u32 fileId, u64 forkOff
     if (result.error == kIoNoMemory) {
         return kErrNoMemory;
     }
-    const u64 at = place.offset + result.offset;
+    u64 at = place.offset + result.offset;
     std::string where =
         fileId == 0 ? std::string("volume") : std::string(ForkName(fileId)) + " file";
     std::optional<u32> node;
@@ -54,6 +54,9 @@ int ImageVolume::State::IoStatus(const IoResult& result, u32 fileId, u64 forkOff
         where = std::string(ForkName(fileId)) + " node " + std::to_string(*node);
     }
     if (result.error == kIoPastEnd) {
+        if (node && at < image->Size()) {  // the first map block that is not all there
+            at += (image->Size() - at) / fs.mapBlockSize * fs.mapBlockSize;
+        }
         lastIo = FailureAt(at,
                            "image ends at " + Position(image->Size()) + ", " + where + " (" +
                                HexOffset(at) + ") lies behind that",
