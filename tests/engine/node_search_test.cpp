@@ -201,29 +201,43 @@ TEST_P(NodeInOnePiece, DataOverABlocksEndIsInOnePieceIfItCouldBeGathered) {
     EXPECT_EQ(Child(), 0x1234u);
 }
 
+// An index node of one record, with room for what searches learn of it.
+struct HintedIndex {
+    HintedIndex(const Geometry& geometry, const Bytes& record)
+        : bench(geometry),
+          node(bench.Node(
+              NodeImage{.kind = kBTIndexNode, .records = {record}}.Build(geometry.nodeSize), 3)) {
+        bench.tree.nodeShift = geometry.nodeSize == 1024 ? 10 : 11;
+        bench.tree.compareKeys = CompareCatKeysCaseIns;
+        node->Get()->hints = reinterpret_cast<HfsHintTable*>(memory);
+    }
+    ~HintedIndex() { node->Get()->hints = nullptr; }
+
+    int Search(SearchResult* result) {
+        const HostKey host = HostCatKey(7, u"c");
+        SoughtKey key(&bench.tree, host, host.id);
+        key.LearnOrder();
+        return SearchNode(&bench.tree, node->Get(), key, result);
+    }
+
+    NodeBench bench;
+    std::unique_ptr<LooseNode> node;
+    alignas(HfsHintTable) u8 memory[offsetof(HfsHintTable, hints) + 64 * sizeof(HfsHint)]{};
+};
+
 // Data of more than a block lies in two now and could come to lie in three, where each search that
 // meets it has something to say: the order of its key is not remembered.
 TEST(NodeWithLongData, IsSearchedAgainWhereItLies) {
-    constexpr u32 kSize = 2048;
     for (const u32 dataSize : {kBlockSize, kBlockSize + 2}) {
         for (const bool inOnePiece : {false, true}) {
-            NodeBench bench(Geometry{kSize, kBlockSize, inOnePiece});
-            bench.tree.nodeShift = 11;
-            bench.tree.compareKeys = CompareCatKeysCaseIns;
-            const NodeImage image{.kind = kBTIndexNode,
-                                  .records = {Record(DiskCatKey(7, u"c"), Pattern(dataSize, 1))}};
-            const auto node = bench.Node(image.Build(kSize), 3);
-            alignas(HfsHintTable) u8 memory[offsetof(HfsHintTable, hints) + 64 * sizeof(HfsHint)]{};
-            node->Get()->hints = reinterpret_cast<HfsHintTable*>(memory);
-            const HostKey host = HostCatKey(7, u"c");
-            SoughtKey key(&bench.tree, host, host.id);
-            key.LearnOrder();
+            HintedIndex index({2048, kBlockSize, inOnePiece},
+                              Record(DiskCatKey(7, u"c"), Pattern(dataSize, 1)));
             SearchResult result{};
-            EXPECT_EQ(SearchNode(&bench.tree, node->Get(), key, &result), kOk);
+            EXPECT_EQ(index.Search(&result), kOk);
             EXPECT_TRUE(result.found);
-            EXPECT_EQ(Hints(&bench.tree, node->Get()).Order(0) != 0, dataSize == kBlockSize);
-            EXPECT_EQ(bench.capture.Take(), Events{});
-            node->Get()->hints = nullptr;
+            EXPECT_EQ(Hints(&index.bench.tree, index.node->Get()).Order(0) != 0,
+                      dataSize == kBlockSize);
+            EXPECT_EQ(index.bench.capture.Take(), Events{});
         }
     }
 }
@@ -232,23 +246,13 @@ TEST(NodeWithLongData, IsSearchedAgainWhereItLies) {
 // remembers what searches met.
 TEST(NodeWithoutMemory, ReportsNothingOfAKeyOverABlocksEnd) {
     for (const bool inOnePiece : {false, true}) {
-        NodeBench bench(Geometry{kNodeSize, kBlockSize, inOnePiece});
-        bench.tree.nodeShift = 10;
-        bench.tree.compareKeys = CompareCatKeysCaseIns;
-        const NodeImage image{.kind = kBTIndexNode,
-                              .records = {Record(DiskCatKey(7, std::u16string(255, u'c')), 5u)}};
-        const auto node = bench.Node(image.Build(kNodeSize), 3);
-        alignas(HfsHintTable) u8 memory[offsetof(HfsHintTable, hints) + 32 * sizeof(HfsHint)]{};
-        node->Get()->hints = reinterpret_cast<HfsHintTable*>(memory);
-        const HostKey host = HostCatKey(7, u"c");
-        SoughtKey key(&bench.tree, host, host.id);
-        key.LearnOrder();
+        HintedIndex index({kNodeSize, kBlockSize, inOnePiece},
+                          Record(DiskCatKey(7, std::u16string(255, u'c')), 5u));
         SearchResult result{};
-        bench.heap.FailNth(1);
-        EXPECT_EQ(SearchNode(&bench.tree, node->Get(), key, &result), kErrNoMemory);
-        bench.heap.FailNone();
-        EXPECT_EQ(bench.capture.Take(), Events{});
-        node->Get()->hints = nullptr;
+        index.bench.heap.FailNth(1);
+        EXPECT_EQ(index.Search(&result), kErrNoMemory);
+        index.bench.heap.FailNone();
+        EXPECT_EQ(index.bench.capture.Take(), Events{});
     }
 }
 

@@ -109,8 +109,8 @@ public:
     // The tree if it is open already, else null.
     CBTreeHfs* OpenTree(u32 fileId);
     // Drops clean nodes nobody holds when the trees' caches are above the budget: the leaves, and
-    // all others too when these take more than three quarters of it. Search paths stay valid. Call it between
-    // operations of long jobs; cheap when there is nothing to do.
+    // all others too when these take more than three quarters of it. Search paths stay valid. Call
+    // it between operations of long jobs; cheap when there is nothing to do.
     void TrimCache();
     u64 CachedBytes() const;  // of all trees, clean or not
 
