@@ -71,6 +71,17 @@ inline void TrapIfClean([[maybe_unused]] const HfsBcbBuf* block) {
 #endif
 }
 
+// The same of all blocks that the `size` bytes from `offset` on lie in.
+inline void TrapIfAnyClean([[maybe_unused]] const HfsBcbBuf* blocks,
+                           [[maybe_unused]] u32 blockShift, [[maybe_unused]] u32 offset,
+                           [[maybe_unused]] u32 size) {
+#ifdef TREEHFS_PARANOID
+    for (u32 at = offset; at < offset + size; at = ((at >> blockShift) + 1) << blockShift) {
+        TrapIfClean(&blocks[at >> blockShift]);
+    }
+#endif
+}
+
 class NodeBytes {
 public:
     NodeBytes(const BTHeaderMem* hdr, const HfsNode* node)
@@ -200,12 +211,8 @@ private:
     bool Contains(u32 offset, u32 size) const {
         return __builtin_expect(static_cast<u64>(offset) + size <= size_, true);
     }
-    u8* WriteAt(u32 offset, [[maybe_unused]] u32 size) const {
-#ifdef TREEHFS_PARANOID
-        for (u32 at = offset; at < offset + size; at = ((at >> blockShift_) + 1) << blockShift_) {
-            TrapIfClean(&bufs_[at >> blockShift_]);
-        }
-#endif
+    u8* WriteAt(u32 offset, u32 size) const {
+        TrapIfAnyClean(bufs_, blockShift_, offset, size);
         return data_ + offset;
     }
 
